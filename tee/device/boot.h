@@ -1,0 +1,24 @@
+// The boot of a device: its secret seed and when it began.
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+#include "tee/device/secret_bytes.h"
+
+namespace tee {
+
+struct boot_record {
+  secret_bytes seed;  // device::BOOT_SEED_LENGTH bytes
+  uint64_t boot_ms;   // on the machine's clock (machine_clock_ms)
+};
+
+// start_boot: begins a new boot of the device in `folder`: boot.json holds a new seed and the time.
+// Throws device_error.
+boot_record start_boot(const std::string& folder);
+
+// current_boot: the boot that boot.json tells of, or a new one when the machine was started anew
+// since. Throws device_error: DAMAGED when the file is missing or malformed.
+boot_record current_boot(const std::string& folder);
+
+}  // namespace tee

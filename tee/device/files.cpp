@@ -1,0 +1,85 @@
+// Files of the device folder: read whole, replaced as a whole.
+#include "tee/device/files.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <filesystem>
+#include <sys/stat.h>
+#include <system_error>
+#include <unistd.h>
+
+#include "tee/device/os_open.h"
+
+namespace tee {
+
+namespace {
+
+void write_all(int fd, std::span<const uint8_t> bytes, const std::string& path) {
+  while (!bytes.empty()) {
+    ssize_t written = write(fd, bytes.data(), bytes.size());
+    if (written < 0 && errno == EINTR) continue;
+    if (written < 0) throw file_error("write", path);
+    bytes = bytes.subspan(static_cast<size_t>(written));
+  }
+}
+
+size_t read_some(int fd, std::span<uint8_t> room, const std::string& path) {
+  for (;;) {
+    ssize_t got = read(fd, room.data(), room.size());
+    if (got >= 0) return static_cast<size_t>(got);
+    if (errno != EINTR) throw file_error("read", path);
+  }
+}
+
+}  // namespace
+
+file_error::file_error(const std::string& action, const std::string& path)
+    : file_error(action, path, errno) {}
+
+file_error::file_error(const std::string& action, const std::string& path, int error_number)
+    : device_error(kind::IO, "cannot " + action + " " + path + ": " +
+                                 std::generic_category().message(error_number)),
+      error_number_(error_number) {}
+
+file_descriptor::~file_descriptor() {
+  if (fd_ >= 0) close(fd_);
+}
+
+std::optional<secret_bytes> read_file(const std::string& path, size_t limit) {
+  file_descriptor file(os::open_file(path.c_str(), os::open_mode::READ));
+  if (!file && (errno == ENOENT || errno == ENOTDIR)) return std::nullopt;
+  struct stat status {};
+  if (!file || fstat(file.get(), &status) != 0) throw file_error("open", path);
+  if (!S_ISREG(status.st_mode)) {
+    throw device_error(device_error::kind::DAMAGED, path + " is not a regular file");
+  }
+  secret_bytes bytes(limit + 1);
+  size_t filled = 0;
+  while (filled <= limit) {
+    size_t got = read_some(file.get(), std::span(bytes).subspan(filled), path);
+    if (got == 0) break;
+    filled += got;
+  }
+  if (filled > limit) throw device_error(device_error::kind::DAMAGED, path + " is too long");
+  bytes.resize(filled);
+  return bytes;
+}
+
+void write_file(const std::string& path, std::span<const uint8_t> bytes) {
+  const std::string draft = path + ".new";
+  {
+    file_descriptor file(os::open_file(draft.c_str(), os::open_mode::REPLACE));
+    if (!file) throw file_error("create", draft);
+    write_all(file.get(), bytes, draft);
+    if (fsync(file.get()) != 0) throw file_error("sync", draft);
+  }
+  if (std::rename(draft.c_str(), path.c_str()) != 0) throw file_error("replace", path);
+  sync_folder(std::filesystem::path(path).parent_path());
+}
+
+void sync_folder(const std::string& path) {
+  file_descriptor folder(os::open_folder(path.empty() ? "." : path.c_str()));
+  if (!folder || fsync(folder.get()) != 0) throw file_error("sync", path);
+}
+
+}  // namespace tee
