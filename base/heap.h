@@ -28,6 +28,8 @@ void heap_give_back(void* block, size_t size);
 class heap_buffer {
  public:
   heap_buffer() = default;
+  // Takes over a block of `size` bytes that came from heap_take.
+  heap_buffer(uint8_t* block, size_t size) : data_(block), size_(size), capacity_(size) {}
   heap_buffer(heap_buffer&& other) noexcept { swap(other); }
   heap_buffer& operator=(heap_buffer&& other) noexcept {
     heap_buffer taken(std::move(other));

@@ -65,8 +65,8 @@ TEE_Result tee_operation::allocate(uint32_t algorithm, uint32_t mode, uint32_t m
                  "AllocateOperation", at);
 }
 
-TEE_Result tee_operation::set_key(const tee_object& key, trace_site at) {
-  return checked(TEE_SetOperationKey(handle_, key.get()), "SetOperationKey", at);
+TEE_Result tee_operation::set_key(TEE_ObjectHandle key, trace_site at) {
+  return checked(TEE_SetOperationKey(handle_, key), "SetOperationKey", at);
 }
 
 TEE_Result tee_operation::digest_final(byte_view last, byte_span digest, size_t* length,

@@ -63,7 +63,7 @@ class tee_operation {
 
   [[nodiscard]] TEE_Result allocate(uint32_t algorithm, uint32_t mode, uint32_t max_key_bits,
                                     trace_site at = trace_site::here());
-  [[nodiscard]] TEE_Result set_key(const tee_object& key, trace_site at = trace_site::here());
+  [[nodiscard]] TEE_Result set_key(TEE_ObjectHandle key, trace_site at = trace_site::here());
   [[nodiscard]] TEE_Result digest_final(byte_view last, byte_span digest, size_t* length,
                                         trace_site at = trace_site::here());
   [[nodiscard]] TEE_Result mac_final(byte_view last, byte_span mac, size_t* length,

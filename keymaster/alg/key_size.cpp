@@ -1,7 +1,18 @@
-// The size of an imported key.
+// The size of a new key.
 #include "keymaster/alg/key_size.h"
 
 namespace keymaster {
+
+keymaster_error_t required_key_bits(const keymaster_key_param_set_t& description,
+                                    uint32_t* key_bits, trace_site at) {
+  const keymaster_key_param_t* size = get_unique(description, KM_TAG_KEY_SIZE);
+  if (size == nullptr) {
+    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_KEY_SIZE or specified");
+    return KM_ERROR_INVALID_ARGUMENT;
+  }
+  *key_bits = size->integer;
+  return KM_ERROR_OK;
+}
 
 keymaster_error_t settle_key_bits(keymaster_key_param_set_t* description, uint64_t guessed_bits,
                                   uint32_t* key_bits, trace_site at) {

@@ -3,6 +3,7 @@
 
 #include "keymaster/alg/hmac/hmac.h"
 #include "keymaster/alg/key_size.h"
+#include "keymaster/alg/mac_length.h"
 #include "keymaster/alg/provenance.h"
 
 namespace keymaster {
@@ -26,11 +27,6 @@ keymaster_error_t check_key_size(uint32_t key_bits, trace_site at) {
   return KM_ERROR_UNSUPPORTED_KEY_SIZE;
 }
 
-keymaster_error_t refuse_min_mac(uint32_t min_mac_bits, trace_site at) {
-  trace(TEE_TRACE_ERROR, at, "Invalid KM_TAG_MIN_MAC_LENGTH %d", static_cast<int>(min_mac_bits));
-  return KM_ERROR_UNSUPPORTED_MIN_MAC_LENGTH;
-}
-
 // The minimum MAC length and the digest of a description; *hash receives the digest's row.
 keymaster_error_t check_mac_and_digest(const keymaster_key_param_set_t& description,
                                        const hmac_hash_t** hash, trace_site at) {
@@ -39,9 +35,8 @@ keymaster_error_t check_mac_and_digest(const keymaster_key_param_set_t& descript
     trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_MIN_MAC_LENGTH or specified");
     return KM_ERROR_INVALID_ARGUMENT;
   }
-  const uint32_t min_mac_bits = min_mac->integer;
-  if (min_mac_bits < MIN_MIN_MAC_BITS || min_mac_bits % 8 != 0) {
-    return refuse_min_mac(min_mac_bits, at);
+  if (auto error = check_min_mac_bits(min_mac->integer, MIN_MIN_MAC_BITS, UINT32_MAX, at)) {
+    return error;
   }
   const auto* digest = get_unique(description, KM_TAG_DIGEST);
   if (digest == nullptr) {
@@ -50,8 +45,7 @@ keymaster_error_t check_mac_and_digest(const keymaster_key_param_set_t& descript
   }
   *hash = hmac_hash_of_digest(digest->enumerated);
   if (*hash == nullptr) return KM_ERROR_UNSUPPORTED_DIGEST;
-  if (min_mac_bits > (*hash)->mac_bits) return refuse_min_mac(min_mac_bits, at);
-  return KM_ERROR_OK;
+  return check_min_mac_bits(min_mac->integer, MIN_MIN_MAC_BITS, (*hash)->mac_bits, at);
 }
 
 // Writes the record's two header fields and gives the room for the key's bytes behind them. The
@@ -67,12 +61,7 @@ keymaster_error_t check_generate(keymaster_key_param_set_t* description, uint32_
   if (auto error = add_provenance(description, KM_ORIGIN_GENERATED, creation_time::ADDED, at)) {
     return error;
   }
-  const auto* size = get_unique(*description, KM_TAG_KEY_SIZE);
-  if (size == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_KEY_SIZE or specified");
-    return KM_ERROR_INVALID_ARGUMENT;
-  }
-  *key_bits = size->integer;
+  if (auto error = required_key_bits(*description, key_bits, at)) return error;
   if (auto error = check_key_size(*key_bits, at)) return error;
   return check_mac_and_digest(*description, hash, at);
 }

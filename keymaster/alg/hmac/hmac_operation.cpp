@@ -56,7 +56,7 @@ TEE_Result prepare(hmac_operation_t* operation, byte_view key_material,
           operation->mac.allocate(hash->mac_algorithm, TEE_MODE_MAC, operation->key_bits, at)) {
     return res;
   }
-  if (TEE_Result res = operation->mac.set_key(operation->key, at)) return res;
+  if (TEE_Result res = operation->mac.set_key(operation->key.get(), at)) return res;
   TEE_MACInit(operation->mac.get(), nullptr, 0);
   return TEE_SUCCESS;
 }

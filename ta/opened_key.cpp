@@ -1,0 +1,53 @@
+// What the commands share that take a key blob.
+#include "ta/opened_key.h"
+
+#include "keymaster/auth/authorization.h"
+#include "keymaster/params/marshal.h"
+#include "keymaster/store/key_blob.h"
+#include "ta/configured.h"
+
+namespace keymaster {
+
+keymaster_error_t open_checked_key(byte_view blob, opened_key* key, trace_site at) {
+  if (!key->blob.copy_of(blob)) {
+    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+  }
+  keymaster_error_t error = KM_ERROR_OK;
+  const TEE_Result res = open_key(key->blob.view(), &key->material, &key->characteristics, &error);
+  if (failed(res, error)) {
+    // The reason is traced, not told: a blob that does not open asks for an upgrade. Intended.
+    trace(TEE_TRACE_ERROR, at, "Open key failed");
+    return KM_ERROR_KEY_REQUIRES_UPGRADE;
+  }
+  if (key_requires_upgrade(key->characteristics)) return KM_ERROR_KEY_REQUIRES_UPGRADE;
+  if (key_version_mismatch(key->characteristics)) return KM_ERROR_INVALID_KEY_BLOB;
+  return KM_ERROR_OK;
+}
+
+bool read_key_request(byte_view input, key_request* request) {
+  input_cursor in(input);
+  return in.read_field(&request->blob) && in.read_field(&request->app_id) &&
+         in.read_field(&request->app_data);
+}
+
+keymaster_error_t open_requested_key(const key_request& request, opened_key* key, trace_site at) {
+  if (auto error = open_checked_key(request.blob, key, at)) return error;
+  if (!check_app_id_and_app_data(key->characteristics, request.app_id, request.app_data)) {
+    trace(TEE_TRACE_ERROR, at, "Wrong AppId or AppData");
+    return KM_ERROR_INVALID_KEY_BLOB;
+  }
+  return KM_ERROR_OK;
+}
+
+TEE_Result write_set(const keymaster_key_param_set_t& set, byte_span room, size_t* written) {
+  // marshal takes a null buffer as a wish for a new one; an output without memory has no room.
+  uint8_t nowhere = 0;
+  uint8_t* buffer = room.data() == nullptr ? &nowhere : room.data();
+  uint32_t size = static_cast<uint32_t>(room.size() < UINT32_MAX ? room.size() : UINT32_MAX);
+  const TEE_Result res = marshal(set, false, &buffer, &size);
+  *written = size;
+  return res;
+}
+
+}  // namespace keymaster

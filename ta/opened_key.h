@@ -1,0 +1,40 @@
+// What the commands share that take a key blob, and that write parameter sets to the client.
+#pragma once
+
+#include "base/heap.h"
+#include "base/results.h"
+#include "keymaster/params/param_set.h"
+
+namespace keymaster {
+
+// opened_key: a key blob, copied into TA memory, and what it holds.
+struct opened_key {
+  heap_buffer blob;
+  heap_buffer material;
+  keymaster_key_param_set_t characteristics;
+};
+
+// open_checked_key: copies `blob` and opens it; refuses keys older or newer than the configured
+// system. Whatever open_key says, a blob that does not open is -62; -33 for a newer key; -41 out of
+// memory. Messages go out under `at`.
+[[nodiscard]] keymaster_error_t open_checked_key(byte_view blob, opened_key* key,
+                                                 trace_site at = trace_site::here());
+
+// key_request: the input that get_key_character_size, get_key_character and export_key share: key
+// blob, application identifier and application data, each a field. An empty field is none.
+struct key_request {
+  byte_view blob;
+  byte_view app_id;
+  byte_view app_data;
+};
+[[nodiscard]] bool read_key_request(byte_view input, key_request* request);
+
+// open_requested_key: open_checked_key, then the application binding (-33).
+[[nodiscard]] keymaster_error_t open_requested_key(const key_request& request, opened_key* key,
+                                                   trace_site at = trace_site::here());
+
+// write_set: marshals `set` without its application tags into `room`; *written receives the bytes.
+[[nodiscard]] TEE_Result write_set(const keymaster_key_param_set_t& set, byte_span room,
+                                   size_t* written);
+
+}  // namespace keymaster
