@@ -23,7 +23,7 @@ TEE_Result authorize(const opened_key& key, uint32_t purpose,
     return TEE_SUCCESS;
   }
   const TEE_Result res =
-      authorize_begin(key.blob.view(), purpose, params, key.characteristics, km_error);
+      authorize_begin(key.blob.view(), purpose, params, key.characteristics, km_error, at);
   if (res == TEE_SUCCESS && *km_error == KM_AUTHENTICATION_DUE) *km_error = KM_ERROR_OK;
   if (failed(res, *km_error)) trace(TEE_TRACE_ERROR, at, "Authorization failed");
   return res;

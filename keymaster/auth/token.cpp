@@ -121,10 +121,7 @@ bool ComputeSignature(std::span<uint8_t, AUTH_TOKEN_MAC_SIZE> out, TEE_ObjectHan
   wipe(out);
   tee_operation hmac;
   if (hmac.allocate(TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, TOKEN_KEY_BITS) != TEE_SUCCESS) return false;
-  if (TEE_Result res = TEE_SetOperationKey(hmac.get(), key)) {
-    TRACE_ERROR("SetOperationKey failed with 0x%08x\n", res);
-    return false;
-  }
+  if (hmac.set_key(key) != TEE_SUCCESS) return false;
   TEE_MACInit(hmac.get(), nullptr, 0);
   size_t length = 0;
   if (hmac.mac_final(data, out, &length) != TEE_SUCCESS) return false;
