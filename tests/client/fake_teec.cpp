@@ -1,0 +1,72 @@
+// See fake_teec.h.
+#include "fake_teec.h"
+
+#include <algorithm>
+
+namespace fake_teec {
+
+std::vector<request> requests;
+
+namespace {
+
+handler current;
+
+uint32_t type_of(uint32_t types, int slot) {
+  return types >> (4 * slot) & 0xf;
+}
+
+void take(uint32_t types, const TEEC_Parameter* slots, request* seen) {
+  if (type_of(types, 0) == TEEC_VALUE_INOUT) seen->a = slots[0].value.a;
+  for (int i = 0; i < 4; ++i) {
+    const TEEC_TempMemoryReference& memory = slots[i].tmpref;
+    if (type_of(types, i) == TEEC_MEMREF_TEMP_OUTPUT) seen->capacity = memory.size;
+    if (type_of(types, i) == TEEC_MEMREF_TEMP_INPUT) {
+      auto* data = static_cast<const uint8_t*>(memory.buffer);
+      seen->input.assign(data, data + memory.size);
+    }
+  }
+}
+
+void put(const answer& reply, uint32_t types, TEEC_Parameter* slots) {
+  if (type_of(types, 0) != TEEC_VALUE_INOUT) return;
+  slots[0].value = {static_cast<uint32_t>(reply.a), reply.b};
+  if (type_of(types, 2) != TEEC_MEMREF_TEMP_OUTPUT) return;
+  size_t room = std::min(slots[2].tmpref.size, reply.output.size());
+  std::copy_n(reply.output.begin(), room, static_cast<uint8_t*>(slots[2].tmpref.buffer));
+  slots[2].tmpref.size = reply.output_size == SIZE_MAX ? reply.output.size() : reply.output_size;
+}
+
+}  // namespace
+
+void set_handler(handler answers) {
+  requests.clear();
+  current = std::move(answers);
+}
+
+}  // namespace fake_teec
+
+using fake_teec::current;
+
+TEEC_Result TEEC_InitializeContext(const char*, TEEC_Context*) {
+  return TEEC_SUCCESS;
+}
+
+void TEEC_FinalizeContext(TEEC_Context*) {}
+
+TEEC_Result TEEC_OpenSession(TEEC_Context*, TEEC_Session*, const TEEC_UUID*, uint32_t, const void*,
+                             TEEC_Operation*, uint32_t*) {
+  return TEEC_SUCCESS;
+}
+
+void TEEC_CloseSession(TEEC_Session*) {}
+
+TEEC_Result TEEC_InvokeCommand(TEEC_Session*, uint32_t command, TEEC_Operation* operation,
+                               uint32_t* origin) {
+  fake_teec::request seen{command, operation->paramTypes};
+  fake_teec::take(operation->paramTypes, operation->params, &seen);
+  fake_teec::requests.push_back(seen);
+  fake_teec::answer reply = current(seen);
+  *origin = reply.leave_slots ? TEEC_ORIGIN_TEE : TEEC_ORIGIN_TRUSTED_APP;
+  if (!reply.leave_slots) fake_teec::put(reply, operation->paramTypes, operation->params);
+  return reply.result;
+}
