@@ -13,11 +13,9 @@ set(TA_COMPILE_OPTIONS
 
 # A TA links the platform, the C library's few memory and text functions, and nothing else: no C++
 # runtime and no start files, so what it imports is what a device's TEE must offer. Sanitizers bring
-# their own runtime, which clang links into programs only.
-if(KEYMASTER_SANITIZE)
-  set(TA_LINK_OPTIONS $<$<CXX_COMPILER_ID:GNU>:-Wl,--no-undefined>)
-else()
-  set(TA_LINK_OPTIONS -nostdlib -Wl,--no-undefined)
+# a runtime of their own and want the usual libraries.
+if(NOT KEYMASTER_SANITIZE)
+  set(TA_LINK_OPTIONS -nostdlib)
   set(TA_LINK_LIBRARIES c gcc)
 endif()
 
@@ -34,7 +32,8 @@ function(trusted_application name)
   add_library(${name} MODULE ${ARG_SOURCES})
   target_compile_options(${name} PRIVATE ${TA_COMPILE_OPTIONS})
   target_link_libraries(${name} PRIVATE ${ARG_LIBRARIES} teec ${TA_LINK_LIBRARIES})
-  target_link_options(${name} PRIVATE ${TA_LINK_OPTIONS} -Wl,--gc-sections -Wl,-z,now)
+  target_link_options(${name} PRIVATE ${TA_LINK_OPTIONS} ${KEYMASTER_NO_UNDEFINED} -Wl,--gc-sections
+                      -Wl,-z,now)
   set_target_properties(${name} PROPERTIES
       KEYMASTER_TA ON PREFIX "" SUFFIX ".ta" OUTPUT_NAME ${ARG_UUID}
       LIBRARY_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/ta

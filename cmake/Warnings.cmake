@@ -5,6 +5,13 @@ if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
   add_compile_options(-Wno-stringop-overflow -Wno-array-bounds)
 endif()
 
+# Shared objects name all that they need. Clang links a sanitizer's runtime into programs only, so
+# there a shared object's calls into it stay open.
+set(KEYMASTER_NO_UNDEFINED -Wl,--no-undefined)
+if(KEYMASTER_SANITIZE AND CMAKE_CXX_COMPILER_ID MATCHES "Clang")
+  set(KEYMASTER_NO_UNDEFINED "")
+endif()
+
 if(KEYMASTER_SANITIZE)
   add_compile_options(-fsanitize=${KEYMASTER_SANITIZE} -fno-omit-frame-pointer
                       -fno-sanitize-recover=all)
