@@ -1,0 +1,79 @@
+// AES-GCM.
+#include "tee/crypto/aead.h"
+
+#include "tee/crypto/block_cipher.h"
+#include "tee/crypto/fetched.h"
+
+namespace tee::crypto {
+namespace {
+
+// Apart from the numbers under which block_cipher keeps its contexts.
+uint64_t use_of(bool encrypt) {
+  return static_cast<uint64_t>(block_mode::GCM) * 2 + (encrypt ? 1 : 0);
+}
+
+cipher_ctx_ptr keyed_context(const key& key, bool encrypt) {
+  cipher_ctx_ptr context(EVP_CIPHER_CTX_new());
+  must(context && EVP_CipherInit_ex2(context.get(), cipher_of(block_mode::GCM, key.bits()),
+                                     key.secret().data(), nullptr, encrypt ? 1 : 0, nullptr) == 1,
+       "EVP_CipherInit_ex2");
+  return context;
+}
+
+}  // namespace
+
+aead::aead(key_ptr key, bool encrypt)
+    : key_(std::move(key)),
+      encrypt_(encrypt),
+      context_(key_->cipher_contexts.take(use_of(encrypt))) {
+  if (!context_) context_ = keyed_context(*key_, encrypt);
+}
+
+aead::~aead() {
+  if (context_) key_->cipher_contexts.give(use_of(encrypt_), std::move(context_));
+}
+
+void aead::start(std::span<const uint8_t> nonce, uint32_t tag_bits) {
+  EVP_CIPHER_CTX* context = context_.get();
+  int length = static_cast<int>(nonce.size());
+  if (EVP_CIPHER_CTX_get_iv_length(context) != length) {
+    must(EVP_CIPHER_CTX_ctrl(context, EVP_CTRL_AEAD_SET_IVLEN, length, nullptr) == 1,
+         "EVP_CTRL_AEAD_SET_IVLEN");
+  }
+  // Without a cipher and a key: the context keeps its own.
+  must(EVP_CipherInit_ex2(context, nullptr, nullptr, nonce.data(), -1, nullptr) == 1,
+       "EVP_CipherInit_ex2");
+  tag_length_ = tag_bits / 8;
+}
+
+void aead::add_associated_data(std::span<const uint8_t> bytes) {
+  update_in_chunks(context_.get(), bytes, nullptr);
+}
+
+void aead::update(std::span<const uint8_t> input, uint8_t* output) {
+  update_in_chunks(context_.get(), input, output);
+}
+
+void aead::make_tag(uint8_t* tag) {
+  int written = 0;
+  uint8_t none[AES_BLOCK];
+  must(EVP_CipherFinal_ex(context_.get(), none, &written) == 1 &&
+           EVP_CIPHER_CTX_ctrl(context_.get(), EVP_CTRL_AEAD_GET_TAG, static_cast<int>(tag_length_),
+                               tag) == 1,
+       "EVP_CipherFinal_ex");
+}
+
+bool aead::check_tag(std::span<const uint8_t> tag) {
+  if (tag.size() != tag_length_) return false;
+  // The tag is an input here; only the parameter's type is not const.
+  must(EVP_CIPHER_CTX_ctrl(context_.get(), EVP_CTRL_AEAD_SET_TAG, static_cast<int>(tag.size()),
+                           const_cast<uint8_t*>(tag.data())) == 1,
+       "EVP_CTRL_AEAD_SET_TAG");
+  int written = 0;
+  uint8_t none[AES_BLOCK];
+  bool authentic = EVP_CipherFinal_ex(context_.get(), none, &written) == 1;
+  if (!authentic) forget_errors();
+  return authentic;
+}
+
+}  // namespace tee::crypto

@@ -1,0 +1,23 @@
+// Message digests.
+#include "tee/crypto/digest.h"
+
+#include "tee/crypto/fetched.h"
+
+namespace tee::crypto {
+
+digest::digest(hash which) : length_(length_of(which)), context_(EVP_MD_CTX_new()) {
+  must(context_ && EVP_DigestInit_ex2(context_.get(), digest_of(which), nullptr) == 1,
+       "EVP_DigestInit_ex2");
+}
+
+void digest::update(std::span<const uint8_t> bytes) {
+  must(EVP_DigestUpdate(context_.get(), bytes.data(), bytes.size()) == 1, "EVP_DigestUpdate");
+}
+
+void digest::finish(uint8_t* result) {
+  must(EVP_DigestFinal_ex(context_.get(), result, nullptr) == 1 &&
+           EVP_DigestInit_ex2(context_.get(), nullptr, nullptr) == 1,
+       "EVP_DigestFinal_ex");
+}
+
+}  // namespace tee::crypto

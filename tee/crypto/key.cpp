@@ -1,0 +1,103 @@
+// Keys of any type: their attributes, and the symmetric ones whole.
+#include "tee/crypto/key.h"
+
+#include <algorithm>
+
+#include "tee/crypto/algorithms.h"
+#include "tee/crypto/ec_keys.h"
+#include "tee/crypto/random.h"
+#include "tee/crypto/rsa_keys.h"
+
+namespace tee::crypto {
+namespace {
+
+TEE_Result load_symmetric(const key_type& type, uint32_t max_bits,
+                          std::vector<attribute> attributes, key_ptr* result) {
+  size_t length = attributes.front().bytes.size();
+  if (length > max_bits / 8) return TEE_ERROR_BAD_PARAMETERS;
+  auto bits = static_cast<uint32_t>(length * 8);
+  if (!type.allows(bits)) return TEE_ERROR_BAD_PARAMETERS;
+  *result = std::make_shared<key>(type.id, bits, std::move(attributes), nullptr);
+  return TEE_SUCCESS;
+}
+
+TEE_Result generate_symmetric(const key_type& type, uint32_t bits,
+                              std::span<const attribute> parameters, key_ptr* result) {
+  if (!parameters.empty()) return TEE_ERROR_BAD_PARAMETERS;
+  attribute secret{TEE_ATTR_SECRET_VALUE, secret_bytes(bits / 8)};
+  fill_random(secret.bytes);
+  std::vector<attribute> attributes;
+  attributes.push_back(std::move(secret));
+  *result = std::make_shared<key>(type.id, bits, std::move(attributes), nullptr);
+  return TEE_SUCCESS;
+}
+
+size_t times_given(std::span<const attribute> attributes, uint32_t id) {
+  return static_cast<size_t>(std::count_if(attributes.begin(), attributes.end(),
+                                           [=](const attribute& a) { return a.id == id; }));
+}
+
+}  // namespace
+
+const attribute* key::find(uint32_t id) const {
+  return find_attribute(attributes_, id);
+}
+
+const attribute* find_attribute(std::span<const attribute> attributes, uint32_t id) {
+  auto found = std::find_if(attributes.begin(), attributes.end(),
+                            [=](const attribute& a) { return a.id == id; });
+  return found == attributes.end() ? nullptr : &*found;
+}
+
+const char* broken_rule(uint32_t type, std::span<const attribute> attributes) {
+  const key_type& row = *find_key_type(type);
+  for (const attribute& given : attributes) {
+    if (!row.has(given.id)) return "an attribute does not belong to the object's type";
+    if (times_given(attributes, given.id) > 1) return "an attribute is given twice";
+  }
+  for (const attribute_rule& rule : row.attributes) {
+    if (rule.presence == attribute_rule::MANDATORY && times_given(attributes, rule.id) == 0) {
+      return "a mandatory attribute is missing";
+    }
+  }
+  return nullptr;
+}
+
+std::vector<attribute> in_table_order(uint32_t type, std::vector<attribute> attributes) {
+  std::vector<attribute> ordered;
+  ordered.reserve(attributes.size());
+  for (const attribute_rule& rule : find_key_type(type)->attributes) {
+    for (attribute& given : attributes) {
+      if (given.id != rule.id) continue;
+      bool absent = rule.presence == attribute_rule::OPTIONAL && given.bytes.empty();
+      if (!absent) ordered.push_back(std::move(given));
+    }
+  }
+  return ordered;
+}
+
+std::span<const uint8_t> without_leading_zeros(std::span<const uint8_t> number) {
+  while (!number.empty() && number.front() == 0)
+    number = number.subspan(1);
+  return number;
+}
+
+TEE_Result load_key(uint32_t type, uint32_t max_bits, std::vector<attribute> attributes,
+                    key_ptr* result) {
+  const key_type& row = *find_key_type(type);
+  std::vector<attribute> ordered = in_table_order(type, std::move(attributes));
+  if (row.symmetric()) return load_symmetric(row, max_bits, std::move(ordered), result);
+  if (row.has(TEE_ATTR_ECC_CURVE)) return load_ec_key(type, max_bits, std::move(ordered), result);
+  return load_rsa_key(type, max_bits, std::move(ordered), result);
+}
+
+TEE_Result generate_key(uint32_t type, uint32_t bits, std::span<const attribute> parameters,
+                        key_ptr* result) {
+  const key_type& row = *find_key_type(type);
+  if (row.symmetric()) return generate_symmetric(row, bits, parameters, result);
+  if (type == TEE_TYPE_ECDSA_KEYPAIR) return generate_ec_key(bits, parameters, result);
+  if (type == TEE_TYPE_RSA_KEYPAIR) return generate_rsa_key(bits, parameters, result);
+  return TEE_ERROR_BAD_PARAMETERS;
+}
+
+}  // namespace tee::crypto

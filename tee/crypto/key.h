@@ -1,0 +1,94 @@
+// Keys: a type, its attributes in canonical form, and what libcrypto has made of them.
+#pragma once
+
+#include "tee_internal_api.h"
+
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <vector>
+
+#include "tee/crypto/context_pool.h"
+#include "tee/crypto/openssl.h"
+#include "tee/device/secret_bytes.h"
+
+namespace tee::crypto {
+
+// One attribute. TEE_ATTR_FLAG_VALUE in the identifier tells which members count.
+struct attribute {
+  uint32_t id = 0;
+  secret_bytes bytes;  // buffer attributes
+  uint32_t a = 0;      // value attributes
+  uint32_t b = 0;
+
+  bool is_value() const { return (id & TEE_ATTR_FLAG_VALUE) != 0; }
+};
+
+// A key never changes after it is made; objects and operations share it. Its spare contexts are
+// working memory: those who share a key must not use it at the same time.
+class key {
+ public:
+  key(uint32_t type, uint32_t bits, std::vector<attribute> attributes, pkey_ptr pkey)
+      : type_(type), bits_(bits), attributes_(std::move(attributes)), pkey_(std::move(pkey)) {}
+  key(const key&) = delete;
+  key& operator=(const key&) = delete;
+
+  uint32_t type() const { return type_; }  // TEE_TYPE_
+  uint32_t bits() const { return bits_; }  // modulus, secret or curve size
+
+  // attributes: in the order of the type's table. RSA numbers have no leading zeros, EC numbers are
+  // padded to the field's length.
+  const std::vector<attribute>& attributes() const { return attributes_; }
+
+  // find: the attribute, or null.
+  const attribute* find(uint32_t id) const;
+
+  // secret: the bytes of a symmetric key.
+  std::span<const uint8_t> secret() const { return attributes_.front().bytes; }
+
+  // pkey: libcrypto's form of an RSA or EC key; null for symmetric ones.
+  EVP_PKEY* pkey() const { return pkey_.get(); }
+
+  // Contexts that were made ready for this key and are not in use.
+  context_pool<pkey_ctx_ptr> pkey_contexts;
+  context_pool<mac_ctx_ptr> mac_contexts;
+  context_pool<cipher_ctx_ptr> cipher_contexts;
+
+ private:
+  uint32_t type_;
+  uint32_t bits_;
+  std::vector<attribute> attributes_;
+  pkey_ptr pkey_;
+};
+
+using key_ptr = std::shared_ptr<key>;
+
+// find_attribute: the first one with this identifier, or null.
+const attribute* find_attribute(std::span<const attribute> attributes, uint32_t id);
+
+// broken_rule: which rule about the presence of attributes a list breaks for a type that is in the
+// table: a mandatory one missing or given twice, one that does not belong to the type. Null: none.
+// An empty optional attribute counts as absent.
+const char* broken_rule(uint32_t type, std::span<const attribute> attributes);
+
+// in_table_order: the attributes in the order of the type's table, the empty optional ones left
+// out.
+std::vector<attribute> in_table_order(uint32_t type, std::vector<attribute> attributes);
+
+// without_leading_zeros: the significant bytes of a big-endian number.
+std::span<const uint8_t> without_leading_zeros(std::span<const uint8_t> number);
+
+// load_key: makes a key of `attributes`, whose list breaks no rule, in any order and with leading
+// zeros or without. TEE_ERROR_BAD_PARAMETERS when the values are wrong or do not fit each other, or
+// when the key is larger than `max_bits`; *result is untouched then.
+[[nodiscard]] TEE_Result load_key(uint32_t type, uint32_t max_bits,
+                                  std::vector<attribute> attributes, key_ptr* result);
+
+// generate_key: makes a new key of exactly `bits`, a size that the type's table allows.
+// `parameters`: RSA takes an optional public exponent (default 65537), EC needs the curve,
+// symmetric types take none. TEE_ERROR_BAD_PARAMETERS for others, for an exponent that is even,
+// below 3 or above 64 bits, and for a curve of another size.
+[[nodiscard]] TEE_Result generate_key(uint32_t type, uint32_t bits,
+                                      std::span<const attribute> parameters, key_ptr* result);
+
+}  // namespace tee::crypto

@@ -1,0 +1,130 @@
+// Handles: what a trusted application holds in place of objects, operations and sessions. A handle
+// is a number below 2^31, so that it survives a 32-bit variable; a stale, foreign or made-up one
+// panics.
+#pragma once
+
+#include "tee_internal_api.h"
+
+#include <array>
+#include <cstdint>
+#include <memory>
+#include <utility>
+#include <vector>
+
+#include "tee/runtime/panic.h"
+
+namespace tee {
+
+struct object;
+struct operation;
+class ta_session;
+
+// What is published of a kind of handle: its type, its name in messages, and the two bits that tell
+// the kinds apart within a handle.
+template <typename T>
+struct handle_traits;
+template <>
+struct handle_traits<object> {
+  using type = TEE_ObjectHandle;
+  static constexpr const char* NAME = "object";
+  static constexpr uint32_t KIND = 1;
+};
+template <>
+struct handle_traits<operation> {
+  using type = TEE_OperationHandle;
+  static constexpr const char* NAME = "operation";
+  static constexpr uint32_t KIND = 2;
+};
+template <>
+struct handle_traits<ta_session> {
+  using type = TEE_TASessionHandle;
+  static constexpr const char* NAME = "session";
+  static constexpr uint32_t KIND = 3;
+};
+
+// next_handle_generation: 1 to 2^19 - 1, counted over all tables of the process, so that a handle
+// of another instance does not fit here.
+uint32_t next_handle_generation();
+
+// A table of one instance. Handle: kind (2 bits, from bit 29), generation (19), slot (10). Not
+// thread-safe: an instance runs one entry point at a time.
+template <typename T>
+class handle_table {
+ public:
+  using traits = handle_traits<T>;
+  using handle = typename traits::type;
+  static constexpr uint32_t SLOTS = 1024;
+
+  // insert: takes ownership; null when the table is full, and then the value is destroyed.
+  handle insert(std::shared_ptr<T> value) {
+    uint32_t slot = 0;
+    if (!free_.empty()) {
+      slot = free_.back();
+      free_.pop_back();
+    } else if (slots_.size() < SLOTS) {
+      slot = static_cast<uint32_t>(slots_.size());
+      slots_.emplace_back();
+      free_.reserve(slots_.size());  // so that remove() needs no memory
+    } else {
+      return nullptr;
+    }
+    slots_[slot] = {next_handle_generation(), std::move(value)};
+    return to_handle(slot);
+  }
+
+  // find: what the handle stands for; null when it is not a live handle of this table.
+  const std::shared_ptr<T>* find(handle value) const {
+    auto number = reinterpret_cast<uintptr_t>(value);
+    size_t slot = number & (SLOTS - 1);
+    bool live = slot < slots_.size() && slots_[slot].value && to_handle(slot) == value;
+    return live ? &slots_[slot].value : nullptr;
+  }
+
+  // get: likewise; panics in the name of `call` when it is not a live handle of this table.
+  T& get(handle value, const char* call) const {
+    const std::shared_ptr<T>* found = find(value);
+    if (!found) panic(call, "%s handle %p is not valid", traits::NAME, static_cast<void*>(value));
+    return **found;
+  }
+
+  // remove: forgets the handle and returns what it stood for; panics like get.
+  std::shared_ptr<T> remove(handle value, const char* call) {
+    get(value, call);
+    size_t slot = reinterpret_cast<uintptr_t>(value) & (SLOTS - 1);
+    free_.push_back(static_cast<uint32_t>(slot));
+    return std::exchange(slots_[slot].value, nullptr);
+  }
+
+  size_t size() const { return slots_.size() - free_.size(); }
+
+  // clear: forgets all handles.
+  void clear() {
+    slots_.clear();
+    free_.clear();
+  }
+
+  // for_each: visit(handle, T&) for every live handle.
+  template <typename Visit>
+  void for_each(Visit&& visit) const {
+    for (size_t slot = 0; slot < slots_.size(); ++slot) {
+      if (slots_[slot].value) visit(to_handle(slot), *slots_[slot].value);
+    }
+  }
+
+ private:
+  struct slot_record {
+    uint32_t generation = 0;
+    std::shared_ptr<T> value;
+  };
+
+  handle to_handle(size_t slot) const {
+    uintptr_t number = (uintptr_t{traits::KIND} << 29) |
+                       (uintptr_t{slots_[slot].generation} << 10) | uintptr_t{slot};
+    return reinterpret_cast<handle>(number);
+  }
+
+  std::vector<slot_record> slots_;
+  std::vector<uint32_t> free_;
+};
+
+}  // namespace tee

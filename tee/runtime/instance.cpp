@@ -1,0 +1,59 @@
+// Instances, and which one runs on the calling thread.
+#include "tee/runtime/instance.h"
+
+#include "tee_extensions.h"
+
+#include "tee/device/uuid.h"
+#include "tee/runtime/log.h"
+#include "tee/runtime/object.h"
+#include "tee/runtime/operation.h"
+
+namespace tee {
+namespace {
+
+thread_local instance* running = nullptr;
+
+}  // namespace
+
+instance::instance(const TEE_UUID& uuid, device& dev, size_t heap_limit)
+    : uuid_(uuid), device_(dev), memory_(heap_limit) {
+  properties_["gpd.ta.appID"] = uuid;
+}
+
+instance::~instance() {
+  host::live_counts left = counts();
+  if (left == host::live_counts{}) return;
+  log_line(TEE_TRACE_INFO,
+           "instance %s ended with %zu heap blocks (%zu bytes), %zu objects, %zu operations, %zu "
+           "sessions alive",
+           to_text(uuid_).c_str(), left.heap_blocks, left.heap_bytes, left.objects, left.operations,
+           left.sessions);
+}
+
+void instance::set_client(const TEE_Identity* client) {
+  client_ = client ? std::optional(*client) : std::nullopt;
+}
+
+host::live_counts instance::counts() const {
+  return {memory_.live_bytes(), memory_.live_blocks(), objects_.size(), operations_.size(),
+          sessions_.size()};
+}
+
+instance_scope::instance_scope(instance& entered) : outer_(running) {
+  running = &entered;
+}
+
+instance_scope::~instance_scope() {
+  running = outer_;
+}
+
+instance* running_instance() {
+  return running;
+}
+
+instance& current_instance(const char* call) {
+  if (!running) panic(call, "called outside of a trusted application");
+  return *running;
+}
+
+}  // namespace tee
