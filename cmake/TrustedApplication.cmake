@@ -15,7 +15,7 @@ set(TA_COMPILE_OPTIONS
 # runtime and no start files, so what it imports is what a device's TEE must offer. Sanitizers bring
 # a runtime of their own and want the usual libraries.
 if(NOT KEYMASTER_SANITIZE)
-  set(TA_LINK_OPTIONS -nostdlib)
+  set(TA_LINK_OPTIONS -nostdlib -Wl,--no-as-needed)  # the TA's own libraries come behind them
   set(TA_LINK_LIBRARIES c gcc)
 endif()
 
