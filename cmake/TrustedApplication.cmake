@@ -19,6 +19,9 @@ if(NOT KEYMASTER_SANITIZE)
   set(TA_LINK_LIBRARIES c gcc)
 endif()
 
+# Hidden visibility alone lets the standard library's templates through.
+set(TA_EXPORTS ${CMAKE_CURRENT_LIST_DIR}/trusted_application.map)
+
 function(ta_library name)
   cmake_parse_arguments(ARG "" "" "SOURCES;LIBRARIES" ${ARGN})
   add_library(${name} STATIC ${ARG_SOURCES})
@@ -33,9 +36,9 @@ function(trusted_application name)
   target_compile_options(${name} PRIVATE ${TA_COMPILE_OPTIONS})
   target_link_libraries(${name} PRIVATE ${ARG_LIBRARIES} teec ${TA_LINK_LIBRARIES})
   target_link_options(${name} PRIVATE ${TA_LINK_OPTIONS} ${KEYMASTER_NO_UNDEFINED} -Wl,--gc-sections
-                      -Wl,-z,now)
+                      -Wl,-z,now -Wl,--version-script=${TA_EXPORTS})
   set_target_properties(${name} PROPERTIES
-      KEYMASTER_TA ON PREFIX "" SUFFIX ".ta" OUTPUT_NAME ${ARG_UUID}
+      KEYMASTER_TA ON LINK_DEPENDS ${TA_EXPORTS} PREFIX "" SUFFIX ".ta" OUTPUT_NAME ${ARG_UUID}
       LIBRARY_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/ta
       BUILD_RPATH "$ORIGIN/../lib" INSTALL_RPATH "$ORIGIN/..")
   install(TARGETS ${name} LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}/tee)
