@@ -17,10 +17,10 @@ enum class rsa_padding : uint8_t { NONE, PKCS1, OAEP, PSS };
 constexpr size_t AES_BLOCK = 16;  // bytes
 
 struct algorithm {
-  uint32_t id;  // TEE_ALG_
-  family kind;
-  uint32_t modes;     // bit n: TEE_MODE_ n
-  uint32_t key_type;  // TEE_TYPE_ of the secret key or the key pair; 0: takes no key
+  uint32_t id = 0;  // TEE_ALG_
+  family kind = family::DIGEST;
+  uint32_t modes = 0;     // bit n: TEE_MODE_ n
+  uint32_t key_type = 0;  // TEE_TYPE_ of the secret key or the key pair; 0: takes no key
   hash digest = hash::NONE;
   block_mode mode = block_mode::NONE;
   rsa_padding padding = rsa_padding::NONE;

@@ -1,0 +1,217 @@
+// Objects: attributes in and out, their rules, handles, and keys found again.
+#include <algorithm>
+#include <functional>
+
+#include "support.h"
+#include "tee/runtime/object.h"
+
+namespace tee::test {
+namespace {
+
+using objects = in_instance;
+using objects_death = in_instance;
+
+TEE_ObjectHandle allocate(uint32_t type, uint32_t bits) {
+  TEE_ObjectHandle object = nullptr;
+  EXPECT_EQ(TEE_AllocateTransientObject(type, bits, &object), TEE_SUCCESS);
+  return object;
+}
+
+TEST_F(objects, types_and_sizes) {
+  const struct {
+    uint32_t type, bits;
+    TEE_Result result;
+  } rows[] = {
+      {TEE_TYPE_AES, 128, TEE_SUCCESS},
+      {TEE_TYPE_AES, 192, TEE_SUCCESS},
+      {TEE_TYPE_AES, 256, TEE_SUCCESS},
+      {TEE_TYPE_AES, 160, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_TYPE_AES, 0, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_TYPE_HMAC_SHA256, 8, TEE_SUCCESS},
+      {TEE_TYPE_HMAC_SHA512, 1024, TEE_SUCCESS},
+      {TEE_TYPE_HMAC_SHA512, 1032, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_TYPE_HMAC_SHA1, 12, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_TYPE_RSA_KEYPAIR, 504, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_TYPE_RSA_KEYPAIR, 512, TEE_SUCCESS},
+      {TEE_TYPE_RSA_KEYPAIR, 8192, TEE_SUCCESS},
+      {TEE_TYPE_RSA_KEYPAIR, 8200, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_TYPE_ECDSA_KEYPAIR, 521, TEE_SUCCESS},
+      {TEE_TYPE_ECDSA_KEYPAIR, 520, TEE_ERROR_NOT_SUPPORTED},
+      {0xA1234567, 128, TEE_ERROR_NOT_SUPPORTED},
+  };
+  for (const auto& row : rows) {
+    auto object = reinterpret_cast<TEE_ObjectHandle>(uintptr_t{1});
+    EXPECT_EQ(TEE_AllocateTransientObject(row.type, row.bits, &object), row.result)
+        << std::hex << row.type << std::dec << " " << row.bits;
+    EXPECT_EQ(object != nullptr, row.result == TEE_SUCCESS);
+    TEE_FreeTransientObject(object);
+  }
+  EXPECT_EQ(ta_.counts(), host::live_counts{});
+}
+
+TEST_F(objects, a_secret_comes_back_as_it_went_in) {
+  const bytes secret = hex("00000102030405060708090a0b0c0d0e");
+  TEE_ObjectHandle object = allocate(TEE_TYPE_AES, 256);
+  TEE_ObjectInfo info;
+  ASSERT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
+  EXPECT_EQ(info.objectSize, 0U);
+  EXPECT_EQ(info.handleFlags, 0U);
+  // A length that no key has is refused, and the object takes another one.
+  const bytes odd(20);
+  TEE_Attribute attribute = ref(TEE_ATTR_SECRET_VALUE, odd);
+  EXPECT_EQ(TEE_PopulateTransientObject(object, &attribute, 1), TEE_ERROR_BAD_PARAMETERS);
+  attribute = ref(TEE_ATTR_SECRET_VALUE, secret);
+  EXPECT_EQ(TEE_PopulateTransientObject(object, &attribute, 1), TEE_SUCCESS);
+  ASSERT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
+  EXPECT_EQ(info.objectSize, 128U);
+  EXPECT_EQ(info.maxObjectSize, 256U);
+  EXPECT_EQ(info.handleFlags, uint32_t{TEE_HANDLE_FLAG_INITIALIZED});
+  for (size_t capacity : {size_t{0}, size_t{15}, size_t{16}, size_t{17}}) {
+    bytes room(capacity);
+    size_t length = capacity;
+    TEE_Result expected = capacity < 16 ? TEE_ERROR_SHORT_BUFFER : TEE_SUCCESS;
+    EXPECT_EQ(TEE_GetObjectBufferAttribute(object, TEE_ATTR_SECRET_VALUE, room.data(), &length),
+              expected);
+    EXPECT_EQ(length, 16U);
+    if (expected == TEE_SUCCESS) room.resize(16);
+    EXPECT_EQ(room == secret, expected == TEE_SUCCESS);
+  }
+  size_t length = 0;
+  EXPECT_EQ(TEE_GetObjectBufferAttribute(object, TEE_ATTR_RSA_MODULUS, nullptr, &length),
+            TEE_ERROR_ITEM_NOT_FOUND);
+  TEE_CloseObject(object);
+}
+
+TEST_F(objects, generated_secrets_differ) {
+  bytes secrets[2] = {bytes(32), bytes(32)};
+  for (bytes& secret : secrets) {
+    TEE_ObjectHandle object = allocate(TEE_TYPE_AES, 256);
+    ASSERT_EQ(TEE_GenerateKey(object, 256, nullptr, 0), TEE_SUCCESS);
+    size_t length = secret.size();
+    EXPECT_EQ(TEE_GetObjectBufferAttribute(object, TEE_ATTR_SECRET_VALUE, secret.data(), &length),
+              TEE_SUCCESS);
+    TEE_FreeTransientObject(object);
+  }
+  EXPECT_NE(secrets[0], secrets[1]);
+}
+
+// The key behind an object is the one made before for the same secret, until enough others came; a
+// like secret of another type is another key.
+TEST_F(objects, keys_are_found_again) {
+  auto key_of = [&](uint32_t type, uint8_t fill) {
+    TEE_ObjectHandle object = secret_key(type, bytes(32, fill));
+    auto key = ta_.objects().get(object, "test").key;
+    TEE_FreeTransientObject(object);
+    return key;
+  };
+  auto first = key_of(TEE_TYPE_AES, 0);
+  EXPECT_EQ(key_of(TEE_TYPE_AES, 0), first);
+  EXPECT_NE(key_of(TEE_TYPE_HMAC_SHA256, 0), first);
+  for (uint8_t fill = 1; fill < crypto::key_cache::SIZE - 1; ++fill)
+    key_of(TEE_TYPE_AES, fill);
+  EXPECT_EQ(key_of(TEE_TYPE_AES, 0), first);
+  for (uint8_t fill = 100; fill < 100 + crypto::key_cache::SIZE; ++fill) {
+    key_of(TEE_TYPE_AES, fill);
+  }
+  EXPECT_NE(key_of(TEE_TYPE_AES, 0), first);
+}
+
+// The table is bounded, and every slot can be used again.
+TEST_F(objects, handles_are_bounded_and_reused) {
+  std::vector<TEE_ObjectHandle> held;
+  for (int round = 0; round < 2; ++round) {
+    TEE_ObjectHandle object = nullptr;
+    while (TEE_AllocateTransientObject(TEE_TYPE_AES, 128, &object) == TEE_SUCCESS) {
+      EXPECT_LT(reinterpret_cast<uintptr_t>(object), uintptr_t{1} << 31);
+      held.push_back(object);
+    }
+    EXPECT_EQ(object, nullptr);
+    EXPECT_EQ(held.size(), handle_table<tee::object>::SLOTS);
+    for (TEE_ObjectHandle handle : held)
+      TEE_FreeTransientObject(handle);
+    held.clear();
+  }
+  EXPECT_EQ(ta_.counts(), host::live_counts{});
+}
+
+TEST_F(objects_death, programming_errors_panic) {
+  const bytes secret(16);
+  const bytes long_secret(32);
+  TEE_ObjectHandle empty = allocate(TEE_TYPE_AES, 128);
+  TEE_ObjectHandle full = secret_key(TEE_TYPE_AES, secret);
+  TEE_ObjectHandle stale = allocate(TEE_TYPE_AES, 128);
+  TEE_FreeTransientObject(stale);
+  TEE_ObjectHandle recycled = allocate(TEE_TYPE_AES, 128);  // in the slot of the stale one
+  auto made_up = reinterpret_cast<TEE_ObjectHandle>(uintptr_t{0x12345678});
+  auto digest = operation(TEE_ALG_SHA256, TEE_MODE_DIGEST, 0, nullptr);
+  instance other(UUID, shared_device(), HEAP_LIMIT);
+  const TEE_Attribute good = ref(TEE_ATTR_SECRET_VALUE, secret);
+  const TEE_Attribute twice[] = {good, good};
+  const TEE_Attribute too_long = ref(TEE_ATTR_SECRET_VALUE, long_secret);
+  const TEE_Attribute foreign = ref(TEE_ATTR_RSA_MODULUS, secret);
+  TEE_Attribute null_buffer = good;
+  null_buffer.content.ref.buffer = nullptr;
+  TEE_ObjectInfo info;
+  size_t length = 0;
+  TEE_Attribute out;
+  auto read = [&](TEE_ObjectHandle object, uint32_t id) {
+    (void)TEE_GetObjectBufferAttribute(object, id, nullptr, &length);
+  };
+  auto populate_empty = [&](const TEE_Attribute* attributes, uint32_t count) {
+    (void)TEE_PopulateTransientObject(empty, attributes, count);
+  };
+  const struct {
+    const char* message;
+    std::function<void()> call;
+  } rows[] = {
+      {"GetObjectInfo1: object handle .* is not valid", [&] { TEE_GetObjectInfo1(stale, &info); }},
+      {"GetObjectInfo1: object handle .* is not valid",
+       [&] { TEE_GetObjectInfo1(made_up, &info); }},
+      {"GetObjectInfo1: object handle .* is not valid",
+       [&] { TEE_GetObjectInfo1(nullptr, &info); }},
+      {"GetObjectInfo1: object handle .* is not valid",
+       [&] { TEE_GetObjectInfo1(reinterpret_cast<TEE_ObjectHandle>(digest), &info); }},
+      {"GetObjectInfo1: object handle .* is not valid",
+       [&] {
+         instance_scope inside(other);
+         TEE_GetObjectInfo1(full, &info);
+       }},
+      {"FreeTransientObject: object handle .* is not valid",
+       [&] { TEE_FreeTransientObject(stale); }},
+      {"Populate.*: object is initialised already",
+       [&] { (void)TEE_PopulateTransientObject(full, &good, 1); }},
+      {"Populate.*: a mandatory attribute is missing", [&] { populate_empty(nullptr, 0); }},
+      {"Populate.*: an attribute is given twice", [&] { populate_empty(twice, 2); }},
+      {"Populate.*: an attribute does not belong", [&] { populate_empty(&foreign, 1); }},
+      {"Populate.*: a secret of 32 bytes exceeds", [&] { populate_empty(&too_long, 1); }},
+      {"Populate.*: an attribute's buffer is null", [&] { populate_empty(&null_buffer, 1); }},
+      {"Populate.*: attributes are null with count 1", [&] { populate_empty(nullptr, 1); }},
+      {"GenerateKey: object is initialised", [&] { (void)TEE_GenerateKey(full, 128, nullptr, 0); }},
+      {"GenerateKey: key size 256 does not fit",
+       [&] { (void)TEE_GenerateKey(empty, 256, nullptr, 0); }},
+      {"BufferAttribute: object is not initialised", [&] { read(empty, TEE_ATTR_SECRET_VALUE); }},
+      {"BufferAttribute: attribute .* is a value", [&] { read(full, TEE_ATTR_ECC_CURVE); }},
+      {"BufferAttribute: the length of buffer is null",
+       [&] { (void)TEE_GetObjectBufferAttribute(full, TEE_ATTR_SECRET_VALUE, nullptr, nullptr); }},
+      {"InitRefAttribute: attribute .* is a value",
+       [&] { TEE_InitRefAttribute(&out, TEE_ATTR_ECC_CURVE, nullptr, 0); }},
+      {"InitValueAttribute: attribute .* is a buffer",
+       [&] { TEE_InitValueAttribute(&out, TEE_ATTR_SECRET_VALUE, 0, 0); }},
+      {"ReadObjectData: object is not persistent",
+       [&] { (void)TEE_ReadObjectData(full, nullptr, 0, &length); }},
+  };
+  for (const auto& row : rows) {
+    EXPECT_DEATH(row.call(), std::string("panic: TEE_.*") + row.message) << row.message;
+  }
+  EXPECT_NE(recycled, stale);
+}
+
+TEST(objects_outside, calls_need_a_running_trusted_application) {
+  TEE_ObjectHandle object = nullptr;
+  EXPECT_DEATH((void)TEE_AllocateTransientObject(TEE_TYPE_AES, 128, &object),
+               "panic: TEE_AllocateTransientObject: called outside of a trusted application");
+  EXPECT_DEATH((void)TEE_Malloc(1, 0), "panic: TEE_Malloc: called outside");
+}
+
+}  // namespace
+}  // namespace tee::test

@@ -1,0 +1,162 @@
+// Operations: which ones there are, their keys and states, and planned faults.
+#include <functional>
+#include <set>
+
+#include "support.h"
+#include "tee/runtime/host_control.h"
+
+namespace tee::test {
+namespace {
+
+using operations = in_instance;
+using operations_death = in_instance;
+
+TEST_F(operations, algorithms_modes_and_sizes) {
+  const struct {
+    uint32_t algorithm, mode, bits;
+    TEE_Result result;
+  } rows[] = {
+      {TEE_ALG_SHA256, TEE_MODE_DIGEST, 0, TEE_SUCCESS},
+      {TEE_ALG_SHA256, TEE_MODE_MAC, 0, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 512, TEE_SUCCESS},
+      {TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 0, TEE_SUCCESS},
+      {TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 1032, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 128, TEE_SUCCESS},
+      {TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 129, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_ALG_AES_GCM, TEE_MODE_SIGN, 128, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_ALG_AES_CTR, 33, 128, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_ALG_RSA_NOPAD, TEE_MODE_EXPORT, 0, TEE_SUCCESS},
+      {TEE_ALG_RSA_NOPAD, TEE_MODE_SIGN, 2048, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_ALG_RSAES_PKCS1_V1_5, TEE_MODE_EXPORT, 0, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_ALG_RSAES_OAEP_PLATFORM_SHA256, TEE_MODE_DECRYPT, 2048, TEE_SUCCESS},
+      {TEE_ALG_RSASSA_PKCS1_PSS_MGF1_SHA512, TEE_MODE_VERIFY, 8200, TEE_ERROR_NOT_SUPPORTED},
+      {TEE_ALG_ECDSA_P256, TEE_MODE_SIGN, 256, TEE_SUCCESS},
+      {TEE_ALG_ECDSA_P256, TEE_MODE_SIGN, 384, TEE_ERROR_NOT_SUPPORTED},
+      {0x10000311, TEE_MODE_ENCRYPT, 128, TEE_ERROR_NOT_SUPPORTED},
+  };
+  for (const auto& row : rows) {
+    auto made = reinterpret_cast<TEE_OperationHandle>(uintptr_t{1});
+    EXPECT_EQ(TEE_AllocateOperation(&made, row.algorithm, row.mode, row.bits), row.result)
+        << std::hex << row.algorithm << " " << row.mode;
+    EXPECT_EQ(made != nullptr, row.result == TEE_SUCCESS);
+    TEE_FreeOperation(made);
+  }
+  EXPECT_EQ(ta_.counts(), host::live_counts{});
+}
+
+TEST_F(operations_death, calls_that_do_not_fit_panic) {
+  const bytes block(16);
+  uint8_t out[64];
+  size_t length = sizeof(out);
+  size_t tag_length = 16;
+  auto aes = [] { return secret_key(TEE_TYPE_AES, bytes(16)); };
+  auto mac_key = secret_key(TEE_TYPE_HMAC_SHA1, bytes(16));
+  TEE_ObjectHandle empty = nullptr;
+  ASSERT_EQ(TEE_AllocateTransientObject(TEE_TYPE_AES, 128, &empty), TEE_SUCCESS);
+  auto big_key = secret_key(TEE_TYPE_AES, bytes(32));
+  auto digest = operation(TEE_ALG_SHA256, TEE_MODE_DIGEST, 0, nullptr);
+  auto keyless = operation(TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 128, nullptr);
+  auto keyless_mac = operation(TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 256, nullptr);
+  auto initial = operation(TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 128, aes());
+  auto running = operation(TEE_ALG_AES_ECB_NOPAD, TEE_MODE_ENCRYPT, 128, aes());
+  TEE_CipherInit(running, nullptr, 0);
+  auto sealing = operation(TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 128, aes());
+  ASSERT_EQ(TEE_AEInit(sealing, block.data(), 12, 128, 0, 0), TEE_SUCCESS);
+  ASSERT_EQ(TEE_AEUpdate(sealing, block.data(), 1, out, &length), TEE_SUCCESS);
+  const struct {
+    const char* message;
+    std::function<void()> call;
+  } rows[] = {
+      {"SetOperationKey: a digest takes no key", [&] { TEE_SetOperationKey(digest, empty); }},
+      {"SetOperationKey: key is not an initialised", [&] { TEE_SetOperationKey(keyless, empty); }},
+      {"SetOperationKey: key of type", [&] { TEE_SetOperationKey(keyless, mac_key); }},
+      {"SetOperationKey: key of type", [&] { TEE_SetOperationKey(keyless_mac, mac_key); }},
+      {"SetOperationKey: key of 256 bits", [&] { TEE_SetOperationKey(keyless, big_key); }},
+      {"SetOperationKey: operation is initialised", [&] { TEE_SetOperationKey(running, nullptr); }},
+      {"DigestUpdate: operation of algorithm", [&] { TEE_DigestUpdate(initial, out, 1); }},
+      {"DigestUpdate: chunk is null with length 1", [&] { TEE_DigestUpdate(digest, nullptr, 1); }},
+      {"DigestDoFinal: the length of hash is null",
+       [&] { TEE_DigestDoFinal(digest, nullptr, 0, out, nullptr); }},
+      {"MACInit: operation has no key", [&] { TEE_MACInit(keyless_mac, nullptr, 0); }},
+      {"CipherInit: operation has no key", [&] { TEE_CipherInit(keyless, block.data(), 16); }},
+      {"CipherInit: IV of 12 bytes", [&] { TEE_CipherInit(initial, block.data(), 12); }},
+      {"CipherInit: IV of 16 bytes", [&] { TEE_CipherInit(running, block.data(), 16); }},
+      {"CipherUpdate: operation is not initialised",
+       [&] { TEE_CipherUpdate(initial, block.data(), 1, out, &length); }},
+      {"CipherUpdate: destData is null with capacity",
+       [&] { TEE_CipherUpdate(running, block.data(), 1, nullptr, &(length = 5)); }},
+      {"CipherDoFinal: the message ends inside a block",
+       [&] { TEE_CipherDoFinal(running, block.data(), 15, out, &length); }},
+      {"AEInit: operation is initialised already",
+       [&] { TEE_AEInit(sealing, block.data(), 12, 128, 0, 0); }},
+      {"AEUpdateAAD: associated data after payload",
+       [&] { TEE_AEUpdateAAD(sealing, block.data(), 1); }},
+      {"AEDecryptFinal: operation is of mode 0, not 1",
+       [&] { TEE_AEDecryptFinal(sealing, nullptr, 0, nullptr, &(length = 0), out, 16); }},
+      {"AEEncryptFinal: operation of algorithm",
+       [&] { TEE_AEEncryptFinal(running, nullptr, 0, out, &length, out, &tag_length); }},
+      {"AsymmetricSignDigest: operation of algorithm",
+       [&] { TEE_AsymmetricSignDigest(running, nullptr, 0, out, 1, out, &length); }},
+      {"Panic: code 0xffff0007", [&] { TEE_Panic(TEE_ERROR_BAD_STATE); }},
+  };
+  for (const auto& row : rows) {
+    EXPECT_DEATH(row.call(), std::string("panic: TEE_") + row.message) << row.message;
+  }
+}
+
+// A whole use of the platform, stopped at each call that can fail in turn.
+TEE_Result use_everything(std::set<TEE_Result>* seen) {
+  auto note = [seen](TEE_Result result) {
+    seen->insert(result);
+    return result;
+  };
+  const bytes data(16);
+  uint8_t out[64];
+  size_t length = sizeof(out);
+  size_t tag_length = 16;
+  void* block = TEE_Malloc(10, 0);
+  if (!block) return note(TEE_ERROR_OUT_OF_MEMORY);
+  TEE_Free(block);
+  TEE_UUID uuid;
+  if (auto res = TEE_GetPropertyAsUUID(TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.deviceID", &uuid)) {
+    return note(res);
+  }
+  if (auto res = GetBootSeed(out, 32)) return note(res);
+  TEE_ObjectHandle key = nullptr;
+  TEE_OperationHandle op = nullptr;
+  TEE_Result res = TEE_AllocateTransientObject(TEE_TYPE_AES, 128, &key);
+  if (!res) res = TEE_GenerateKey(key, 128, nullptr, 0);
+  if (!res) res = TEE_AllocateOperation(&op, TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 128);
+  if (!res) res = TEE_SetOperationKey(op, key);
+  if (!res) res = TEE_AEInit(op, data.data(), 12, 128, 0, 0);
+  if (!res) res = TEE_AEUpdate(op, data.data(), 16, out, &length);
+  if (!res) res = TEE_AEEncryptFinal(op, nullptr, 0, nullptr, &(length = 0), out, &tag_length);
+  TEE_FreeOperation(op);
+  TEE_FreeTransientObject(key);
+  return note(res);
+}
+
+TEST_F(operations, every_fault_is_reported_and_leaves_nothing) {
+  constexpr TEE_Result CODE = TEE_ERROR_STORAGE_NO_SPACE;
+  std::set<TEE_Result> seen;
+  uint64_t faults = 0;
+  for (;;) {
+    uint64_t before = host::fallible_calls();
+    host::fail_nth_call(faults + 1, CODE);
+    TEE_Result res = use_everything(&seen);
+    EXPECT_EQ(ta_.counts(), host::live_counts{});
+    if (!host::fault_fired()) {
+      EXPECT_EQ(res, TEE_SUCCESS);
+      EXPECT_EQ(host::fallible_calls() - before, faults);
+      break;
+    }
+    EXPECT_NE(res, TEE_SUCCESS);
+    ++faults;
+  }
+  host::clear_fault();
+  EXPECT_EQ(faults, 10U);
+  EXPECT_EQ(seen, (std::set<TEE_Result>{TEE_SUCCESS, CODE, TEE_ERROR_OUT_OF_MEMORY}));
+}
+
+}  // namespace
+}  // namespace tee::test

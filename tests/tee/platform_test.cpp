@@ -1,0 +1,140 @@
+// Properties, time, trace and random.
+#include <algorithm>
+#include <string>
+
+#include "support.h"
+#include "tee/runtime/host_control.h"
+
+namespace tee::test {
+namespace {
+
+using platform = in_instance;
+using platform_death = in_instance;
+
+TEST_F(platform, properties_as_text) {
+  const TEE_Identity client{TEE_LOGIN_TRUSTED_APP, UUID};
+  ta_.set_client(&client);
+  ta_.properties()["gpd.ta.singleInstance"] = true;
+  ta_.properties()["gpd.ta.dataSize"] = uint32_t{4096};
+  const struct {
+    TEE_PropSetHandle set;
+    const char* name;
+    const char* text;
+  } rows[] = {
+      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.deviceID", "01020304-0506-0708-090a-0b0c0d0e0f10"},
+      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.trustedos.manufacturer", "Keymaster"},
+      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.systemTime.protectionLevel", "100"},
+      {TEE_PROPSET_CURRENT_TA, "gpd.ta.appID", "01020304-0506-0708-090a-0b0c0d0e0f10"},
+      {TEE_PROPSET_CURRENT_TA, "gpd.ta.singleInstance", "true"},
+      {TEE_PROPSET_CURRENT_TA, "gpd.ta.dataSize", "4096"},
+      {TEE_PROPSET_CURRENT_CLIENT, "gpd.client.identity",
+       "4026531840:01020304-0506-0708-090a-0b0c0d0e0f10"},
+  };
+  for (const auto& row : rows) {
+    const std::string expected = row.text;
+    for (size_t capacity = 0; capacity <= expected.size() + 2; ++capacity) {
+      std::vector<char> room(capacity, 'x');
+      size_t length = capacity;
+      TEE_Result result = TEE_GetPropertyAsString(row.set, row.name, room.data(), &length);
+      bool fits = capacity > expected.size();
+      EXPECT_EQ(result, fits ? TEE_SUCCESS : TEE_ERROR_SHORT_BUFFER) << row.name;
+      EXPECT_EQ(length, expected.size() + 1);
+      if (capacity > 0) {
+        EXPECT_EQ(std::string(room.data()), expected.substr(0, capacity - 1));
+      }
+    }
+    size_t length = 0;
+    const std::string other = std::string(row.name) + ".x";
+    EXPECT_EQ(TEE_GetPropertyAsString(row.set, other.c_str(), nullptr, &length),
+              TEE_ERROR_ITEM_NOT_FOUND);
+  }
+}
+
+TEST_F(platform, properties_as_uuid_and_identity) {
+  TEE_UUID uuid{};
+  ASSERT_EQ(TEE_GetPropertyAsUUID(TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.deviceID", &uuid),
+            TEE_SUCCESS);
+  EXPECT_EQ(uuid.timeLow, 0x01020304U);
+  EXPECT_EQ(TEE_GetPropertyAsUUID(TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.description", &uuid),
+            TEE_ERROR_BAD_FORMAT);
+  TEE_Identity identity{};
+  auto get = [&] {
+    return TEE_GetPropertyAsIdentity(TEE_PROPSET_CURRENT_CLIENT, "gpd.client.identity", &identity);
+  };
+  EXPECT_EQ(get(), TEE_ERROR_ITEM_NOT_FOUND);
+  const TEE_Identity client{TEE_LOGIN_USER, UUID};
+  ta_.set_client(&client);
+  EXPECT_EQ(get(), TEE_SUCCESS);
+  EXPECT_EQ(identity.login, uint32_t{TEE_LOGIN_USER});
+  EXPECT_EQ(TEE_GetPropertyAsIdentity(TEE_PROPSET_CURRENT_TA, "gpd.ta.appID", &identity),
+            TEE_ERROR_BAD_FORMAT);
+}
+
+TEST_F(platform, both_clocks) {
+  host::set_clocks(12345678, 1700000000999);
+  TEE_Time time{};
+  TEE_GetSystemTime(&time);
+  EXPECT_EQ(time.seconds, 12345U);
+  EXPECT_EQ(time.millis, 678U);
+  host::advance_clocks(1);
+  TEE_GetREETime(&time);
+  EXPECT_EQ(time.seconds, 1700000001U);
+  EXPECT_EQ(time.millis, 0U);
+  host::use_real_clocks();
+}
+
+TEST_F(platform, trace_lines_are_filtered) {
+  static std::string seen;
+  seen.clear();
+  host::set_trace_sink(
+      [](void*, uint32_t level, const char* line, size_t length) {
+        seen += std::to_string(level) + std::string(line, length);
+      },
+      nullptr);
+  host::set_trace_level(TEE_TRACE_INFO);
+  for (uint32_t level = 1; level <= 4; ++level)
+    TEE_TraceWrite(level, "line\n", 5);
+  host::set_trace_level(0);
+  TEE_TraceWrite(TEE_TRACE_ERROR, "none\n", 5);
+  host::set_trace_level(TEE_TRACE_ERROR);
+  host::set_trace_sink(nullptr, nullptr);
+  EXPECT_EQ(seen, "1line\n2line\n");
+}
+
+TEST_F(platform, random_fills_exactly) {
+  bytes first(1000);
+  bytes second(1000);
+  TEE_GenerateRandom(first.data(), first.size());
+  TEE_GenerateRandom(second.data(), second.size() - 1);
+  TEE_GenerateRandom(nullptr, 0);
+  EXPECT_NE(first, second);
+  EXPECT_EQ(second.back(), 0);
+  EXPECT_LT(std::count(first.begin(), first.end(), 0), 50);
+}
+
+TEST_F(platform, boot_seed_and_replay_protected_storage) {
+  bytes seeds[2] = {bytes(32), bytes(32)};
+  for (bytes& seed : seeds)
+    EXPECT_EQ(GetBootSeed(seed.data(), seed.size()), TEE_SUCCESS);
+  EXPECT_EQ(seeds[0], seeds[1]);
+  EXPECT_NE(seeds[0], bytes(32));
+  bytes longer(33);
+  EXPECT_EQ(GetBootSeed(longer.data(), longer.size()), TEE_ERROR_BAD_PARAMETERS);
+  uint32_t state = 0;
+  for (int start = 0; start < 2; ++start)
+    EXPECT_EQ(TEE_RPMB_MakeFileSystem(&state), TEE_SUCCESS);
+}
+
+TEST_F(platform_death, programming_errors_panic) {
+  size_t length = 0;
+  auto no_set = reinterpret_cast<TEE_PropSetHandle>(uintptr_t{5});
+  EXPECT_DEATH((void)TEE_GetPropertyAsString(no_set, "gpd.ta.appID", nullptr, &length),
+               "panic: TEE_GetPropertyAsString: .* is not a property set");
+  EXPECT_DEATH((void)TEE_GetPropertyAsString(TEE_PROPSET_CURRENT_TA, nullptr, nullptr, &length),
+               "panic: TEE_GetPropertyAsString: name is null");
+  EXPECT_DEATH(TEE_GetSystemTime(nullptr), "panic: TEE_GetSystemTime: time is null");
+  EXPECT_DEATH(TEE_GenerateRandom(nullptr, 1), "panic: TEE_GenerateRandom: .* is null");
+}
+
+}  // namespace
+}  // namespace tee::test

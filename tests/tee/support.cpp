@@ -1,0 +1,75 @@
+// API calls without a trusted application.
+#include "support.h"
+
+#include <string>
+
+#include "temp_device.h"
+
+namespace tee::test {
+namespace {
+
+struct open_device {
+  temp_device folder;
+  std::unique_ptr<device> open = folder.open();
+};
+
+}  // namespace
+
+bytes hex(std::string_view text) {
+  bytes result;
+  std::string digits;
+  for (char c : text) {
+    if (c == ' ') continue;
+    digits.push_back(c);
+    if (digits.size() < 2) continue;
+    result.push_back(static_cast<uint8_t>(std::stoul(digits, nullptr, 16)));
+    digits.clear();
+  }
+  return result;
+}
+
+device& shared_device() {
+  static open_device shared;
+  return *shared.open;
+}
+
+TEE_Attribute ref(uint32_t id, const bytes& value) {
+  TEE_Attribute attribute;
+  TEE_InitRefAttribute(&attribute, id, value.data(), value.size());
+  return attribute;
+}
+
+TEE_Attribute value(uint32_t id, uint32_t a, uint32_t b) {
+  TEE_Attribute attribute;
+  TEE_InitValueAttribute(&attribute, id, a, b);
+  return attribute;
+}
+
+TEE_ObjectHandle populate(uint32_t type, uint32_t bits,
+                          const std::vector<TEE_Attribute>& attributes, TEE_Result* result) {
+  TEE_ObjectHandle object = nullptr;
+  EXPECT_EQ(TEE_AllocateTransientObject(type, bits, &object), TEE_SUCCESS);
+  *result = TEE_PopulateTransientObject(object, attributes.data(),
+                                        static_cast<uint32_t>(attributes.size()));
+  return object;
+}
+
+TEE_ObjectHandle secret_key(uint32_t type, const bytes& secret) {
+  TEE_Result result = TEE_SUCCESS;
+  auto bits = static_cast<uint32_t>(secret.size() * 8);
+  TEE_ObjectHandle key = populate(type, bits, {ref(TEE_ATTR_SECRET_VALUE, secret)}, &result);
+  EXPECT_EQ(result, TEE_SUCCESS);
+  return key;
+}
+
+TEE_OperationHandle operation(uint32_t algorithm, uint32_t mode, uint32_t bits,
+                              TEE_ObjectHandle key) {
+  TEE_OperationHandle made = nullptr;
+  EXPECT_EQ(TEE_AllocateOperation(&made, algorithm, mode, bits), TEE_SUCCESS);
+  if (!key) return made;
+  EXPECT_EQ(TEE_SetOperationKey(made, key), TEE_SUCCESS);
+  TEE_FreeTransientObject(key);
+  return made;
+}
+
+}  // namespace tee::test
