@@ -1,0 +1,124 @@
+// The commands as the tests send them.
+#include "support/ta_under_test.h"
+
+namespace keymaster::test {
+namespace {
+
+request make(command id, bytes input, size_t capacity = 0) {
+  return {.id = static_cast<uint32_t>(id), .input = std::move(input), .capacity = capacity};
+}
+
+}  // namespace
+
+request configure_request(const param_set& params) {
+  return make(command::CONFIGURE, params.marshal());
+}
+
+request generate_request(const param_set& description, size_t capacity) {
+  return make(command::GENERATE_KEY, description.marshal(), capacity);
+}
+
+request import_request(const param_set& description, byte_view key_data, size_t capacity) {
+  return make(command::IMPORT_KEY,
+              client::field_writer().field(description.marshal()).raw(key_data).take(), capacity);
+}
+
+request key_request(command id, byte_view blob, const client::application& app, size_t capacity) {
+  return make(id, client::field_writer().field(blob).field(app.id).field(app.data).take(),
+              capacity);
+}
+
+request upgrade_request(byte_view blob, const param_set& params, size_t capacity) {
+  return make(command::UPGRADE_KEY,
+              client::field_writer().field(params.marshal()).field(blob).take(), capacity);
+}
+
+request begin_request(uint32_t purpose, byte_view blob, const param_set& params, size_t capacity) {
+  request what = make(command::BEGIN,
+                      client::field_writer().field(blob).field(params.marshal()).take(), capacity);
+  what.a = purpose;
+  return what;
+}
+
+request step_request(command id, uint32_t handle, byte_view input, const param_set& params,
+                     size_t capacity) {
+  request what =
+      make(id, client::field_writer().field(input).field(params.marshal()).take(), capacity);
+  what.a = handle;
+  return what;
+}
+
+request abort_request(uint32_t handle) {
+  request what = make(command::ABORT, {});
+  what.a = handle;
+  return what;
+}
+
+reply ta_under_test::configure(uint32_t os_version, uint32_t os_patchlevel) {
+  param_set params;
+  params.add(KM_TAG_OS_VERSION, os_version).add(KM_TAG_OS_PATCHLEVEL, os_patchlevel);
+  return send(configure_request(params));
+}
+
+bytes ta_under_test::generate(const param_set& description) {
+  const reply answer = send(generate_request(description));
+  EXPECT_TRUE(succeeded(answer)) << trace_.errors();
+  return {answer.output().begin(), answer.output().end()};
+}
+
+bytes ta_under_test::import(const param_set& description, byte_view key_data) {
+  const reply answer = send(import_request(description, key_data));
+  EXPECT_TRUE(succeeded(answer)) << trace_.errors();
+  client::key_result imported;
+  if (answer.ok()) client::parse_imported(answer.output(), &imported);
+  return imported.blob;
+}
+
+param_set ta_under_test::characteristics(byte_view blob, const client::application& app) {
+  const reply answer = send(key_request(command::GET_KEY_CHARACTER, blob, app));
+  EXPECT_TRUE(succeeded(answer)) << trace_.errors();
+  return answer.ok() ? param_set::parse(answer.output()) : param_set();
+}
+
+reply ta_under_test::begin(uint32_t purpose, byte_view blob, const param_set& params) {
+  return send(begin_request(purpose, blob, params));
+}
+
+uint32_t ta_under_test::begun(uint32_t purpose, byte_view blob, const param_set& params) {
+  const reply answer = begin(purpose, blob, params);
+  EXPECT_TRUE(succeeded(answer)) << trace_.errors();
+  return answer.b;
+}
+
+reply ta_under_test::update(uint32_t handle, byte_view input, const param_set& params) {
+  return send(step_request(command::UPDATE, handle, input, params, input.size() + AMPLE));
+}
+
+reply ta_under_test::finish(uint32_t handle, byte_view input, const param_set& params) {
+  return send(step_request(command::FINISH, handle, input, params));
+}
+
+reply ta_under_test::abort(uint32_t handle) {
+  return send(abort_request(handle));
+}
+
+reply ta_under_test::upgrade(byte_view blob, const param_set& params) {
+  return send(upgrade_request(blob, params));
+}
+
+bytes ta_under_test::run(uint32_t purpose, byte_view blob, const param_set& params,
+                         byte_view input) {
+  const uint32_t handle = begun(purpose, blob, params);
+  const reply updated = update(handle, input);
+  EXPECT_TRUE(succeeded(updated)) << trace_.errors();
+  EXPECT_EQ(updated.b, input.size());
+  bytes output(updated.output().begin(), updated.output().end());
+  const reply finished = finish(handle);
+  EXPECT_TRUE(succeeded(finished)) << trace_.errors();
+  client::finish_result rest;
+  if (finished.ok()) client::parse_finished(finished.output(), &rest);
+  output.insert(output.end(), rest.output.begin(), rest.output.end());
+  return output;
+}
+
+}  // namespace keymaster::test

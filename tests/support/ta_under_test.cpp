@@ -1,0 +1,224 @@
+#include "support/ta_under_test.h"
+
+#include <algorithm>
+#include <filesystem>
+#include <stdlib.h>
+
+namespace keymaster::test {
+namespace {
+
+using tee::host::live_counts;
+
+// In memory where there is such a folder, since every start of a device syncs files.
+std::string make_folder() {
+  const std::filesystem::path memory = "/dev/shm";
+  const auto parent =
+      std::filesystem::exists(memory) ? memory : std::filesystem::temp_directory_path();
+  std::string path = (parent / "keymaster-test-XXXXXX").string();
+  if (mkdtemp(path.data()) == nullptr) throw std::runtime_error("no temporary folder");
+  return path;
+}
+
+uint32_t default_types(uint32_t id) {
+  constexpr uint32_t VALUE = TEEC_VALUE_INOUT;
+  switch (id) {
+    case 14:
+    case 21:
+    case 25:
+      return TEEC_PARAM_TYPES(VALUE, TEEC_MEMREF_TEMP_INPUT, 0, 0);
+    case 22:
+    case 23:
+    case 0xFF00:
+    case 0xFF01:
+      return TEEC_PARAM_TYPES(VALUE, 0, 0, 0);
+    case 0xFF02:
+    case 0xFF03:
+      return TEEC_PARAM_TYPES(TEEC_VALUE_OUTPUT, 0, TEEC_MEMREF_TEMP_OUTPUT, 0);
+    case 0xFF04:
+      return TEEC_PARAM_TYPES(0, TEEC_MEMREF_TEMP_INPUT, 0, 0);
+    default:
+      return TEEC_PARAM_TYPES(VALUE, TEEC_MEMREF_TEMP_INPUT, TEEC_MEMREF_TEMP_OUTPUT, 0);
+  }
+}
+
+bool is_memory(uint32_t types, int slot) {
+  return (types >> (4 * slot) & 0xF) >= TEEC_MEMREF_TEMP_INPUT;
+}
+
+live_counts sum(const live_counts& a, const live_counts& b) {
+  return {a.heap_bytes + b.heap_bytes, a.heap_blocks + b.heap_blocks, a.objects + b.objects,
+          a.operations + b.operations, a.sessions + b.sessions};
+}
+
+live_counts difference(const live_counts& a, const live_counts& b) {
+  return {a.heap_bytes - b.heap_bytes, a.heap_blocks - b.heap_blocks, a.objects - b.objects,
+          a.operations - b.operations, a.sessions - b.sessions};
+}
+
+std::string text(const live_counts& counts) {
+  return std::to_string(counts.heap_bytes) + " bytes in " + std::to_string(counts.heap_blocks) +
+         " blocks, " + std::to_string(counts.objects) + " objects, " +
+         std::to_string(counts.operations) + " operations, " + std::to_string(counts.sessions) +
+         " sessions";
+}
+
+testing::AssertionResult judge(bool as_wanted, const reply& answer) {
+  const client::status outcome{answer.res, answer.origin, answer.km_error};
+  return (as_wanted ? testing::AssertionSuccess() : testing::AssertionFailure()) << outcome.text();
+}
+
+// A copy in a heap block of exactly its size, as is the room for outputs.
+std::unique_ptr<uint8_t[]> exact_block(byte_view content) {
+  auto block = std::make_unique<uint8_t[]>(content.size());
+  std::ranges::copy(content, block.get());
+  return block;
+}
+
+}  // namespace
+
+byte_view reply::output() const {
+  return ok() ? byte_view(buffer).first(std::min(output_size, buffer.size())) : byte_view();
+}
+
+testing::AssertionResult succeeded(const reply& answer) {
+  return judge(answer.ok(), answer);
+}
+
+testing::AssertionResult refused(const reply& answer, int32_t km_error) {
+  return judge(answer.res == TEEC_SUCCESS && answer.km_error == km_error, answer);
+}
+
+testing::AssertionResult failed_with(const reply& answer, TEEC_Result res) {
+  return judge(answer.res == res, answer);
+}
+
+ta_under_test::ta_under_test(const options& wanted)
+    : options_(wanted), path_(make_folder()), trace_(wanted.trace_level) {
+  tee::host::clear_fault();
+  tee::host::set_clocks(START_SYSTEM_MS, START_REE_MS);
+  tee::host::set_block_hook(inspect_freed, this);
+  tee::device_settings settings;
+  settings.id = DEVICE_ID;
+  settings.rpmb = wanted.rpmb;
+  tee::device::create(path_, settings);
+  EXPECT_EQ(start(), TEEC_SUCCESS) << trace_.errors();
+}
+
+ta_under_test::~ta_under_test() {
+  stop();
+  tee::host::set_block_hook(nullptr, nullptr);
+  tee::host::use_real_clocks();
+  tee::host::clear_fault();
+  std::error_code ignored;
+  std::filesystem::remove_all(path_, ignored);
+}
+
+reply ta_under_test::send(const request& what) {
+  trace_.clear();
+  const uint32_t types = what.types.value_or(default_types(what.id));
+  const auto input = exact_block(what.input);
+  const auto output = exact_block(bytes(what.capacity, UNTOUCHED));
+  client::parameter_slots slots{};
+  slots[0].value = {what.a, what.b};
+  if (is_memory(types, 0)) slots[0].tmpref = {};
+  if (is_memory(types, 1)) slots[1].tmpref = {input.get(), what.input.size()};
+  if (is_memory(types, 2)) slots[2].tmpref = {output.get(), what.capacity};
+
+  const live_counts before = counts();
+  const client::status outcome = session_->invoke(what.id, types, &slots);
+  reply answer{
+      outcome.tee,         outcome.origin, 0, 0, bytes(output.get(), output.get() + what.capacity),
+      slots[2].tmpref.size};
+  if (!is_memory(types, 0)) {
+    answer.km_error = static_cast<int32_t>(slots[0].value.a);
+    answer.b = slots[0].value.b;
+  }
+  EXPECT_TRUE(std::ranges::equal(what.input, byte_view(input.get(), what.input.size())))
+      << "command " << what.id << " wrote to its input";
+  account(what, answer, before);
+  return answer;
+}
+
+// Every command is told from what it left alive: a begin that is done adds an operation; update,
+// finish and _abort with its handle change or end it; everything else leaves all as it was.
+void ta_under_test::account(const request& what, const reply& answer, const live_counts& before) {
+  const auto id = static_cast<command>(what.id);
+  const auto live = live_.find(what.a);
+  const bool on_live = (id == command::UPDATE || id == command::FINISH || id == command::ABORT) &&
+                       live != live_.end() && !what.types && what.b == 0;
+  const live_counts after = counts();
+  live_counts expected = before;
+  if (id == command::BEGIN && answer.ok()) {
+    live_[answer.b] = difference(after, before);
+    return;
+  }
+  if (on_live && id == command::UPDATE && answer.ok()) {
+    live->second = sum(live->second, difference(after, before));
+    return;
+  }
+  if (on_live) {
+    expected = difference(before, live->second);
+    live_.erase(live);
+  }
+  EXPECT_EQ(text(after), text(expected))
+      << "left by command " << what.id << ": " << trace_.errors();
+}
+
+live_counts ta_under_test::counts() const {
+  live_counts counted;
+  EXPECT_TRUE(tee::host::counts_of(KEYMASTER_TA, &counted)) << "no instance is alive";
+  return counted;
+}
+
+void ta_under_test::inspect_freed(void* self, tee::host::block_stage stage, const uint8_t* block,
+                                  size_t size) {
+  if (stage != tee::host::block_stage::RELEASED) return;
+  const byte_view freed(block, size);
+  for (const bytes& secret : static_cast<ta_under_test*>(self)->secrets_) {
+    EXPECT_TRUE(std::ranges::search(freed, secret).empty())
+        << "a block of " << size << " bytes was freed with a secret in it";
+  }
+}
+
+void ta_under_test::stop() {
+  session_.reset();
+  context_.reset();
+  live_.clear();
+}
+
+TEEC_Result ta_under_test::start() {
+  trace_.clear();
+  try {
+    context_.emplace(path_);
+    session_ = std::make_unique<client::connection>(*context_, client::KEYMASTER_UUID);
+  } catch (const client::open_error& error) {
+    stop();
+    return error.reason().tee;
+  }
+  if (options_.configured) {
+    EXPECT_TRUE(succeeded(configure(OS_VERSION, OS_PATCHLEVEL)));
+  }
+  return TEEC_SUCCESS;
+}
+
+void ta_under_test::restart() {
+  stop();
+  ASSERT_EQ(start(), TEEC_SUCCESS) << trace_.errors();
+}
+
+void ta_under_test::reboot() {
+  stop();
+  tee::device::reboot(path_);
+  ASSERT_EQ(start(), TEEC_SUCCESS) << trace_.errors();
+}
+
+void ta_under_test::change_session() {
+  auto other = std::make_unique<client::connection>(*context_, client::KEYMASTER_UUID);
+  session_ = std::move(other);
+}
+
+bytes ta_under_test::token(const client::token_request& what) {
+  return client::authenticator(*context_).issue(what).data;
+}
+
+}  // namespace keymaster::test

@@ -1,0 +1,172 @@
+// The test harness: a device in a temporary folder and a Keymaster TA on it, reached through its
+// command interface alone. Inputs and outputs lie in heap blocks of exactly their size, sets are
+// built by the client library, both clocks stand still until a test moves them, and every command
+// is followed by a check that it left nothing behind: heap, objects, operations and sessions are as
+// before, apart from what live operations hold.
+#pragma once
+
+#include "tee_client_api.h"
+#include "tee_extensions.h"
+
+#include <cstdint>
+#include <gtest/gtest.h>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "client/authenticator.h"
+#include "client/session.h"
+#include "support/trace_capture.h"
+#include "tee/device/device.h"
+#include "tee/runtime/host_control.h"
+
+namespace keymaster::test {
+
+using client::byte_view;
+using client::bytes;
+using client::command;
+using client::param_set;
+
+// The system that the TA is configured with, and the times at which tests begin.
+constexpr uint32_t OS_VERSION = 80100;
+constexpr uint32_t OS_PATCHLEVEL = 201812;
+constexpr uint64_t START_SYSTEM_MS = 5'000'250;
+constexpr uint64_t START_REE_MS = 1'700'000'000'500;
+
+// The identity of the device: the same in every test, so that stored blobs of a device without RPMB
+// open for ever.
+constexpr TEE_UUID DEVICE_ID = {
+    0x00112233, 0x4455, 0x6677, {0x88, 0x99, 0xaa, 0xbb, 0xcc, 0xdd, 0xee, 0xff}};
+constexpr TEE_UUID KEYMASTER_TA = {
+    0xc1f6d2a8, 0x3b0e, 0x4f57, {0x9a, 0x6d, 0x2e, 0x8b, 0x77, 0x40, 0xd3, 0xf1}};
+
+// What the output buffer holds before a command.
+constexpr uint8_t UNTOUCHED = 0xC3;
+
+// A command as it is sent: the default types are those that its table entry wants.
+struct request {
+  uint32_t id;
+  uint32_t a = 0;
+  bytes input = {};
+  size_t capacity = 0;  // of the output buffer, if the command has one
+  uint32_t b = 0;
+  std::optional<uint32_t> types = std::nullopt;
+};
+
+// What came back. A command is done when neither result tells of a failure.
+struct reply {
+  TEEC_Result res;
+  uint32_t origin;
+  int32_t km_error;    // slot 0 a
+  uint32_t b;          // slot 0 b
+  bytes buffer;        // the whole output buffer as the TA left it, `capacity` bytes
+  size_t output_size;  // as slot 2 says
+
+  bool ok() const { return res == TEEC_SUCCESS && km_error == KM_ERROR_OK; }
+  // The bytes that were produced: the first output_size of the buffer. Empty unless done.
+  byte_view output() const;
+};
+
+// For EXPECT_TRUE. succeeded: neither result tells of a failure. refused: TEE success and that
+// Keymaster error. failed_with: that TEE result.
+testing::AssertionResult succeeded(const reply& answer);
+testing::AssertionResult refused(const reply& answer, int32_t km_error);
+testing::AssertionResult failed_with(const reply& answer, TEEC_Result res);
+
+// The requests of the commands, in their layouts. A capacity is large enough unless given.
+constexpr size_t AMPLE = 8192;
+request configure_request(const param_set& params);
+request generate_request(const param_set& description, size_t capacity = AMPLE);
+request import_request(const param_set& description, byte_view key_data, size_t capacity = AMPLE);
+// For GET_KEY_CHARACTER_SIZE, GET_KEY_CHARACTER and EXPORT_KEY.
+request key_request(command id, byte_view blob, const client::application& app = {},
+                    size_t capacity = AMPLE);
+request upgrade_request(byte_view blob, const param_set& params = {}, size_t capacity = AMPLE);
+request begin_request(uint32_t purpose, byte_view blob, const param_set& params = {},
+                      size_t capacity = AMPLE);
+// For UPDATE and FINISH.
+request step_request(command id, uint32_t handle, byte_view input = {},
+                     const param_set& params = {}, size_t capacity = AMPLE);
+request abort_request(uint32_t handle);
+
+struct options {
+  bool rpmb = true;
+  bool configured = true;  // configure after every start
+  uint32_t trace_level = TEE_TRACE_INFO;
+};
+
+// ta_under_test: one device, and the instance that runs on it. A failed expectation in here is a
+// failure of the test.
+class ta_under_test {
+ public:
+  explicit ta_under_test(const options& wanted = {});
+  ta_under_test(const ta_under_test&) = delete;
+  ta_under_test& operator=(const ta_under_test&) = delete;
+  ~ta_under_test();
+
+  // send: one command, with the checks that this file begins with.
+  reply send(const request& what);
+
+  // Commands with their usual arguments. generate and import expect success and return the blob.
+  reply configure(uint32_t os_version, uint32_t os_patchlevel);
+  bytes generate(const param_set& description);
+  bytes import(const param_set& description, byte_view key_data);
+  // The characteristics of a key whose opening must succeed.
+  param_set characteristics(byte_view blob, const client::application& app = {});
+  reply begin(uint32_t purpose, byte_view blob, const param_set& params = {});
+  // The handle of a begin that must succeed.
+  uint32_t begun(uint32_t purpose, byte_view blob, const param_set& params = {});
+  reply update(uint32_t handle, byte_view input, const param_set& params = {});
+  reply finish(uint32_t handle, byte_view input = {}, const param_set& params = {});
+  reply abort(uint32_t handle);
+  reply upgrade(byte_view blob, const param_set& params = {});
+  // begin, update and finish of a use that must succeed; returns the output of both.
+  bytes run(uint32_t purpose, byte_view blob, const param_set& params, byte_view input);
+
+  // A token of the device's authenticator.
+  bytes token(const client::token_request& what);
+
+  // stop ends the instance and closes the device; start opens it and a new instance and returns
+  // what opening the session returned. restart does both and must succeed, reboot restarts with a
+  // new boot of the device: a new seed, while the clocks of the test stay as they are.
+  void stop();
+  TEEC_Result start();
+  void restart();
+  void reboot();
+
+  // change_session: opens another session with the instance and closes the one that was used.
+  void change_session();
+
+  // advance: moves both clocks forward.
+  static void advance(uint64_t ms) { tee::host::advance_clocks(ms); }
+
+  // The trace lines of the last command (or start).
+  const trace_capture& trace() const { return trace_; }
+
+  // The device's folder, for tests that change what is stored there while it is stopped.
+  const std::string& path() const { return path_; }
+
+  // watch_secret: from now on no block of TA memory may be freed with these bytes in it.
+  void watch_secret(byte_view secret) { secrets_.emplace_back(secret.begin(), secret.end()); }
+
+  size_t live_operations() const { return live_.size(); }
+
+ private:
+  tee::host::live_counts counts() const;
+  void account(const request& what, const reply& answer, const tee::host::live_counts& before);
+  static void inspect_freed(void* self, tee::host::block_stage stage, const uint8_t* block,
+                            size_t size);
+
+  options options_;
+  std::string path_;
+  trace_capture trace_;
+  std::vector<bytes> secrets_;
+  std::optional<client::context> context_;
+  std::unique_ptr<client::connection> session_;
+  std::map<uint32_t, tee::host::live_counts> live_;  // what each live operation holds
+};
+
+}  // namespace keymaster::test

@@ -1,0 +1,111 @@
+// The form of trace lines, and of the dump of a parameter set.
+#include "base/trace.h"
+
+#include <gtest/gtest.h>
+
+#include "keymaster/params/dump.h"
+#include "platform.h"
+
+namespace keymaster {
+namespace {
+
+constexpr trace_site AT = {"begin", 120};
+
+class Trace : public testing::Test {
+ protected:
+  void SetUp() override { platform::reset(); }
+};
+
+TEST_F(Trace, NamesLevelThreadFunctionAndLine) {
+  const struct {
+    uint32_t level;
+    uint32_t thread;
+    const char* message;
+    const char* line;
+  } cases[] = {
+      {1, 0x2a, "newline\n", "ERR [0x2a] KEYMASTER:begin:120: newline\n"},
+      {1, 0x2a, "none", "ERR [0x2a] KEYMASTER:begin:120: none\n"},
+      {2, 0, "", "INF KEYMASTER:begin:120: \n"},
+      {3, 1, "x", "DBG [0x1] KEYMASTER:begin:120: x\n"},
+      {4, 1, "x", "FLW [0x1] KEYMASTER:begin:120: x\n"},
+      {0, 1, "x", "UKN [0x1] KEYMASTER:begin:120: x\n"},
+  };
+  platform::trace_threshold = TEE_TRACE_FLOW;
+  for (const auto& c : cases) {
+    platform::trace_lines.clear();
+    platform::trace_thread = c.thread;
+    trace(c.level, AT, "%s", c.message);
+    EXPECT_EQ(platform::trace_lines, std::vector<std::string>{c.line});
+  }
+}
+
+TEST_F(Trace, DropsWhatIsAboveTheThreshold) {
+  platform::trace_threshold = TEE_TRACE_INFO;
+  trace(TEE_TRACE_DEBUG, AT, "dropped");
+  trace(TEE_TRACE_INFO, AT, "kept");
+  EXPECT_EQ(platform::trace_lines.size(), 1u);
+}
+
+TEST_F(Trace, CutsLinesAt256BytesAndKeepsTheirNewline) {
+  const size_t prefix = std::string("ERR [0x2a] KEYMASTER:begin:120: ").size();
+  for (const size_t length : {255 - prefix, 256 - prefix, size_t{300}, size_t{5000}}) {
+    platform::trace_lines.clear();
+    const std::string message(length, 'x');
+    trace(TEE_TRACE_ERROR, AT, "%s", message.c_str());
+    ASSERT_EQ(platform::trace_lines.size(), 1u);
+    const std::string& line = platform::trace_lines[0];
+    EXPECT_EQ(line.size(), 256u) << length;
+    EXPECT_EQ(line.substr(254), "x\n") << length;
+  }
+  platform::trace_lines.clear();
+  const std::string name(400, 'f');
+  trace(TEE_TRACE_ERROR, {name.c_str(), 1}, "message");
+  EXPECT_EQ(platform::trace_lines[0].size(), 256u);
+  EXPECT_EQ(platform::trace_lines[0].back(), '\n');
+}
+
+// A helper reports under its caller's name.
+void shared_helper(trace_site at = trace_site::here()) {
+  trace(TEE_TRACE_ERROR, at, "helped");
+}
+
+TEST_F(Trace, ReportsTheCaller) {
+  shared_helper();
+  EXPECT_NE(platform::trace_lines[0].find(":TestBody:"), std::string::npos)
+      << platform::trace_lines[0];
+}
+
+TEST_F(Trace, DumpsEachClassOfTag) {
+  const struct {
+    keymaster_tag_t tag;
+    uint64_t value;
+    const char* line;
+  } cases[] = {
+      {KM_INVALID | 5, 1, "    KM_INVALID"},
+      {KM_TAG_ALGORITHM, 0xFFFFFFFF, "    KM_ENUM: -1"},
+      {KM_TAG_PURPOSE, 3, "    KM_ENUM: 3"},
+      {KM_TAG_KEY_SIZE, 256, "    KM_UINT: 0x00000100"},
+      {KM_UINT_REP | 5, 1, "    KM_UINT: 0x00000001"},
+      {KM_TAG_RSA_PUBLIC_EXPONENT, 0x100000000, "    KM_ULONG: 0x0000000100000000"},
+      {KM_TAG_USER_SECURE_ID, 2, "    KM_ULONG: 0x0000000000000002"},
+      {KM_TAG_ACTIVE_DATETIME, 0x123456789A, "    KM_DATE: 0x000000123456789a"},
+      {KM_TAG_NO_AUTH_REQUIRED, 1, "    KM_BOOL: 1"},
+      {KM_BIGNUM | 5, 0, "    KM_BIGNUM, length 0B"},
+      {KM_TAG_NONCE, 0, "    KM_BYTES, length 0B"},
+      {0xB0000000, 0, "    Invalid tag type"},
+  };
+  for (const auto& c : cases) {
+    keymaster_key_param_set_t set;
+    ASSERT_TRUE(add_long(&set, c.tag, has_blob(c.tag) ? 0 : c.value));
+    platform::trace_lines.clear();
+    _keymaster_dump_key_param_set("begin.cpp", 99, set);
+    ASSERT_EQ(platform::trace_lines.size(), 3u);
+    EXPECT_NE(platform::trace_lines[0].find(":_keymaster_dump_key_param_set:"), std::string::npos);
+    EXPECT_TRUE(platform::trace_lines[0].ends_with(": Dump at begin.cpp:99\n"));
+    EXPECT_TRUE(platform::trace_lines[2].ends_with(std::string(": ") + c.line + "\n"))
+        << platform::trace_lines[2];
+  }
+}
+
+}  // namespace
+}  // namespace keymaster
