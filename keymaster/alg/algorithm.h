@@ -132,7 +132,8 @@ operation_t* create_operation_object(const operation_slots_t& slots, keymaster_e
     return nullptr;
   }
   record->install(slots);
-  if (!failed(prepare(record), *km_error)) return record;
+  const TEE_Result res = prepare(record);  // first: it sets *km_error
+  if (!failed(res, *km_error)) return record;
   heap_delete(record);
   settle_failure(TEE_SUCCESS, km_error);
   return nullptr;
