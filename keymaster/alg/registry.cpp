@@ -1,12 +1,15 @@
 // The registry of algorithms, and the small answers that their tables share.
 #include "keymaster/alg/aes/aes.h"
 #include "keymaster/alg/algorithm.h"
+#include "keymaster/alg/ec/ec.h"
 #include "keymaster/alg/hmac/hmac.h"
+#include "keymaster/alg/rsa/rsa.h"
 
 namespace keymaster {
 namespace {
 
-const algorithm_t* const REGISTRY[] = {&AES_ALGORITHM, &HMAC_ALGORITHM};
+const algorithm_t* const REGISTRY[] = {&RSA_ALGORITHM, &AES_ALGORITHM, &EC_ALGORITHM,
+                                       &HMAC_ALGORITHM};
 
 bool requested_value(const keymaster_key_param_set_t& params, keymaster_tag_t tag,
                      uint32_t* value) {
