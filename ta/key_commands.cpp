@@ -1,4 +1,4 @@
-// The commands that describe, export, delete and attest keys, and configure.
+// The commands that describe, export and delete keys, and configure.
 #include "keymaster/alg/algorithm.h"
 #include "keymaster/params/marshal.h"
 #include "ta/command.h"
@@ -91,11 +91,6 @@ TEE_Result delete_key(command_io* io, keymaster_error_t* km_error) {
 }
 
 TEE_Result delete_all_key(command_io*, keymaster_error_t*) {
-  return TEE_SUCCESS;
-}
-
-TEE_Result attest_key(command_io*, keymaster_error_t* km_error) {
-  *km_error = KM_ERROR_UNIMPLEMENTED;
   return TEE_SUCCESS;
 }
 

@@ -232,7 +232,7 @@ const algorithm_t EC_ALGORITHM = {
     .generate_key = ec_generate_key,
     .import_key = ec_import_key,
     .export_key = ec_export_key,
-    .set_key_info = nullptr,
+    .set_key_info = ec_set_key_info,
 };
 
 }  // namespace keymaster

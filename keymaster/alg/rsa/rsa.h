@@ -26,6 +26,11 @@ TEE_Result rsa_import_key(keymaster_key_param_set_t* description, byte_view key_
 TEE_Result rsa_export_key(byte_view key_material, byte_span output, size_t* produced,
                           keymaster_error_t* km_error);
 
+// rsa_set_key_info: fills the subject public key of a certificate. TEE_ERROR_GENERIC: the record is
+// too short. -41: out of memory.
+TEE_Result rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key,
+                            keymaster_error_t* km_error);
+
 // rsa_resolve_key_data: loads key material into the platform; *key_bits receives its size.
 // TEE_ERROR_GENERIC: the record is too short.
 [[nodiscard]] TEE_Result rsa_resolve_key_data(byte_view key_material, tee_object* key,

@@ -246,7 +246,7 @@ const algorithm_t RSA_ALGORITHM = {
     .generate_key = rsa_generate_key,
     .import_key = rsa_import_key,
     .export_key = rsa_export_key,
-    .set_key_info = nullptr,
+    .set_key_info = rsa_set_key_info,
 };
 
 }  // namespace keymaster

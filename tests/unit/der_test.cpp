@@ -1,0 +1,264 @@
+// The DER writer and the key description, against encodings that were written by hand.
+#include <gtest/gtest.h>
+#include <string>
+#include <vector>
+
+#include "keymaster/attest/der/oids.h"
+#include "keymaster/attest/der/x509.h"
+#include "keymaster/attest/key_description.h"
+#include "platform.h"
+
+namespace keymaster {
+namespace {
+
+std::string hex(byte_view bytes) {
+  static constexpr char DIGITS[] = "0123456789abcdef";
+  std::string text;
+  for (const uint8_t byte : bytes) {
+    text += DIGITS[byte >> 4];
+    text += DIGITS[byte & 15];
+  }
+  return text;
+}
+
+// What a writer makes of a buffer of `size` bytes: hex, or the negative code as text.
+template <class Write>
+std::string written(Write write, size_t size = 64) {
+  std::vector<uint8_t> buffer(size);
+  der_cursor out(buffer);
+  const int32_t length = write(&out);
+  if (length < 0) return std::to_string(length);
+  EXPECT_EQ(static_cast<size_t>(length), out.written().size());
+  return hex(out.written());
+}
+
+TEST(DerWriter, Primitives) {
+  const auto integer = [](uint64_t value) {
+    return written([=](der_cursor* out) { return der_write_integer(out, value); });
+  };
+  EXPECT_EQ(integer(0), "020100");
+  EXPECT_EQ(integer(127), "02017f");
+  EXPECT_EQ(integer(128), "02020080");
+  EXPECT_EQ(integer(65537), "0203010001");
+  EXPECT_EQ(integer(UINT64_MAX), "020900ffffffffffffffff");
+
+  const auto tag = [](uint32_t word) {
+    return written([=](der_cursor* out) { return der_write_tag(out, word); });
+  };
+  EXPECT_EQ(tag(DER_SEQUENCE), "30");
+  EXPECT_EQ(tag(DER_CONTEXT | DER_CONSTRUCTED | 30), "be");
+  EXPECT_EQ(tag(DER_CONTEXT | DER_CONSTRUCTED | 31), "bf1f");
+  EXPECT_EQ(tag(DER_CONTEXT | DER_CONSTRUCTED | 704), "bf8540");
+  EXPECT_EQ(tag(0x40000001), "-104");
+
+  const auto length = [](size_t value) {
+    return written([=](der_cursor* out) { return der_write_length(out, value); });
+  };
+  EXPECT_EQ(length(127), "7f");
+  EXPECT_EQ(length(128), "8180");
+  EXPECT_EQ(length(256), "820100");
+  EXPECT_EQ(length(65536), "83010000");
+  EXPECT_EQ(length(0x1000000), "8401000000");
+
+  const auto oid = [](const ASN1_OID& id) {
+    return written([&](der_cursor* out) { return _ASN1_OID_write(out, &id); });
+  };
+  EXPECT_EQ(oid(OID_KEY_DESCRIPTION), "060a2b06010401d679020111");
+  EXPECT_EQ(oid(OID_SHA256_WITH_RSA_ENCRYPTION), "06092a864886f70d01010b");
+  EXPECT_EQ(oid(OID_P_256), "06082a8648ce3d030107");
+  EXPECT_EQ(written([](der_cursor* out) { return _ASN1_OID_write(out, nullptr); }), "-104");
+}
+
+TEST(DerWriter, BitStringsGrowWhenBitsAreCleared) {
+  ASN1_BIT_STRING bits{};
+  for (uint32_t i = 0; i < 8; i++)
+    ASSERT_EQ(ASN1_BIT_STRING_set_bit(&bits, i, false), 0);
+  ASSERT_EQ(ASN1_BIT_STRING_set_bit(&bits, 0, true), 0);
+  const auto text = [&] {
+    return written([&](der_cursor* out) { return ASN1_BIT_STRING_TYPE.write(out, &bits); });
+  };
+  EXPECT_EQ(text(), "03020080");
+  ASSERT_EQ(ASN1_BIT_STRING_set_bit(&bits, 9, true), 0);
+  EXPECT_EQ(text(), "0303068040");
+  ASN1_BIT_STRING_TYPE.free(&bits);
+}
+
+// Expected texts from `date -u -d @SECONDS`; the last year is beyond any calendar, and still text.
+TEST(DerWriter, Dates) {
+  const struct {
+    uint64_t seconds;
+    const char* utc;
+    const char* generalized;
+  } cases[] = {
+      {0, "700101000000Z", "19700101000000Z"},
+      {4294967, "700219170247Z", "19700219170247Z"},
+      {951782400, "000229000000Z", "20000229000000Z"},
+      {1709164799, "240228235959Z", "20240228235959Z"},
+      {4107542399, "000228235959Z", "21000228235959Z"},
+      {4107542400, "000301000000Z", "21000301000000Z"},
+      {0xFFFFFFFF, "060207062815Z", "21060207062815Z"},
+  };
+  for (const auto& row : cases) {
+    for (const uint32_t type : {DER_UTC_TIME, DER_GENERALIZED_TIME}) {
+      const ASN1_TIME time = ASN1_TIME_from_seconds(type, row.seconds);
+      uint8_t buffer[32];
+      const int32_t length = X509_TIME_write(&time, buffer, sizeof(buffer));
+      const bool utc = type == DER_UTC_TIME;
+      ASSERT_EQ(length, utc ? 15 : 17);
+      EXPECT_EQ(buffer[0], type);
+      EXPECT_EQ(std::string(buffer + 2, buffer + length), utc ? row.utc : row.generalized);
+    }
+  }
+  uint8_t buffer[32];
+  const ASN1_TIME last = ASN1_TIME_from_seconds(DER_UTC_TIME, UINT64_MAX);
+  EXPECT_EQ(X509_TIME_write(&last, buffer, sizeof(buffer)), 15);
+}
+
+// A name, an IMPLICIT tag, an unknown choice.
+constexpr asn1_field TAGGED_FIELDS[] = {{0, ASN1_IMPLICIT | 0x81, &ASN1_INTEGER_TYPE, ASN1_ALWAYS},
+                                        {0, 0xC0000000, &ASN1_INTEGER_TYPE, ASN1_ALWAYS}};
+
+TEST(DerRecords, TagModesAndChoices) {
+  const uint64_t value = 5;
+  const std::span<const asn1_field> fields(TAGGED_FIELDS);
+  EXPECT_EQ(
+      written([&](der_cursor* out) { return asn1_sequence_write(fields.first(1), out, &value); }),
+      "3003810105");
+  EXPECT_EQ(written([&](der_cursor* out) { return asn1_sequence_write(fields, out, &value); }),
+            "-104");
+  X509_ALGOR* algorithm = X509_ALGOR_alloc();
+  X509_ALGOR_set_ec(algorithm, &OID_P_256);
+  uint8_t buffer[64];
+  int32_t length = X509_ALGOR_write(algorithm, buffer, sizeof(buffer));
+  EXPECT_EQ(hex({buffer, static_cast<size_t>(length)}),
+            "301306072a8648ce3d020106082a8648ce3d030107");
+  algorithm->parameters.selector = 9;
+  EXPECT_EQ(X509_ALGOR_write(algorithm, buffer, sizeof(buffer)), DER_INVALID);
+  X509_ALGOR_free(algorithm);
+}
+
+keymaster_key_param_set_t sample_characteristics() {
+  keymaster_key_param_set_t set;
+  const uint8_t application[] = {'a', 'p', 'p'};
+  EXPECT_TRUE(add_integer(&set, KM_TAG_PURPOSE, KM_PURPOSE_VERIFY));
+  EXPECT_TRUE(add_integer(&set, KM_TAG_PURPOSE, KM_PURPOSE_SIGN));
+  EXPECT_TRUE(add_integer(&set, KM_TAG_PURPOSE, KM_PURPOSE_SIGN));
+  EXPECT_TRUE(add_integer(&set, KM_TAG_ALGORITHM, KM_ALGORITHM_EC));
+  EXPECT_TRUE(add_integer(&set, KM_TAG_KEY_SIZE, 224));
+  EXPECT_TRUE(add_integer(&set, KM_TAG_KEY_SIZE, 256));
+  EXPECT_TRUE(add_long(&set, KM_TAG_ACTIVE_DATETIME, 0x8000000000000000));
+  EXPECT_TRUE(add_long(&set, KM_TAG_NO_AUTH_REQUIRED, 1));
+  EXPECT_TRUE(add_blob(&set, KM_TAG_APPLICATION_ID, application));
+  EXPECT_TRUE(add_integer(&set, KM_TAG_BLOCK_MODE, KM_MODE_CBC));
+  EXPECT_TRUE(add_integer(&set, 0x70002AFB, 1));
+  return set;
+}
+
+// Elements of a set stay as they were added, a repeated scalar keeps its last value, a tag without
+// a field is passed over, an unknown one is traced.
+// clang-format off
+constexpr char SAMPLE_EXTENSION[] =
+    "307b"                              // KeyDescription
+    "020101020101020102020101"          // versions and security levels 1, 1, 2, 1
+    "0403c0ffee" "0400"                 // challenge, unique id
+    "3000"                              // software enforced
+    "3064"                              // TEE enforced
+    "a10b3109020103020102020102"        // purpose
+    "a203020103"                        // algorithm
+    "a30402020100"                      // key size
+    "bf83100b0209008000000000000000"    // active date-time
+    "bf837702" "0500"                   // no auth required
+    "bf84590504" "03617070"             // application id
+    "bf85402a3028"                      // root of trust
+    "0420" "3538323033393437313635303239333834373536313032393338343735363130"
+    "0101ff" "020100";
+// clang-format on
+
+TEST(KeyDescription, EncodesAsWrittenByHand) {
+  platform::reset();
+  {
+    const keymaster_key_param_set_t hardware = sample_characteristics();
+    const keymaster_key_param_set_t software;
+    keymaster_key_param_set_t request;
+    const uint8_t challenge[] = {0xC0, 0xFF, 0xEE};
+    ASSERT_TRUE(add_blob(&request, KM_TAG_ATTESTATION_CHALLENGE, challenge));
+    X509_EXTENSION* extension = X509_EXTENSION_alloc();
+    ASSERT_EQ(character_to_extension(hardware, software, request, extension), KM_ERROR_OK);
+    EXPECT_EQ(hex(extension->value.view()), SAMPLE_EXTENSION);
+    X509_EXTENSION_free(extension);
+    const std::vector<std::string>& lines = platform::trace_lines;
+    ASSERT_EQ(lines.size(), 1u);
+    EXPECT_NE(lines[0].find("Unknown tag 0x70002afb"), std::string::npos);
+  }
+  EXPECT_EQ(platform::live_blocks, 0u);
+  EXPECT_EQ(platform::unwiped_blocks, 0u);
+}
+
+TEST(KeyDescription, EveryBufferSizeAndEveryFailedAllocation) {
+  platform::reset();
+  {
+    KeyDescription* description = KeyDescription_alloc();
+    keymaster_error_t error = KM_ERROR_OK;
+    ASSERT_EQ(
+        fill_auth_list_by_param_set(sample_characteristics(), &description->tee_enforced, &error),
+        0);
+    uint8_t whole[256];
+    const int32_t need = KeyDescription_write(description, whole, sizeof(whole));
+    ASSERT_GT(need, 0);
+    for (size_t size = 0; size <= static_cast<size_t>(need) + 1; size++) {
+      std::vector<uint8_t> buffer(size);
+      const int32_t length = KeyDescription_write(description, buffer.data(), size);
+      ASSERT_EQ(length, size < static_cast<size_t>(need) ? DER_TOO_SMALL : need);
+      if (length < 0) continue;
+      ASSERT_EQ(hex(byte_view(buffer).first(size_t(need))),
+                hex(byte_view(whole).first(size_t(need))));
+    }
+    KeyDescription_free(description);
+    const keymaster_key_param_set_t none;
+    for (int nth = 1;; nth++) {
+      const keymaster_key_param_set_t hardware = sample_characteristics();
+      X509_EXTENSION* extension = X509_EXTENSION_alloc();
+      platform::allocations_to_fail = nth;
+      const keymaster_error_t outcome = character_to_extension(hardware, none, none, extension);
+      const bool fired = platform::allocations_to_fail == 0;
+      platform::allocations_to_fail = 0;
+      X509_EXTENSION_free(extension);
+      if (!fired) break;
+      ASSERT_EQ(outcome, KM_ERROR_MEMORY_ALLOCATION_FAILED) << nth;
+    }
+  }
+  EXPECT_EQ(platform::live_blocks, 0u);
+}
+
+// Descriptions beyond the first buffer and beyond its double; the challenge's limit; unique ids.
+TEST(KeyDescription, SizesAndRefusals) {
+  platform::reset();
+  const keymaster_key_param_set_t none;
+  for (const size_t size : {1100u, 2500u}) {
+    keymaster_key_param_set_t hardware;
+    ASSERT_TRUE(add_blob(&hardware, KM_TAG_APPLICATION_ID, std::vector<uint8_t>(size, 'x')));
+    X509_EXTENSION* extension = X509_EXTENSION_alloc();
+    EXPECT_EQ(character_to_extension(hardware, none, none, extension), KM_ERROR_OK);
+    EXPECT_GT(extension->value.length, size);
+    X509_EXTENSION_free(extension);
+  }
+  const auto outcome = [&none](const keymaster_key_param_set_t& hardware, size_t challenge) {
+    keymaster_key_param_set_t request;
+    EXPECT_TRUE(
+        add_blob(&request, KM_TAG_ATTESTATION_CHALLENGE, std::vector<uint8_t>(challenge, 1)));
+    X509_EXTENSION* extension = X509_EXTENSION_alloc();
+    const keymaster_error_t error = character_to_extension(hardware, none, request, extension);
+    X509_EXTENSION_free(extension);
+    return error;
+  };
+  EXPECT_EQ(outcome(none, 128), KM_ERROR_OK);
+  EXPECT_EQ(outcome(none, 129), KM_ERROR_INVALID_INPUT_LENGTH);
+  keymaster_key_param_set_t unique;
+  ASSERT_TRUE(add_long(&unique, KM_TAG_INCLUDE_UNIQUE_ID, 1));
+  EXPECT_EQ(outcome(unique, 1), KM_ERROR_INVALID_KEY_BLOB);
+  ASSERT_TRUE(add_long(&unique, KM_TAG_CREATION_DATETIME, 1));
+  EXPECT_EQ(outcome(unique, 1), KM_ERROR_UNIMPLEMENTED);
+}
+
+}  // namespace
+}  // namespace keymaster
