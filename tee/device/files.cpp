@@ -1,6 +1,7 @@
 // Files of the device folder: read whole, replaced as a whole.
 #include "tee/device/files.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <filesystem>
@@ -13,6 +14,8 @@
 namespace tee {
 
 namespace {
+
+constexpr size_t FIRST_READ = 4096;
 
 void write_all(int fd, std::span<const uint8_t> bytes, const std::string& path) {
   while (!bytes.empty()) {
@@ -53,12 +56,12 @@ std::optional<secret_bytes> read_file(const std::string& path, size_t limit) {
   if (!S_ISREG(status.st_mode)) {
     throw device_error(device_error::kind::DAMAGED, path + " is not a regular file");
   }
-  secret_bytes bytes(limit + 1);
+  // Grown as it fills, since the limit may lie far above the file's size.
+  secret_bytes bytes;
   size_t filled = 0;
-  while (filled <= limit) {
-    size_t got = read_some(file.get(), std::span(bytes).subspan(filled), path);
-    if (got == 0) break;
-    filled += got;
+  for (size_t got = 1; got != 0 && filled <= limit; filled += got) {
+    if (filled == bytes.size()) bytes.resize(std::min(limit + 1, 2 * filled + FIRST_READ));
+    got = read_some(file.get(), std::span(bytes).subspan(filled), path);
   }
   if (filled > limit) throw device_error(device_error::kind::DAMAGED, path + " is too long");
   bytes.resize(filled);
