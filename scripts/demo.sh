@@ -1,0 +1,99 @@
+#!/usr/bin/env bash
+# Installs what is missing, builds, and shows a device at work: keys, signatures, refusals, an
+# upgrade. Everything happens in a temporary folder that is gone afterwards.
+set -euo pipefail
+cd "$(dirname "$0")/.."
+
+scripts/setup.sh
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+build=build/release
+if [[ ! -x $build/bin/kmtool ]]; then  # a folder of its own, without tests, which want more packages
+  build=build/demo
+  cmake --preset release -B "$build" -DKEYMASTER_TESTS=OFF -DKEYMASTER_BENCH=OFF >/dev/null
+fi
+echo "Building in $build; the first time takes a minute or two"
+if [[ -t 1 ]]; then
+  cmake --build "$build"
+else
+  cmake --build "$build" >"$work/build.log" || { cat "$work/build.log"; exit 1; }
+fi
+
+cp README.md "$work"
+PATH=$PWD/$build/bin:$PATH
+cd "$work"
+export KEYMASTER_DEVICE=$work/device TEE_TRACE_LEVEL=0
+
+bold='' plain=''
+if [[ -t 1 ]]; then
+  bold=$'\e[1m' plain=$'\e[0m'
+fi
+say() {
+  printf '\n%s%s%s\n' "$bold" "$1" "$plain"
+}
+# run COMMAND...: shows the command and what it prints.
+run() {
+  printf '\n  $ %s\n' "$*"
+  "$@" 2>&1 | sed 's/^/    /'
+}
+# refused COMMAND...: the same for a command that the TA must refuse (exit code 1).
+refused() {
+  local code=0
+  run "$@" || code=$?
+  if [[ $code != 1 ]]; then
+    echo "demo: this should have been refused (exit code $code)" >&2
+    exit 1
+  fi
+}
+# same A B WHAT: both are the same text.
+same() {
+  if [[ $1 != "$2" ]]; then
+    echo "demo: $3 differ: $1 and $2" >&2
+    exit 1
+  fi
+}
+
+say "1. A device: an identity, a boot, and storage of its own"
+run kmtool device create --os-version 120000 --os-patchlevel 202401
+
+say "2. A key is made inside the device; only an encrypted blob comes out"
+run kmtool generate hmac -o release.key --size 256 --digest sha256 --min-mac 128 \
+    --purpose sign --app-id release-desk
+run kmtool show release.key --app-id release-desk
+run kmtool sign release.key -i README.md --app-id release-desk
+
+say "3. The blob is bound to its application: another one is refused"
+refused kmtool sign release.key -i README.md --app-id somebody-else
+
+say "4. A key of known bytes, imported: openssl computes the same MAC"
+head -c 32 /dev/urandom >known.bin
+run kmtool import hmac known.bin -o known.key --digest sha256 --min-mac 128 --purpose sign
+run kmtool sign known.key -i README.md -o known.mac
+hex() { od -An -v -tx1 "$1" | tr -d ' \n'; }
+ours=$(hex known.mac)
+theirs=$(openssl mac -digest SHA256 -macopt "hexkey:$(hex known.bin)" -in README.md HMAC | tr A-F a-f)
+printf '\n    device   %s\n    openssl  %s\n' "$ours" "$theirs"
+same "$ours" "$theirs" "the MACs"
+
+say "5. The device's OS is updated: keys of the old version want an upgrade"
+run kmtool device set --os-version 130000
+refused kmtool sign known.key -i README.md -o again.mac
+run kmtool upgrade known.key -o upgraded.key
+run kmtool sign upgraded.key -i README.md -o again.mac
+same "$(hex again.mac)" "$ours" "the MACs before and after the upgrade"
+printf '    the same MAC as before\n'
+
+say "6. A restart: a new boot, and the old blob still opens"
+run kmtool device reboot
+run kmtool upgrade known.key -o after-restart.key
+run kmtool sign after-restart.key -i README.md -o restart.mac
+same "$(hex restart.mac)" "$ours" "the MACs before and after the restart"
+printf '    the same MAC again\n'
+
+say "7. One bit of a blob is changed: it is no key any more"
+cp upgraded.key damaged.key
+byte=$(od -An -tu1 -j 200 -N 1 damaged.key)
+printf "\\x$(printf %x $((byte ^ 1)))" | dd of=damaged.key bs=1 seek=200 conv=notrunc status=none
+refused kmtool sign damaged.key -i README.md
+
+say "That was a device. Make one of your own: kmtool device create (in $build/bin)"
