@@ -35,6 +35,7 @@ class file_descriptor {
   }
   ~file_descriptor();
   int get() const { return fd_; }
+  int release() { return std::exchange(fd_, -1); }  // owned no more, and not closed
   explicit operator bool() const { return fd_ >= 0; }
 
  private:

@@ -1,7 +1,11 @@
 // UUIDs: text, bytes, random ones.
 #include "tee/device/uuid.h"
 
+#include <algorithm>
 #include <charconv>
+#include <openssl/evp.h>
+#include <stdexcept>
+#include <vector>
 
 #include "tee/device/sealing.h"
 
@@ -14,6 +18,13 @@ constexpr char DIGITS[] = "0123456789abcdef";
 
 bool is_hyphen_place(size_t i) {
   return i == 8 || i == 13 || i == 18 || i == 23;
+}
+
+// Puts the version and the variant of RFC 4122 in place.
+TEE_UUID with_version(uuid_bytes bytes, uint8_t version) {
+  bytes[6] = static_cast<uint8_t>((bytes[6] & 0x0F) | version << 4);
+  bytes[8] = static_cast<uint8_t>((bytes[8] & 0x3F) | 0x80);
+  return from_bytes(bytes);
 }
 
 }  // namespace
@@ -72,9 +83,20 @@ bool parse_uuid(std::string_view text, TEE_UUID* uuid) {
 TEE_UUID new_uuid() {
   uuid_bytes bytes{};
   fill_random(bytes);
-  bytes[6] = static_cast<uint8_t>((bytes[6] & 0x0F) | 0x40);
-  bytes[8] = static_cast<uint8_t>((bytes[8] & 0x3F) | 0x80);
-  return from_bytes(bytes);
+  return with_version(bytes, 4);
+}
+
+TEE_UUID name_based_uuid(const TEE_UUID& name_space, std::string_view name) {
+  uuid_bytes prefix = to_bytes(name_space);
+  std::vector<uint8_t> input(prefix.begin(), prefix.end());
+  input.insert(input.end(), name.begin(), name.end());
+  std::array<uint8_t, EVP_MAX_MD_SIZE> digest{};
+  if (EVP_Digest(input.data(), input.size(), digest.data(), nullptr, EVP_sha1(), nullptr) != 1) {
+    throw std::runtime_error("libcrypto failed: EVP_Digest");
+  }
+  uuid_bytes bytes{};
+  std::copy_n(digest.begin(), bytes.size(), bytes.begin());
+  return with_version(bytes, 5);
 }
 
 }  // namespace tee

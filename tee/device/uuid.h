@@ -28,6 +28,10 @@ std::string to_text(const TEE_UUID& uuid);
 // new_uuid: a random one (RFC 4122 version 4). Throws std::runtime_error without randomness.
 TEE_UUID new_uuid();
 
+// name_based_uuid: the one that belongs to a name in a name space (RFC 4122 version 5). Throws
+// std::runtime_error when libcrypto fails.
+TEE_UUID name_based_uuid(const TEE_UUID& name_space, std::string_view name);
+
 inline bool same_uuid(const TEE_UUID& a, const TEE_UUID& b) {
   return to_bytes(a) == to_bytes(b);
 }

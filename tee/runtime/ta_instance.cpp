@@ -1,0 +1,108 @@
+// An instance of a trusted application with its code: created, entered, destroyed.
+#include "tee/runtime/ta_instance.h"
+
+#include <utility>
+
+namespace tee {
+
+namespace {
+
+uint32_t heap_limit_of(const property_map& properties) {
+  auto found = properties.find("gpd.ta.dataSize");
+  if (found == properties.end()) return DEFAULT_HEAP_LIMIT;
+  const auto* declared = std::get_if<uint32_t>(&found->second);
+  return declared != nullptr ? *declared : DEFAULT_HEAP_LIMIT;
+}
+
+}  // namespace
+
+TEE_Result ta_instance::load(const TEE_UUID& uuid, device& dev,
+                             std::shared_ptr<ta_instance>* made) {
+  std::unique_ptr<ta_library> library;
+  if (TEE_Result res = ta_library::load(uuid, &library)) return res;
+  property_map declared = library->properties();
+  uint32_t heap_limit = heap_limit_of(declared);
+  *made = std::make_shared<ta_instance>(uuid, dev, std::move(library), declared, heap_limit);
+  return TEE_SUCCESS;
+}
+
+ta_instance::ta_instance(const TEE_UUID& uuid, device& dev, std::unique_ptr<ta_library> library,
+                         const property_map& properties, uint32_t heap_limit)
+    : library_(std::move(library)), core_(uuid, dev, heap_limit) {
+  property_map& own = core_.properties();
+  for (const auto& [name, value] : properties)
+    own.insert_or_assign(name, value);
+  own.insert_or_assign("gpd.ta.dataSize", heap_limit);
+  own.insert_or_assign("gpd.ta.singleInstance", true);
+  own.insert_or_assign("gpd.ta.multiSession", true);
+  own.insert_or_assign("gpd.ta.instanceKeepAlive", true);
+}
+
+ta_instance::~ta_instance() {
+  if (stage_ != stage::CREATED) return;
+  visit last(*this, nullptr);
+  instance_scope running(core_);
+  library_->entries().destroy();
+}
+
+ta_instance::visit::visit(ta_instance& target, const TEE_Identity* client)
+    : target_(target), inside_(target.gate_.enter()) {
+  if (inside_) target_.core_.set_client(client);
+}
+
+ta_instance::visit::~visit() {
+  if (!inside_) return;
+  target_.run_pending_closes();
+  target_.core_.set_client(nullptr);
+  target_.gate_.leave();
+}
+
+TEE_Result ta_instance::create() {
+  const TEE_Identity client = *core_.client();
+  core_.set_client(nullptr);
+  instance_scope running(core_);
+  TEE_Result res = library_->entries().create();
+  core_.set_client(&client);
+  stage_ = res == TEE_SUCCESS ? stage::CREATED : stage::FAILED;
+  return res;
+}
+
+TEE_Result ta_instance::open_session(uint32_t types, TEE_Param* params, void** context) {
+  instance_scope running(core_);
+  return library_->entries().open_session(types, params, context);
+}
+
+TEE_Result ta_instance::invoke(void* context, uint32_t command, uint32_t types, TEE_Param* params) {
+  instance_scope running(core_);
+  return library_->entries().invoke_command(context, command, types, params);
+}
+
+void ta_instance::close_session(void* context, const TEE_Identity& client) {
+  visit closing(*this, &client);
+  if (closing.inside()) {
+    run_close({context, client});
+    return;
+  }
+  std::lock_guard lock(pending_mutex_);
+  pending_.push_back({context, client});
+}
+
+void ta_instance::run_close(const pending_close& session) {
+  core_.set_client(&session.client);
+  instance_scope running(core_);
+  library_->entries().close_session(session.context);
+}
+
+// One at a time: a close entry point may make further ones pending.
+void ta_instance::run_pending_closes() {
+  for (;;) {
+    std::unique_lock lock(pending_mutex_);
+    if (pending_.empty()) return;
+    pending_close next = pending_.back();
+    pending_.pop_back();
+    lock.unlock();
+    run_close(next);
+  }
+}
+
+}  // namespace tee

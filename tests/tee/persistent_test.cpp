@@ -1,0 +1,211 @@
+// Persistent objects as a trusted application sees them.
+#include "tee_internal_api.h"
+
+#include <gtest/gtest.h>
+#include <string>
+
+#include "tee/runtime/host_control.h"
+#include "tee/runtime/instance.h"
+#include "tests/tee/temp_device.h"
+
+namespace tee::test {
+namespace {
+
+constexpr uint32_t READ = TEE_DATA_FLAG_ACCESS_READ;
+constexpr uint32_t WRITE = TEE_DATA_FLAG_ACCESS_WRITE;
+constexpr uint32_t META = TEE_DATA_FLAG_ACCESS_WRITE_META;
+constexpr uint32_t SHARE_R = TEE_DATA_FLAG_SHARE_READ;
+constexpr uint32_t SHARE_W = TEE_DATA_FLAG_SHARE_WRITE;
+constexpr uint32_t OVERWRITE = TEE_DATA_FLAG_OVERWRITE;
+
+constexpr size_t HEAP_LIMIT = 1 << 20;
+constexpr TEE_UUID OWNER = {1, 2, 3, {4}};
+constexpr TEE_UUID STRANGER = {1, 2, 3, {5}};
+
+// Calls with the identifier "id\0" in the private storage.
+TEE_Result open_object(uint32_t flags, TEE_ObjectHandle* object) {
+  return TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, "id", 3, flags, object);
+}
+
+TEE_Result create_object(uint32_t flags, const std::string& data, TEE_ObjectHandle* object) {
+  return TEE_CreatePersistentObject(TEE_STORAGE_PRIVATE, "id", 3, flags, nullptr, data.data(),
+                                    data.size(), object);
+}
+
+std::string read_all(TEE_ObjectHandle object) {
+  std::string data(200, '\0');
+  size_t count = 0;
+  EXPECT_EQ(TEE_ReadObjectData(object, data.data(), data.size(), &count), TEE_SUCCESS);
+  data.resize(count);
+  return data;
+}
+
+class persistent : public ::testing::Test {
+ protected:
+  temp_device made;
+  std::unique_ptr<device> dev = made.open();
+  instance owner{OWNER, *dev, HEAP_LIMIT};
+  instance_scope running{owner};
+  TEE_ObjectHandle object = nullptr;
+  TEE_ObjectHandle second = nullptr;
+};
+
+TEST_F(persistent, flags_of_two_handles_agree_or_conflict) {
+  struct {
+    uint32_t first, second;
+    bool together;
+  } cases[] = {
+      {READ, READ, false},
+      {READ | SHARE_R, READ | SHARE_R, true},
+      {READ | SHARE_R, READ, false},
+      {READ | SHARE_R, READ | SHARE_R | SHARE_W, false},
+      {READ | SHARE_R, WRITE | SHARE_R, false},
+      {READ | SHARE_R | SHARE_W, WRITE | SHARE_R | SHARE_W, true},
+      {WRITE | SHARE_W, WRITE | SHARE_W, true},
+      {READ | SHARE_W, WRITE | SHARE_W, false},
+      {META | SHARE_R | SHARE_W, READ | SHARE_R | SHARE_W, false},
+      {0, 0, true},
+      {0, META, false},
+  };
+  ASSERT_EQ(create_object(0, "data", &object), TEE_SUCCESS);
+  TEE_CloseObject(object);
+  for (auto [first, then, together] : cases) {
+    for (auto [a, b] : {std::pair(first, then), std::pair(then, first)}) {
+      ASSERT_EQ(open_object(a, &object), TEE_SUCCESS);
+      TEE_Result expected = together ? TEE_SUCCESS : TEE_ERROR_ACCESS_CONFLICT;
+      EXPECT_EQ(open_object(b, &second), expected) << a << " then " << b;
+      EXPECT_EQ(second != nullptr, together);
+      TEE_CloseObject(second);
+      EXPECT_EQ(create_object(b | OVERWRITE, "data", &second), expected);
+      TEE_CloseObject(second);
+      EXPECT_EQ(create_object(b, "data", &second), TEE_ERROR_ACCESS_CONFLICT);
+      TEE_CloseObject(object);
+    }
+  }
+  EXPECT_EQ(owner.objects().size(), 0u);
+}
+
+TEST_F(persistent, stream_position_gaps_and_limits) {
+  ASSERT_EQ(create_object(READ | WRITE | META, "0123456789", &object), TEE_SUCCESS);
+  struct {
+    intmax_t offset;
+    TEE_Whence whence;
+    TEE_Result result;
+    const char* rest;
+  } seeks[] = {
+      {4, TEE_DATA_SEEK_SET, TEE_SUCCESS, "456789"},
+      {-3, TEE_DATA_SEEK_END, TEE_SUCCESS, "789"},
+      {-2, TEE_DATA_SEEK_CUR, TEE_SUCCESS, "89"},
+      {-100, TEE_DATA_SEEK_CUR, TEE_SUCCESS, "0123456789"},
+      {INTMAX_MIN, TEE_DATA_SEEK_END, TEE_SUCCESS, "0123456789"},
+      {5, TEE_DATA_SEEK_END, TEE_SUCCESS, ""},
+      {0xFFFFFFFF, TEE_DATA_SEEK_SET, TEE_SUCCESS, ""},
+      {1, TEE_DATA_SEEK_CUR, TEE_ERROR_OVERFLOW, ""},
+      {INTMAX_MAX, TEE_DATA_SEEK_END, TEE_ERROR_OVERFLOW, ""},
+  };
+  for (const auto& seek : seeks) {
+    EXPECT_EQ(TEE_SeekObjectData(object, seek.offset, seek.whence), seek.result);
+    EXPECT_EQ(read_all(object), seek.rest);
+  }
+  EXPECT_EQ(TEE_WriteObjectData(object, "x", 1), TEE_ERROR_OVERFLOW);
+  TEE_SeekObjectData(object, -2, TEE_DATA_SEEK_CUR);
+  EXPECT_EQ(TEE_WriteObjectData(object, "x", 1), TEE_ERROR_STORAGE_NO_SPACE);
+  TEE_SeekObjectData(object, 12, TEE_DATA_SEEK_SET);
+  EXPECT_EQ(TEE_WriteObjectData(object, "end", 3), TEE_SUCCESS);
+
+  TEE_ObjectInfo info;
+  ASSERT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
+  EXPECT_EQ(info.dataSize, 15u);
+  EXPECT_EQ(info.dataPosition, 15u);
+  EXPECT_EQ(info.objectType, TEE_TYPE_DATA);
+  TEE_CloseObject(object);
+  ASSERT_EQ(open_object(READ, &object), TEE_SUCCESS);
+  EXPECT_EQ(read_all(object), std::string("0123456789\0\0end", 15));
+}
+
+TEST_F(persistent, names_belong_to_storage_and_trusted_application) {
+  ASSERT_EQ(create_object(READ, "", &object), TEE_SUCCESS);
+  EXPECT_EQ(read_all(object), "");
+  TEE_CloseObject(object);
+  EXPECT_EQ(TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, "id", 2, READ, &object),
+            TEE_ERROR_ITEM_NOT_FOUND);
+  for (uint32_t storage_id : {0u, 2u, 0x80000000u, 0x80000001u}) {
+    EXPECT_EQ(TEE_OpenPersistentObject(storage_id, "id", 3, READ, &object),
+              TEE_ERROR_ITEM_NOT_FOUND);
+  }
+  EXPECT_EQ(TEE_CreatePersistentObject(0x80000001, "id", 3, READ, nullptr, "x", 1, &object),
+            TEE_ERROR_ITEM_NOT_FOUND);
+  instance stranger(STRANGER, *dev, HEAP_LIMIT);
+  instance_scope other(stranger);
+  EXPECT_EQ(open_object(READ, &object), TEE_ERROR_ITEM_NOT_FOUND);
+  EXPECT_EQ(object, nullptr);
+}
+
+TEST_F(persistent, keys_and_deletion) {
+  TEE_ObjectHandle key = nullptr;
+  TEE_Attribute secret;
+  std::string bytes = "0123456789abcdef";
+  TEE_InitRefAttribute(&secret, TEE_ATTR_SECRET_VALUE, bytes.data(), bytes.size());
+  ASSERT_EQ(TEE_AllocateTransientObject(TEE_TYPE_AES, 256, &key), TEE_SUCCESS);
+  ASSERT_EQ(TEE_PopulateTransientObject(key, &secret, 1), TEE_SUCCESS);
+  ASSERT_EQ(
+      TEE_CreatePersistentObject(TEE_STORAGE_PRIVATE, nullptr, 0, READ, key, "data", 4, &object),
+      TEE_SUCCESS);
+  TEE_CloseObject(object);
+  TEE_CloseObject(key);
+  EXPECT_EQ(content_of(made.file("storage.db")).find(bytes), std::string::npos);
+
+  ASSERT_EQ(TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, nullptr, 0, READ | META, &object),
+            TEE_SUCCESS);
+  TEE_ObjectInfo info;
+  ASSERT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
+  EXPECT_EQ(info.objectType, TEE_TYPE_AES);
+  EXPECT_EQ(info.objectSize, 128u);
+  EXPECT_EQ(info.maxObjectSize, 256u);
+  std::string found(16, '\0');
+  size_t length = found.size();
+  ASSERT_EQ(TEE_GetObjectBufferAttribute(object, TEE_ATTR_SECRET_VALUE, found.data(), &length),
+            TEE_SUCCESS);
+  EXPECT_EQ(found, bytes);
+  EXPECT_EQ(read_all(object), "data");
+
+  EXPECT_EQ(TEE_CloseAndDeletePersistentObject1(object), TEE_SUCCESS);
+  EXPECT_EQ(TEE_CloseAndDeletePersistentObject1(nullptr), TEE_SUCCESS);
+  EXPECT_EQ(TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, nullptr, 0, READ, &object),
+            TEE_ERROR_ITEM_NOT_FOUND);
+
+  // A deletion that fails closes the handle all the same.
+  ASSERT_EQ(create_object(META, "x", &object), TEE_SUCCESS);
+  host::fail_nth_call(1, TEE_ERROR_STORAGE_NOT_AVAILABLE);
+  EXPECT_EQ(TEE_CloseAndDeletePersistentObject1(object), TEE_ERROR_STORAGE_NOT_AVAILABLE);
+  host::clear_fault();
+  EXPECT_EQ(owner.objects().size(), 0u);
+  EXPECT_EQ(open_object(META, &object), TEE_SUCCESS);
+}
+
+using persistent_death = persistent;
+
+TEST_F(persistent_death, programming_errors_panic) {
+  ASSERT_EQ(create_object(READ, "data", &object), TEE_SUCCESS);
+  TEE_ObjectHandle transient = nullptr;
+  ASSERT_EQ(TEE_AllocateTransientObject(TEE_TYPE_AES, 128, &transient), TEE_SUCCESS);
+  const std::string long_id(65, 'i');
+  size_t count = 0;
+  char byte = 0;
+  EXPECT_DEATH(TEE_WriteObjectData(object, "x", 1), "panic: TEE_WriteObjectData: .*right");
+  EXPECT_DEATH(TEE_CloseAndDeletePersistentObject1(object), "panic: .*right");
+  EXPECT_DEATH(TEE_ReadObjectData(transient, &byte, 1, &count), "panic: .*not persistent");
+  EXPECT_DEATH(TEE_ReadObjectData(object, nullptr, 1, &count), "panic: .*null");
+  EXPECT_DEATH(TEE_SeekObjectData(object, 0, static_cast<TEE_Whence>(3)), "panic: .*whence");
+  EXPECT_DEATH(open_object(OVERWRITE, &second), "panic: .*flags");
+  EXPECT_DEATH(create_object(0x800, "", &second), "panic: .*flags");
+  EXPECT_DEATH(create_object(0, "", nullptr), "panic: .*null");
+  EXPECT_DEATH(TEE_OpenPersistentObject(1, long_id.data(), 65, READ, &second), "panic: .*65");
+  EXPECT_DEATH(TEE_CreatePersistentObject(1, "k", 1, 0, transient, nullptr, 0, &second),
+               "panic: .*uninitialised");
+  TEE_CloseObject(object);
+  EXPECT_DEATH(TEE_SeekObjectData(object, 0, TEE_DATA_SEEK_SET), "panic: .*not valid");
+}
+
+}  // namespace
+}  // namespace tee::test

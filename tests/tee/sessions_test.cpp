@@ -1,0 +1,208 @@
+// Instances and sessions: life, identity, sharing, cycles.
+#include "tee_client_api.h"
+#include "tee_extensions.h"
+
+#include <cstring>
+#include <gtest/gtest.h>
+#include <openssl/hmac.h>
+#include <thread>
+#include <unistd.h>
+
+#include "tee/device/clock.h"
+#include "tests/tee/client.h"
+#include "tests/tee/ta_echo/echo_ta.h"
+
+namespace tee::test {
+namespace {
+
+class sessions : public ::testing::Test {
+ protected:
+  temp_device made;
+};
+
+uint32_t count(client& from) {
+  TEEC_Operation operation{};
+  operation.paramTypes = TEEC_PARAM_TYPES(TEEC_VALUE_OUTPUT, 0, 0, 0);
+  EXPECT_EQ(from.invoke(echo::COUNT, &operation), TEEC_SUCCESS);
+  return operation.params[0].value.a;
+}
+
+TEST_F(sessions, globals_last_as_long_as_the_context) {
+  {
+    client first(made.path(), echo::FIRST);
+    EXPECT_EQ(count(first), 1u);
+    client again(made.path(), echo::FIRST);  // a context of its own, on the same device
+    EXPECT_EQ(count(again), 2u);
+    first.close_session();
+    first.open_session(echo::FIRST);
+    EXPECT_EQ(count(first), 3u);
+    temp_device other;
+    client elsewhere(other.path(), echo::FIRST);
+    EXPECT_EQ(count(elsewhere), 1u);
+  }
+  client fresh(made.path(), echo::FIRST);
+  EXPECT_EQ(count(fresh), 1u);
+}
+
+TEST_F(sessions, a_failed_create_leaves_nothing) {
+  client user(made.path(), echo::FIRST);
+  EXPECT_EQ(user.invoke(echo::FAIL_CREATE, nullptr), TEEC_SUCCESS);
+  user.restart();
+  EXPECT_EQ(user.open_session(echo::FIRST), TEEC_ERROR_BAD_STATE);
+  EXPECT_EQ(user.origin, TEEC_ORIGIN_TRUSTED_APP);
+  host::live_counts counts;
+  EXPECT_FALSE(host::counts_of(echo::FIRST, &counts));
+  EXPECT_EQ(user.open_session(echo::FIRST), TEEC_SUCCESS);
+  EXPECT_EQ(count(user), 1u);
+}
+
+TEST_F(sessions, what_a_trusted_application_leaves_is_counted_and_reported) {
+  std::string trace;
+  host::set_trace_level(TEE_TRACE_INFO);
+  host::set_trace_sink([](void* out, uint32_t, const char* line,
+                          size_t length) { static_cast<std::string*>(out)->append(line, length); },
+                       &trace);
+  {
+    client user(made.path(), echo::FIRST);
+    EXPECT_EQ(user.invoke(echo::LEAK, nullptr), TEEC_SUCCESS);
+    EXPECT_EQ(user.invoke(echo::KEEP_SESSION, nullptr), TEEC_SUCCESS);
+    host::live_counts counts;
+    ASSERT_TRUE(host::counts_of(echo::FIRST, &counts));
+    EXPECT_EQ(counts, (host::live_counts{100, 1, 0, 0, 1}));
+  }
+  host::set_trace_sink(nullptr, nullptr);
+  host::set_trace_level(TEE_TRACE_ERROR);
+  EXPECT_NE(trace.find("1f3c5e70-0001-4a00-8000-000000000001 ended with 1 heap blocks (100 bytes)"),
+            std::string::npos)
+      << trace;
+}
+
+TEST_F(sessions, mutual_sessions_end_with_the_context) {
+  client user(made.path(), echo::FIRST);
+  EXPECT_EQ(user.invoke(echo::KEEP_SESSION, nullptr), TEEC_SUCCESS);
+  EXPECT_EQ(user.open_session(echo::SECOND), TEEC_SUCCESS);
+  EXPECT_EQ(user.invoke(echo::KEEP_SESSION, nullptr), TEEC_SUCCESS);
+  user.restart();
+  EXPECT_EQ(user.open_session(echo::FIRST), TEEC_SUCCESS);
+}
+
+TEST_F(sessions, the_callee_sees_who_calls) {
+  const TEE_UUID missing = {9, 9, 9, {}};
+  struct {
+    std::vector<TEE_UUID> path;
+    TEEC_Result result;
+    uint32_t inner_origin;
+    const char* identity;
+  } cases[] = {
+      {{}, TEEC_SUCCESS, 0, "0:00000000-0000-0000-0000-000000000000"},
+      {{echo::SECOND},
+       TEEC_SUCCESS,
+       TEEC_ORIGIN_TRUSTED_APP,
+       "4026531840:1f3c5e70-0001-4a00-8000-000000000001"},
+      {{missing}, TEEC_ERROR_ITEM_NOT_FOUND, TEEC_ORIGIN_TEE, ""},
+      {{echo::FIRST}, TEEC_ERROR_BUSY, TEEC_ORIGIN_TEE, ""},
+      {{echo::SECOND, echo::FIRST}, TEEC_ERROR_BUSY, TEEC_ORIGIN_TRUSTED_APP, ""},
+  };
+  client user(made.path(), echo::FIRST);
+  host::set_trace_level(0);
+  for (auto& row : cases) {
+    char identity[64] = {};
+    TEEC_Operation operation{};
+    operation.paramTypes = TEEC_PARAM_TYPES(TEEC_MEMREF_TEMP_INPUT, TEEC_MEMREF_TEMP_OUTPUT,
+                                            TEEC_VALUE_OUTPUT, TEEC_NONE);
+    operation.params[0].tmpref = {row.path.data(), row.path.size() * sizeof(TEE_UUID)};
+    operation.params[1].tmpref = {identity, sizeof(identity)};
+    EXPECT_EQ(user.invoke(echo::RELAY, &operation), row.result);
+    EXPECT_EQ(operation.params[2].value.a, row.inner_origin);
+    EXPECT_STREQ(identity, row.identity);
+  }
+  host::set_trace_level(TEE_TRACE_ERROR);
+}
+
+TEST_F(sessions, logins_are_derived_and_checked) {
+  client user(made.path(), echo::FIRST);
+  uint32_t own_group = getegid();
+  uint32_t no_group = 0xFFFFFFF0;
+  struct {
+    uint32_t method;
+    const void* data;
+    TEEC_Result result;
+    const char* begins;
+  } cases[] = {
+      {TEEC_LOGIN_USER, nullptr, TEEC_SUCCESS, "1:"},
+      {TEEC_LOGIN_GROUP, &own_group, TEEC_SUCCESS, "2:"},
+      {TEEC_LOGIN_APPLICATION, nullptr, TEEC_SUCCESS, "4:"},
+      {TEEC_LOGIN_GROUP_APPLICATION, &own_group, TEEC_SUCCESS, "6:"},
+      {TEEC_LOGIN_GROUP, &no_group, TEEC_ERROR_ACCESS_DENIED, ""},
+      {TEEC_LOGIN_GROUP, nullptr, TEEC_ERROR_BAD_PARAMETERS, ""},
+      {TEEC_LOGIN_PUBLIC, &own_group, TEEC_ERROR_BAD_PARAMETERS, ""},
+      {3, nullptr, TEEC_ERROR_BAD_PARAMETERS, ""},
+      {TEE_LOGIN_TRUSTED_APP, nullptr, TEEC_ERROR_BAD_PARAMETERS, ""},
+  };
+  for (const auto& row : cases) {
+    EXPECT_EQ(user.open_session(echo::FIRST, nullptr, row.method, row.data), row.result);
+    if (row.result != TEEC_SUCCESS) continue;
+    char identity[64] = {};
+    TEEC_Operation operation{};
+    operation.paramTypes = TEEC_PARAM_TYPES(TEEC_MEMREF_TEMP_INPUT, TEEC_MEMREF_TEMP_OUTPUT,
+                                            TEEC_VALUE_OUTPUT, TEEC_NONE);
+    operation.params[1].tmpref = {identity, sizeof(identity)};
+    EXPECT_EQ(user.invoke(echo::RELAY, &operation), TEEC_SUCCESS);
+    EXPECT_EQ(std::string(identity).rfind(row.begins, 0), 0u) << identity;
+    EXPECT_EQ(identity[2 + 14], '5') << identity;  // the UUID's version
+  }
+}
+
+TEST_F(sessions, calls_from_many_threads_take_turns) {
+  client user(made.path(), echo::FIRST);
+  std::vector<std::thread> threads;
+  for (int i = 0; i < 4; i++) {
+    threads.emplace_back([&] {
+      client own(made.path(), echo::FIRST);
+      for (int calls = 0; calls < 500; calls++)
+        count(own);
+    });
+  }
+  for (auto& thread : threads)
+    thread.join();
+  EXPECT_EQ(count(user), 2001u);
+}
+
+TEST_F(sessions, the_authenticator_issues_tokens_for_the_boot) {
+  constexpr TEE_UUID AUTHENTICATOR = {
+      0x2d8c6b71, 0xf45a, 0x4309, {0x86, 0xe2, 0x93, 0xb1, 0xd0, 0x7c, 0xa5, 0xfe}};
+  client user(made.path(), AUTHENTICATOR);
+  std::string request = "challengeuser_id_authenticatype";
+  request = "CHALLENGUSER__IDAUTH__ID\x02\x01\x00\x00" + std::string(2, '\0');
+  request.resize(28);
+  std::string token(70, '#');
+  struct {
+    size_t in, out;
+    TEEC_Result result;
+    size_t size;
+  } cases[] = {{27, 69, TEEC_ERROR_BAD_PARAMETERS, 69},
+               {28, 0, TEEC_ERROR_SHORT_BUFFER, 69},
+               {28, 68, TEEC_ERROR_SHORT_BUFFER, 69},
+               {28, 70, TEEC_SUCCESS, 69}};
+  host::set_clocks(1, 0x0102030405);
+  for (const auto& row : cases) {
+    TEEC_Operation operation{};
+    operation.paramTypes = TEEC_PARAM_TYPES(TEEC_MEMREF_TEMP_INPUT, TEEC_MEMREF_TEMP_OUTPUT, 0, 0);
+    operation.params[0].tmpref = {request.data(), row.in};
+    operation.params[1].tmpref = {token.data(), row.out};
+    EXPECT_EQ(user.invoke(1, &operation), row.result);
+    EXPECT_EQ(operation.params[1].tmpref.size, row.size);
+  }
+  host::use_real_clocks();
+  EXPECT_EQ(token.substr(0, 37),
+            std::string("\0CHALLENGUSER__IDAUTH__ID\0\0\1\2\0\0\0\1\2\3\4\5", 37));
+  user.close_context();
+  auto dev = made.open();
+  std::string mac(32, '\0');
+  HMAC(EVP_sha256(), dev->boot_seed().data(), 32, reinterpret_cast<const uint8_t*>(token.data()),
+       37, reinterpret_cast<uint8_t*>(mac.data()), nullptr);
+  EXPECT_EQ(token.substr(37), mac + "#");
+}
+
+}  // namespace
+}  // namespace tee::test

@@ -1,0 +1,217 @@
+// The client API: contexts, parameters, shared memory, bad input.
+#include "tee_client_api.h"
+#include "tee_extensions.h"
+
+#include <filesystem>
+#include <gtest/gtest.h>
+#include <stdlib.h>
+
+#include "tests/tee/client.h"
+#include "tests/tee/ta_echo/echo_ta.h"
+
+namespace tee::test {
+namespace {
+
+class teec : public ::testing::Test {
+ protected:
+  temp_device made;
+  client user{made.path(), echo::FIRST};
+};
+
+constexpr uint32_t MIRROR_TYPES = TEEC_PARAM_TYPES(TEEC_VALUE_INOUT, TEEC_MEMREF_TEMP_INPUT,
+                                                   TEEC_MEMREF_TEMP_OUTPUT, TEEC_VALUE_OUTPUT);
+
+TEST_F(teec, values_and_temporary_memory) {
+  struct {
+    std::string in;
+    size_t room;
+    TEEC_Result result;
+  } cases[] = {{"hello", 5, TEEC_SUCCESS},
+               {"hello", 9, TEEC_SUCCESS},
+               {"hello", 4, TEEC_ERROR_SHORT_BUFFER},
+               {"", 0, TEEC_SUCCESS}};
+  for (const auto& row : cases) {
+    std::string in = row.in;
+    std::string out(row.room, '#');
+    TEEC_Operation operation{};
+    operation.paramTypes = MIRROR_TYPES;
+    operation.params[0].value = {1, 2};
+    operation.params[1].tmpref = {in.empty() ? nullptr : in.data(), in.size()};
+    operation.params[2].tmpref = {out.empty() ? nullptr : out.data(), out.size()};
+    operation.params[3].value = {77, 88};
+    EXPECT_EQ(user.invoke(echo::MIRROR, &operation), row.result);
+    EXPECT_EQ(user.origin, TEEC_ORIGIN_TRUSTED_APP);
+    EXPECT_EQ(operation.params[0].value.a, 2u);
+    EXPECT_EQ(operation.params[0].value.b, 1u);
+    EXPECT_EQ(operation.params[1].tmpref.size, in.size());
+    EXPECT_EQ(operation.params[2].tmpref.size, in.size());
+    EXPECT_EQ(operation.params[3].value.a, 1u);  // it came in as zero
+    EXPECT_EQ(operation.params[3].value.b, 0u);
+    if (row.result == TEEC_SUCCESS) {
+      EXPECT_EQ(out.substr(0, in.size()), in);
+    }
+  }
+}
+
+TEST_F(teec, registered_and_allocated_memory) {
+  std::string bytes = "0123456789";
+  TEEC_SharedMemory in{bytes.data(), bytes.size(), TEEC_MEM_INPUT, nullptr};
+  TEEC_SharedMemory out{nullptr, 8, TEEC_MEM_INPUT | TEEC_MEM_OUTPUT, nullptr};
+  ASSERT_EQ(TEEC_RegisterSharedMemory(&user.context, &in), TEEC_SUCCESS);
+  ASSERT_EQ(TEEC_AllocateSharedMemory(&user.context, &out), TEEC_SUCCESS);
+  client other(made.path(), echo::SECOND);
+  TEEC_SharedMemory foreign = in;
+  ASSERT_EQ(TEEC_RegisterSharedMemory(&other.context, &foreign), TEEC_SUCCESS);
+  TEEC_SharedMemory stale = in;
+  stale.imp = nullptr;
+
+  struct {
+    uint32_t in_type;
+    TEEC_RegisteredMemoryReference in;
+    uint32_t out_type;
+    TEEC_RegisteredMemoryReference out;
+    TEEC_Result result;
+    size_t size;  // of the output slot afterwards
+  } cases[] = {
+      {TEEC_MEMREF_PARTIAL_INPUT, {&in, 4, 6}, TEEC_MEMREF_PARTIAL_OUTPUT, {&out, 5, 3}, 0, 4},
+      {TEEC_MEMREF_PARTIAL_INPUT, {&in, 2, 0}, TEEC_MEMREF_WHOLE, {&out, 0, 0}, 0, 2},
+      {TEEC_MEMREF_WHOLE,
+       {&in, 0, 0},
+       TEEC_MEMREF_WHOLE,
+       {&out, 0, 0},
+       TEEC_ERROR_SHORT_BUFFER,
+       10},
+      {TEEC_MEMREF_PARTIAL_INPUT, {&in, 0, 10}, TEEC_MEMREF_WHOLE, {&out, 0, 0}, 0, 0},
+      {TEEC_MEMREF_PARTIAL_INPUT,
+       {&in, 5, 6},
+       TEEC_MEMREF_WHOLE,
+       {&out, 9, 0},
+       TEEC_ERROR_BAD_PARAMETERS,
+       9},
+      {TEEC_MEMREF_PARTIAL_INPUT,
+       {&in, 2, SIZE_MAX},
+       TEEC_MEMREF_WHOLE,
+       {&out, 9, 0},
+       TEEC_ERROR_BAD_PARAMETERS,
+       9},
+      {TEEC_MEMREF_PARTIAL_INPUT,
+       {&in, SIZE_MAX, 2},
+       TEEC_MEMREF_WHOLE,
+       {&out, 9, 0},
+       TEEC_ERROR_BAD_PARAMETERS,
+       9},
+      {TEEC_MEMREF_WHOLE,
+       {&in, 0, 0},
+       TEEC_MEMREF_PARTIAL_OUTPUT,
+       {&in, 9, 0},
+       TEEC_ERROR_BAD_PARAMETERS,
+       9},
+      {TEEC_MEMREF_WHOLE,
+       {nullptr, 0, 0},
+       TEEC_MEMREF_WHOLE,
+       {&out, 9, 0},
+       TEEC_ERROR_BAD_PARAMETERS,
+       9},
+      {TEEC_MEMREF_WHOLE,
+       {&foreign, 0, 0},
+       TEEC_MEMREF_WHOLE,
+       {&out, 9, 0},
+       TEEC_ERROR_BAD_PARAMETERS,
+       9},
+      {TEEC_MEMREF_WHOLE,
+       {&stale, 0, 0},
+       TEEC_MEMREF_WHOLE,
+       {&out, 9, 0},
+       TEEC_ERROR_BAD_PARAMETERS,
+       9},
+  };
+  for (const auto& row : cases) {
+    TEEC_Operation operation{};
+    operation.paramTypes =
+        TEEC_PARAM_TYPES(TEEC_VALUE_INOUT, row.in_type, row.out_type, TEEC_VALUE_OUTPUT);
+    operation.params[1].memref = row.in;
+    operation.params[2].memref = row.out;
+    EXPECT_EQ(user.invoke(echo::MIRROR, &operation), row.result);
+    EXPECT_EQ(operation.params[2].memref.size, row.size);
+    if (row.result == TEEC_SUCCESS) {
+      EXPECT_EQ(memcmp(static_cast<char*>(out.buffer) + row.out.offset,
+                       bytes.data() + row.in.offset, row.in.size),
+                0);
+    }
+  }
+  TEEC_ReleaseSharedMemory(&in);
+  TEEC_ReleaseSharedMemory(&in);
+  TEEC_ReleaseSharedMemory(&out);
+  EXPECT_EQ(out.buffer, nullptr);
+  for (auto [buffer, size, flags, expected] :
+       {std::tuple{bytes.data(), size_t{10}, 0u, TEEC_ERROR_BAD_PARAMETERS},
+        {bytes.data(), size_t{10}, 4u, TEEC_ERROR_BAD_PARAMETERS},
+        {static_cast<char*>(nullptr), size_t{10}, 1u, TEEC_ERROR_BAD_PARAMETERS},
+        {bytes.data(), size_t{TEEC_CONFIG_SHAREDMEM_MAX_SIZE} + 1, 1u, TEEC_ERROR_OUT_OF_MEMORY}}) {
+    TEEC_SharedMemory memory{buffer, size, flags, nullptr};
+    EXPECT_EQ(TEEC_RegisterSharedMemory(&user.context, &memory), expected);
+  }
+}
+
+TEST_F(teec, bad_calls_are_refused) {
+  for (uint32_t types : {4u, 8u, 0xBu, 0x40u, 0x10000u, 0xFFFF0000u}) {
+    TEEC_Operation operation{};
+    operation.paramTypes = types;
+    EXPECT_EQ(user.invoke(echo::COUNT, &operation), TEEC_ERROR_BAD_PARAMETERS) << types;
+    EXPECT_EQ(user.origin, TEEC_ORIGIN_API);
+  }
+  TEEC_Operation operation{};
+  operation.paramTypes = MIRROR_TYPES;
+  operation.params[1].tmpref = {nullptr, 1};
+  EXPECT_EQ(user.invoke(echo::MIRROR, &operation), TEEC_ERROR_BAD_PARAMETERS);
+  EXPECT_EQ(user.invoke(99, nullptr), TEEC_ERROR_NOT_SUPPORTED);
+  EXPECT_EQ(user.origin, TEEC_ORIGIN_TRUSTED_APP);
+
+  // The trusted application's refusal to open a session gives its outputs, and no session.
+  operation = {};
+  operation.paramTypes = TEEC_VALUE_INOUT;
+  operation.params[0].value.a = TEEC_ERROR_EXCESS_DATA;
+  EXPECT_EQ(user.open_session(echo::FIRST, &operation), TEEC_ERROR_EXCESS_DATA);
+  EXPECT_EQ(operation.params[0].value.b, 3u);
+  EXPECT_EQ(user.origin, TEEC_ORIGIN_TRUSTED_APP);
+  EXPECT_EQ(user.invoke(echo::COUNT, nullptr), TEEC_ERROR_BAD_PARAMETERS);
+
+  EXPECT_EQ(user.open_session({1, 1, 1, {}}), TEEC_ERROR_ITEM_NOT_FOUND);
+  EXPECT_EQ(user.origin, TEEC_ORIGIN_TEE);
+  TEEC_UUID uuid = to_client(echo::FIRST);
+  EXPECT_EQ(TEEC_OpenSession(nullptr, &user.session, &uuid, 0, nullptr, nullptr, nullptr),
+            TEEC_ERROR_BAD_PARAMETERS);
+  EXPECT_EQ(TEEC_InvokeCommand(nullptr, 0, nullptr, nullptr), TEEC_ERROR_BAD_PARAMETERS);
+  TEEC_CloseSession(nullptr);
+  TEEC_FinalizeContext(nullptr);
+}
+
+TEST_F(teec, a_context_that_ends_takes_its_sessions_along) {
+  TEEC_Session copy = user.session;
+  TEEC_FinalizeContext(&user.context);
+  EXPECT_EQ(TEEC_InvokeCommand(&copy, echo::COUNT, nullptr, nullptr), TEEC_ERROR_BAD_PARAMETERS);
+  TEEC_CloseSession(&copy);
+  EXPECT_NE(made.open(), nullptr);
+}
+
+TEST_F(teec, contexts_that_cannot_be) {
+  host::set_trace_level(0);
+  TEEC_Context context{};
+  EXPECT_EQ(TEEC_InitializeContext((made.path() + "/none").c_str(), &context),
+            TEEC_ERROR_ITEM_NOT_FOUND);
+  EXPECT_EQ(TEEC_InitializeContext(made.path().c_str(), nullptr), TEEC_ERROR_BAD_PARAMETERS);
+  temp_device held;
+  auto holder = held.open();
+  EXPECT_EQ(TEEC_InitializeContext(held.path().c_str(), &context), TEEC_ERROR_BUSY);
+  holder.reset();
+  set_content(held.file("device.key"), "");
+  EXPECT_EQ(TEEC_InitializeContext(held.path().c_str(), &context), TEEC_ERROR_BAD_FORMAT);
+  setenv("KEYMASTER_DEVICE", made.path().c_str(), 1);
+  EXPECT_EQ(TEEC_InitializeContext(nullptr, &context), TEEC_SUCCESS);
+  TEEC_FinalizeContext(&context);
+  unsetenv("KEYMASTER_DEVICE");
+  host::set_trace_level(TEE_TRACE_ERROR);
+}
+
+}  // namespace
+}  // namespace tee::test
