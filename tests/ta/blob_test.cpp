@@ -1,0 +1,231 @@
+// Key blobs and the keys that they are sealed under: stored bytes, blobs that are taken apart and
+// made apart from the TA, damage, and what happens to the key in the replay-protected storage.
+#include <gtest/gtest.h>
+
+#include "support/blob_forge.h"
+#include "support/sets.h"
+#include "support/ta_under_test.h"
+#include "tee/device/object_store.h"
+#include "tee/runtime/stored_object.h"
+
+namespace keymaster::test {
+namespace {
+
+using client::as_bytes;
+using client::from_hex;
+using client::to_hex;
+
+constexpr uint32_t SIGN = KM_PURPOSE_SIGN;
+constexpr char RFC_4231_CASE_1[] =
+    "b0344c61d8db38535ca8afceaf0bf12b881dc200c9833da726e9376c2e32cff7";
+constexpr TEEC_Result KSK_DELETED = 0xF0100001;
+
+const tee::object_name KSK_OBJECT = {
+    TEE_STORAGE_RPMB,
+    tee::to_bytes(KEYMASTER_TA),
+    {'K', 'e', 'y', 'm', 'a', 's', 't', 'e', 'r', ' ', 'K', 'S', 'K', 0}};
+
+// The device must be stopped.
+void store_ksk(const ta_under_test& ta, byte_view ksk) {
+  tee::stored_object object;
+  object.data.assign(ksk.begin(), ksk.end());
+  tee::device::open(ta.path())->objects().save(KSK_OBJECT, tee::encode(object));
+}
+
+std::optional<bytes> stored_ksk(const ta_under_test& ta) {
+  const auto content = tee::device::open(ta.path())->objects().load(KSK_OBJECT);
+  if (!content) return std::nullopt;
+  const auto object = tee::decode(*content);
+  return bytes(object->data.begin(), object->data.end());
+}
+
+void set_rpmb(ta_under_test* ta, bool present) {
+  ta->stop();
+  tee::device_settings settings = tee::device::read_settings(ta->path());
+  settings.rpmb = present;
+  tee::device::write_settings(ta->path(), settings);
+  EXPECT_EQ(ta->start(), TEEC_SUCCESS);
+}
+
+bytes fixed_ksk() {
+  return from_hex("000102030405060708090a0b0c0d0e0f101112131415161718191a1b1c1d1e1f");
+}
+
+// Blobs of the HMAC key of RFC 4231, test case 1, as the TA once made them on this device: under
+// the derived key, and under the stored key above. They must open for ever.
+constexpr char FROZEN_DERIVED[] =
+    "00ae6ff5bc595bdcfe677cf5c10058c6290b56c89d60650d47ff18fd7024da8f85fd6a5580c21ff93f738b62aee2"
+    "d47276f76ed36bd72da7ef5626cb3c30b223524297be907e39dc45728ba2fa4b7814b8d78a66273ea24315979166"
+    "4efc8263263500f0a5fb119f977eddbc8b6a43a4e55d3e83050a86b64c4c24ab2dbe012776fa62bbeb08b981e663"
+    "e4ee5cdc9184b6499b0c7d294441bab4f18237edc61abe3cf91911bde9bf7656be5e4ff9672fbbf051026b9521da"
+    "fc8ebf72740b03a6e528273198b3127a1efb7ee723efe65880e6e9ee82ae5bc86cef65b76600fdcab05ecafd43a0"
+    "97773398544493b67e0cf87b7616710da801475f48a4257e3ad2b48287cd4c1eeb38cfad79563f9b95b77da3b9e5"
+    "8089a82454d380bbed48b6a04915dcd4306f6a3ba5cb3abeec474a9c7336676d265042a9a728f69c8a56749113d9"
+    "4cfe3a99e699557a7e3e27a1946261259705ce4f38023c52709a81517ae2b92ec505c5b160752b1556d9e69c4042"
+    "42711b6b180c16981d4c96d93aa57f8f39d1693a24d9005e4b2a71eb54";
+constexpr char FROZEN_RPMB[] =
+    "01e18601312e73d5259fcc5e14cba4560406879c05583c8f140cd84b4ab2482da78c4c410690f65f0a8925783ad4"
+    "923ac86715fa18af8fc9c542d01322c7408e376624238c43dd36080785da08996211cd7414e2844f629c954d42ba"
+    "c694aeff006ebddba6eafd70784049bc76ba0a4cb1d433a2608ebdbfc2b23206f40f331fd03ff2c3c3ad1106e6f5"
+    "59ddc93b274afcc6eeb55db0c614fe1970d62088aa81c517ad91c08c378ed7eaa25fcbf4f565d7804677d3c922a7"
+    "0b4e99d5b22cc932eae27bc63bc768264211103bac3eea65118eff0c3c5f6b3b05323df6978f63762352d729f53e"
+    "bbd33e22903181daf85300bb82c2297cb6140e8577b6f36b254615af5a29de397b8835b2cea113754b18a3765fb5"
+    "004c166baad8293acf5999c767b70d755a5580dfa505f396f7d7033b50c0c36eda35afcce60bf7e3a3009523745e"
+    "b3be30d59e1952fde361f1fb257b9996bb2880a34e7abd404b1b3fcfe45266ac4cde23305c9012763311b1283a2b"
+    "8046d6dda16b0074a6b559447d77e2ae956422ec8290f7aab1a471c35c";
+
+TEST(Blob, FrozenOnesOpenForEver) {
+  ta_under_test ta;
+  ta.stop();
+  store_ksk(ta, fixed_ksk());
+  ta.restart();
+  for (const char* frozen : {FROZEN_DERIVED, FROZEN_RPMB}) {
+    const bytes blob = from_hex(frozen);
+    EXPECT_EQ(to_hex(ta.run(SIGN, blob, mac_use(), as_bytes("Hi There"))), RFC_4231_CASE_1);
+    EXPECT_EQ(ta.characteristics(blob), hmac_key()
+                                            .add(KM_TAG_ORIGIN, KM_ORIGIN_IMPORTED)
+                                            .add(KM_TAG_OS_VERSION, 80100)
+                                            .add(KM_TAG_OS_PATCHLEVEL, 201812)
+                                            .add(KM_TAG_CREATION_DATETIME, 1'700'000'000'000)
+                                            .add(KM_TAG_KEY_SIZE, 160));
+  }
+}
+
+TEST(Blob, AreSealedAsTheFormatSays) {
+  ta_under_test ta;
+  ta.stop();
+  store_ksk(ta, fixed_ksk());
+  ta.restart();
+  const bytes first = ta.import(hmac_key(), bytes(20, 0x0b));
+  const bytes second = ta.import(hmac_key(), bytes(20, 0x0b));
+  EXPECT_EQ(first[0], 1);
+  EXPECT_EQ(unseal(first, fixed_ksk()), unseal(second, fixed_ksk()));
+  // Salt, nonce and tag are all new.
+  for (const auto& [from, to] : {std::pair{1, 65}, {65, 77}, {77, 93}}) {
+    EXPECT_NE(bytes(first.begin() + from, first.begin() + to),
+              bytes(second.begin() + from, second.begin() + to));
+  }
+  const bytes apart = seal(unseal(first, fixed_ksk()), fixed_ksk(), 1);
+  EXPECT_EQ(to_hex(ta.run(SIGN, apart, mac_use(), as_bytes("Hi There"))), RFC_4231_CASE_1);
+}
+
+// Whatever is wrong with a blob, its opening is answered alike; the reason is traced.
+TEST(Blob, ThatDoNotOpenAskForAnUpgrade) {
+  ta_under_test ta({.rpmb = false});
+  const param_set made = ta.characteristics(ta.generate(hmac_key(256)));
+  const bytes good = blob_plaintext(hmac_material(bytes(32, 1)), made);
+  bytes long_key = good;
+  long_key[1] = 0xFF;
+  bytes long_set = good;
+  long_set[44]++;
+  bytes huge_set = good;
+  huge_set[47] = 0xFF;
+  bytes no_set = good;
+  no_set[48]++;  // announces one parameter more
+  bytes trailing = good;
+  trailing.push_back(0x99);
+  const std::string too_short = "open_key: Too short input";
+  const struct {
+    const char* what;
+    bytes blob;
+    std::string reason;  // empty: it opens
+  } cases[] = {
+      {"good", seal(good), ""},
+      {"bytes behind the characteristics", seal(trailing), ""},
+      {"nothing inside", seal({}), "open_key: Too short key blob"},
+      {"one byte inside", seal(bytes(1)), too_short},
+      {"an empty key and nothing else", seal(bytes(4)), too_short},
+      {"key length", seal(long_key), too_short},
+      {"characteristics length", seal(long_set), too_short},
+      {"characteristics length of 4 GiB", seal(huge_set), too_short},
+      {"characteristics", seal(no_set), "unmarshal: Too short input | open_key: Unmarshal failed"},
+      {"no characteristics", seal(bytes(8)),
+       "unmarshal: Too short input | open_key: Unmarshal failed"},
+      {"protection 2", seal(good, derived_ksk(), 2), "open_key: Unknown key protection"},
+      {"protection 255", seal(good, derived_ksk(), 255), "open_key: Unknown key protection"},
+      {"protection 1 without such a key", seal(good, derived_ksk(), 1),
+       "open_key: RPMB KSK died, fail to open key"},
+      {"another device", seal(good, fixed_ksk()),
+       "open_key: AEDecryptFinal failed with 0xffff3071"},
+  };
+  for (const auto& c : cases) {
+    const reply answer = ta.send(key_request(command::GET_KEY_CHARACTER, c.blob));
+    EXPECT_EQ(answer.km_error, c.reason.empty() ? 0 : -62) << c.what;
+    EXPECT_EQ(answer.res, 0u) << c.what;
+    const std::string errors =
+        c.reason.empty() ? "" : c.reason + " | get_key_character: Open key failed";
+    EXPECT_EQ(ta.trace().errors(), errors) << c.what;
+  }
+}
+
+TEST(Blob, NoBitMayChange) {
+  ta_under_test ta;
+  const bytes blob = ta.generate(hmac_key(256));
+  for (size_t bit = 0; bit < 8 * blob.size(); bit++) {
+    bytes changed = blob;
+    changed[bit / 8] = static_cast<uint8_t>(changed[bit / 8] ^ 1 << bit % 8);
+    EXPECT_TRUE(refused(ta.send(key_request(command::GET_KEY_CHARACTER, changed)), -62)) << bit;
+  }
+  EXPECT_TRUE(succeeded(ta.send(key_request(command::GET_KEY_CHARACTER, blob))));
+}
+
+TEST(KeyStorageKey, SurvivesRestartAndReboot) {
+  for (const bool rpmb : {false, true}) {
+    ta_under_test ta({.rpmb = rpmb});
+    const bytes blob = ta.import(hmac_key(), bytes(20, 0x0b));
+    EXPECT_EQ(blob[0], rpmb ? 1 : 0);
+    ta.restart();
+    EXPECT_EQ(to_hex(ta.run(SIGN, blob, mac_use(), as_bytes("Hi There"))), RFC_4231_CASE_1);
+    ta.reboot();
+    EXPECT_EQ(to_hex(ta.run(SIGN, blob, mac_use(), as_bytes("Hi There"))), RFC_4231_CASE_1);
+  }
+}
+
+TEST(KeyStorageKey, BlobsOfTheDerivedOneOpenBesideTheOther) {
+  ta_under_test ta({.rpmb = false, .configured = false});
+  ta.restart();
+  EXPECT_TRUE(ta.trace().has("key_store_init: no RPMB for ksk"));
+  EXPECT_EQ(ta.trace().errors(), "judge_rpmb: TEE_RPMB_MakeFileSystem return 0xffff000a");
+  ta.configure(OS_VERSION, OS_PATCHLEVEL);
+  const bytes derived = ta.generate(hmac_key(256));
+  set_rpmb(&ta, true);
+  ta.configure(OS_VERSION, OS_PATCHLEVEL);
+  const bytes stored = ta.generate(hmac_key(256));
+  EXPECT_EQ(derived[0], 0);
+  EXPECT_EQ(stored[0], 1);
+  EXPECT_TRUE(succeeded(ta.send(key_request(command::GET_KEY_CHARACTER, derived))));
+  EXPECT_TRUE(succeeded(ta.send(key_request(command::GET_KEY_CHARACTER, stored))));
+  set_rpmb(&ta, false);
+  ta.configure(OS_VERSION, OS_PATCHLEVEL);
+  EXPECT_TRUE(succeeded(ta.send(key_request(command::GET_KEY_CHARACTER, derived))));
+  EXPECT_TRUE(refused(ta.send(key_request(command::GET_KEY_CHARACTER, stored)), -62));
+}
+
+// A stored key of the wrong length costs one start, which is refused, and every blob made under it.
+TEST(KeyStorageKey, OfWrongLengthIsReplacedOverTwoStarts) {
+  ta_under_test ta;
+  for (const size_t size : {0u, 1u, 31u, 33u, 64u}) {
+    const bytes lost = ta.generate(hmac_key(256));
+    ta.stop();
+    const auto old_ksk = stored_ksk(ta);
+    ASSERT_TRUE(old_ksk && old_ksk->size() == 32);
+    bytes wrong = *old_ksk;
+    wrong.resize(size);
+    store_ksk(ta, wrong);
+    EXPECT_EQ(ta.start(), KSK_DELETED) << size;
+    EXPECT_TRUE(
+        ta.trace().has("key_store_init_rpmb_ksk: Now, delete the key and recreate it, but "
+                       "all previous keymaster key will die"))
+        << ta.trace().errors();
+    EXPECT_TRUE(ta.trace().has("TA_CreateEntryPoint: Init key store failed"));
+    EXPECT_FALSE(stored_ksk(ta)) << size;
+    ta.restart();
+    EXPECT_TRUE(refused(ta.send(key_request(command::GET_KEY_CHARACTER, lost)), -62));
+    const bytes kept = ta.generate(hmac_key(256));
+    ta.restart();
+    EXPECT_TRUE(succeeded(ta.send(key_request(command::GET_KEY_CHARACTER, kept))));
+  }
+}
+
+}  // namespace
+}  // namespace keymaster::test
