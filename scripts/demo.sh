@@ -16,7 +16,7 @@ echo "Building in $build; the first time takes a minute or two"
 if [[ -t 1 ]]; then
   cmake --build "$build"
 else
-  cmake --build "$build" >"$work/build.log" || { cat "$work/build.log"; exit 1; }
+  cmake --build "$build" >"$work/build.log" || { grep -vE "^\[[0-9]+/" "$work/build.log"; exit 1; }
 fi
 
 cp README.md "$work"
