@@ -1,8 +1,6 @@
 // The DER writer's primitives.
 #include "keymaster/attest/der/der.h"
 
-#include <limits>
-
 namespace keymaster {
 namespace {
 
@@ -19,7 +17,7 @@ int32_t write_byte(der_cursor* out, uint8_t value) {
 int32_t add(int32_t a, int32_t b) {
   if (a < 0) return a;
   if (b < 0) return b;
-  return a > std::numeric_limits<int32_t>::max() - b ? DER_TOO_SMALL : a + b;
+  return a > INT32_MAX - b ? DER_TOO_SMALL : a + b;
 }
 
 // Base 128, most significant first, with a mark on every octet but the last.
@@ -42,8 +40,7 @@ bool der_cursor::reserve(size_t size, byte_span* room) {
 
 int32_t der_write_bytes(der_cursor* out, byte_view bytes) {
   byte_span room;
-  if (bytes.size() > static_cast<size_t>(std::numeric_limits<int32_t>::max()) ||
-      !out->reserve(bytes.size(), &room)) {
+  if (bytes.size() > static_cast<size_t>(INT32_MAX) || !out->reserve(bytes.size(), &room)) {
     return DER_TOO_SMALL;
   }
   copy_bytes(room, bytes);
