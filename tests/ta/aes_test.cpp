@@ -1,0 +1,408 @@
+// AES through the command interface: published vectors, streams in pieces of every size, and what
+// is refused.
+#include <algorithm>
+#include <string>
+
+#include "support/sets.h"
+#include "support/ta_under_test.h"
+
+namespace keymaster::test {
+namespace {
+
+using client::from_hex;
+
+constexpr size_t BLOCK = 16;
+constexpr uint32_t UNKNOWN_MODE = 99;
+constexpr uint32_t ENCRYPT = KM_PURPOSE_ENCRYPT;
+constexpr uint32_t DECRYPT = KM_PURPOSE_DECRYPT;
+
+param_set numbers(keymaster_tag_t tag, std::initializer_list<uint32_t> values) {
+  param_set set;
+  for (uint32_t value : values)
+    set.add(tag, value);
+  return set;
+}
+
+// A key for both purposes, with every mode and padding, that takes nonces.
+param_set any_use() {
+  return one(KM_TAG_ALGORITHM, KM_ALGORITHM_AES)
+      .append(numbers(KM_TAG_PURPOSE, {ENCRYPT, DECRYPT}))
+      .append(numbers(KM_TAG_BLOCK_MODE,
+                      {KM_MODE_ECB, KM_MODE_CBC, KM_MODE_CTR, KM_MODE_GCM, UNKNOWN_MODE}))
+      .append(numbers(KM_TAG_PADDING, {KM_PAD_NONE, KM_PAD_PKCS7, KM_PAD_RSA_PSS}))
+      .add(KM_TAG_MIN_MAC_LENGTH, 96)
+      .add_flag(KM_TAG_CALLER_NONCE)
+      .add_flag(KM_TAG_NO_AUTH_REQUIRED);
+}
+
+// any_use with the values of one tag replaced.
+param_set any_use_but(keymaster_tag_t tag, std::initializer_list<uint32_t> values) {
+  return without(any_use(), tag).append(numbers(tag, values));
+}
+
+// What a begin asks for; 0 and an empty nonce leave the parameter out.
+param_set use(uint32_t mode, uint32_t padding = 0, uint32_t mac_bits = 0, byte_view nonce = {}) {
+  param_set params = one(KM_TAG_BLOCK_MODE, mode);
+  if (padding != 0) params.add(KM_TAG_PADDING, padding);
+  if (mac_bits != 0) params.add(KM_TAG_MAC_LENGTH, mac_bits);
+  if (!nonce.empty()) params.add_bytes(KM_TAG_NONCE, nonce);
+  return params;
+}
+
+param_set associated(byte_view data) {
+  return param_set().add_bytes(KM_TAG_ASSOCIATED_DATA, data);
+}
+
+bytes finished(const reply& answer) {
+  client::finish_result result;
+  if (answer.ok()) client::parse_finished(answer.output(), &result);
+  return result.output;
+}
+
+struct stream_vector {
+  const char* name;
+  uint32_t mode;
+  uint32_t padding;
+  uint32_t mac_bits;
+  const char* key;
+  const char* nonce;
+  const char* associated_data;
+  const char* plaintext;
+  const char* ciphertext;  // with the tag behind it
+
+  param_set params() const { return use(mode, padding, mac_bits, from_hex(nonce)); }
+};
+
+constexpr char KEY_128[] = "2b7e151628aed2a6abf7158809cf4f3c";
+constexpr char GCM_KEY[] = "feffe9928665731c6d6a8f9467308308";
+constexpr char GCM_NONCE[] = "cafebabefacedbaddecaf888";
+constexpr char GCM_AAD[] = "feedfacedeadbeeffeedfacedeadbeefabaddad2";
+constexpr char COUNTING_IV[] = "000102030405060708090a0b0c0d0e0f";
+#define FORTY_BYTES                                                  \
+  "6bc1bee22e409f96e93d7e117393172aae2d8a571e03ac9c9eb76fac45af8e51" \
+  "30c81c46a35ce411"
+#define FOUR_BLOCKS FORTY_BYTES "e5fbc1191a0a52eff69f2445df4f9b17ad2b417be66c3710"
+#define GCM_FORTY                                                    \
+  "d9313225f88406e5a55909c5aff5269a86a7a9531534f7da2e4c303d8a318a72" \
+  "1c3c0c9595680953"
+#define GCM_SIXTY GCM_FORTY "2fcf0e2449a6b525b16aedf5aa0de657ba637b39"
+
+// The first four are those of NIST SP 800-38A and of the GCM proposal (test case 4); the 40-byte
+// ones were made with the openssl command and an independent GCM.
+const stream_vector VECTORS[] = {
+    {"ECB 128", KM_MODE_ECB, KM_PAD_NONE, 0, KEY_128, "", "", FOUR_BLOCKS,
+     "3ad77bb40d7a3660a89ecaf32466ef97f5d3d58503b9699de785895a96fdbaaf"
+     "43b1cd7f598ece23881b00e3ed0306887b0c785e27e8ad3f8223207104725dd4"},
+    {"CBC 256", KM_MODE_CBC, KM_PAD_NONE, 0,
+     "603deb1015ca71be2b73aef0857d77811f352c073b6108d72d9810a30914dff4", COUNTING_IV, "",
+     FOUR_BLOCKS,
+     "f58c4c04d6e5f1ba779eabfb5f7bfbd69cfc4e967edb808d679f777bc6702c7d"
+     "39f23369a9d9bacfa530e26304231461b2eb05e2c39be9fcda6c19078c6a9d1b"},
+    {"CTR 192", KM_MODE_CTR, KM_PAD_NONE, 0, "8e73b0f7da0e6452c810f32b809079e562f8ead2522c6b7b",
+     "f0f1f2f3f4f5f6f7f8f9fafbfcfdfeff", "", FOUR_BLOCKS,
+     "1abc932417521ca24f2b0459fe7e6e0b090339ec0aa6faefd5ccc2c6f4ce8e94"
+     "1e36b26bd1ebc670d1bd1d665620abf74f78a7f6d29809585a97daec58c6b050"},
+    {"GCM 128", KM_MODE_GCM, KM_PAD_NONE, 128, GCM_KEY, GCM_NONCE, GCM_AAD, GCM_SIXTY,
+     "42831ec2217774244b7221b784d0d49ce3aa212f2c02a4e035c17e2329aca12e"
+     "21d514b25466931c7d8f6a5aac84aa051ba30b396a0aac973d58e0915bc94fbc3221a5db94fae95ae7121a47"},
+    {"CBC PKCS7, 40 bytes", KM_MODE_CBC, KM_PAD_PKCS7, 0, KEY_128, COUNTING_IV, "", FORTY_BYTES,
+     "7649abac8119b246cee98e9b12e9197d5086cb9b507219ee95db113a917678b2"
+     "5caca76145cffc65f7483608c531aef1"},
+    {"GCM, 40 bytes, 96-bit tag", KM_MODE_GCM, KM_PAD_NONE, 96, GCM_KEY, GCM_NONCE, GCM_AAD,
+     GCM_FORTY,
+     "42831ec2217774244b7221b784d0d49ce3aa212f2c02a4e035c17e2329aca12e"
+     "21d514b25466931c57c3b9a3a267920b9af8a26d"},
+};
+
+// How many bytes must have come out once `fed` bytes went in, before finish.
+size_t due(const stream_vector& v, uint32_t purpose, size_t fed) {
+  const size_t held = v.mac_bits / 8;
+  if (v.mode == KM_MODE_CTR) return fed;
+  if (v.mode == KM_MODE_GCM) {
+    return purpose == ENCRYPT ? fed : fed - std::min(fed, held);
+  }
+  const bool holds_block = purpose == DECRYPT && v.padding == KM_PAD_PKCS7 && fed > 0;
+  return (holds_block ? fed - 1 : fed) / BLOCK * BLOCK;
+}
+
+// Runs the input through in updates of `piece` bytes, each with exactly the room that its output
+// takes; the associated data comes in two halves, the second one together with the first piece.
+bytes stream(ta_under_test* ta, const stream_vector& v, uint32_t purpose, byte_view blob,
+             byte_view input, size_t piece) {
+  const uint32_t handle = ta->begun(purpose, blob, v.params());
+  const bytes aad = from_hex(v.associated_data);
+  const byte_view first_half = byte_view(aad).first(aad.size() / 2);
+  if (!aad.empty()) {
+    EXPECT_TRUE(succeeded(ta->update(handle, {}, associated(first_half))));
+  }
+  bytes output;
+  for (size_t fed = 0; fed < input.size(); fed += piece) {
+    const size_t next = std::min(input.size(), fed + piece);
+    param_set params;
+    if (fed == 0 && !aad.empty()) params = associated(byte_view(aad).subspan(aad.size() / 2));
+    const reply step =
+        ta->send(step_request(command::UPDATE, handle, input.subspan(fed, next - fed), params,
+                              due(v, purpose, next) - due(v, purpose, fed)));
+    EXPECT_TRUE(succeeded(step)) << ta->trace().errors();
+    EXPECT_EQ(step.b, next - fed) << "consumed";
+    output.insert(output.end(), step.output().begin(), step.output().end());
+    EXPECT_EQ(output.size(), due(v, purpose, next)) << "after " << next << " bytes";
+  }
+  const reply last = ta->finish(handle);
+  EXPECT_TRUE(succeeded(last)) << ta->trace().errors();
+  const bytes rest = finished(last);
+  output.insert(output.end(), rest.begin(), rest.end());
+  return output;
+}
+
+class aes : public testing::Test {
+ protected:
+  ta_under_test ta;
+  const bytes blob = ta.import(any_use(), from_hex(KEY_128));
+  const param_set gcm = use(KM_MODE_GCM, KM_PAD_NONE, 96);
+  const param_set padded = use(KM_MODE_CBC, KM_PAD_PKCS7);
+};
+
+TEST_F(aes, makes_and_takes_the_vectors_in_pieces_of_every_size) {
+  for (const stream_vector& v : VECTORS) {
+    ta.watch_secret(from_hex(v.key));
+    const bytes its_blob = ta.import(any_use(), from_hex(v.key));
+    const bytes plain = from_hex(v.plaintext);
+    const bytes cipher = from_hex(v.ciphertext);
+    for (size_t piece = 1; piece <= 65; piece += piece < 20 ? 1 : 45) {
+      SCOPED_TRACE(std::string(v.name).append(" in pieces of ").append(std::to_string(piece)));
+      EXPECT_EQ(stream(&ta, v, ENCRYPT, its_blob, plain, piece), cipher);
+      EXPECT_EQ(stream(&ta, v, DECRYPT, its_blob, cipher, piece), plain);
+    }
+  }
+}
+
+TEST_F(aes, keys_are_checked) {
+  const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
+  const std::string no_minimum = "No or too many KM_TAG_MIN_MAC_LENGTH";
+  const struct {
+    param_set description;
+    int32_t error;
+    std::string message;
+  } rows[] = {
+      {any_use().add(KM_TAG_CREATION_DATETIME, 1), -38,
+       "Shouldn't specify KM_TAG_CREATION_DATETIME"},
+      {any_use(), -38, no_size},
+      {any_use().append(numbers(KM_TAG_KEY_SIZE, {128, 128})), -38, no_size},
+      {any_use().add(KM_TAG_KEY_SIZE, 160), -6, "Invalid AES key size 160"},
+      {any_use_but(KM_TAG_MIN_MAC_LENGTH, {}).add(KM_TAG_KEY_SIZE, 128), -58, no_minimum},
+      {any_use_but(KM_TAG_MIN_MAC_LENGTH, {96, 96}).add(KM_TAG_KEY_SIZE, 128), -58, no_minimum},
+      {any_use_but(KM_TAG_BLOCK_MODE, {KM_MODE_ECB}).add(KM_TAG_KEY_SIZE, 128), -38,
+       "Found KM_TAG_MIN_MAC_LENGTH without GCM"},
+  };
+  for (const auto& row : rows) {
+    EXPECT_TRUE(refused(ta.send(generate_request(row.description)), row.error)) << row.message;
+    EXPECT_TRUE(ta.trace().has("aes_generate_key: " + row.message)) << row.message;
+  }
+  for (uint32_t bits : {88, 100, 136}) {
+    const param_set key = any_use_but(KM_TAG_MIN_MAC_LENGTH, {bits}).add(KM_TAG_KEY_SIZE, 128);
+    EXPECT_TRUE(refused(ta.send(generate_request(key)), -59)) << bits;
+  }
+  EXPECT_TRUE(refused(ta.send(import_request(any_use(), bytes(20))), -6));
+  const param_set said = any_use().add(KM_TAG_KEY_SIZE, 128);
+  EXPECT_TRUE(refused(ta.send(import_request(said, bytes(32))), -44));
+  EXPECT_TRUE(ta.trace().has("aes_import_key: Key size mismatch (given 128, guessed 256)"));
+}
+
+TEST_F(aes, new_keys_say_where_they_come_from_and_stay_inside) {
+  const bytes imported = ta.import(any_use(), bytes(24, 7));
+  const bytes generated = ta.generate(any_use().add(KM_TAG_KEY_SIZE, 256));
+  for (const auto& [made, origin, bits] :
+       {std::tuple(imported, KM_ORIGIN_IMPORTED, 192u), {generated, KM_ORIGIN_GENERATED, 256u}}) {
+    const param_set found = ta.characteristics(made);
+    EXPECT_EQ(found.number(KM_TAG_KEY_SIZE), bits);
+    EXPECT_EQ(found.number(KM_TAG_ORIGIN), origin);
+    EXPECT_EQ(found.number(KM_TAG_CREATION_DATETIME), START_REE_MS / 1000 * 1000);
+    EXPECT_TRUE(refused(ta.send(key_request(command::EXPORT_KEY, made)), -17));
+  }
+  const bytes text(48, 9);
+  const bytes sealed = ta.run(ENCRYPT, generated, use(KM_MODE_ECB), text);
+  EXPECT_NE(sealed, text);
+  EXPECT_EQ(ta.run(DECRYPT, generated, use(KM_MODE_ECB), sealed), text);
+}
+
+TEST_F(aes, begin_refuses) {
+  const bytes twelve(12, 1);
+  const bytes block(BLOCK, 1);
+  const struct {
+    param_set params;
+    int32_t error;
+    const char* message;  // of create; empty when it has none
+  } rows[] = {
+      {one(KM_TAG_PADDING, KM_PAD_NONE), -38, "No or too many KM_TAG_BLOCK_MODE"},
+      {use(KM_MODE_GCM), -38, "No or too many KM_TAG_MAC_LENGTH"},
+      {use(KM_MODE_GCM, KM_PAD_NONE, 136), -9, "Unsupported mac length 136"},
+      {use(KM_MODE_GCM, KM_PAD_NONE, 100), -9, "Unsupported mac length 100"},
+      {use(KM_MODE_GCM, KM_PAD_PKCS7, 128), -11, ""},
+      {use(KM_MODE_CTR, KM_PAD_PKCS7), -11, ""},
+      {use(KM_MODE_CBC, KM_PAD_RSA_PSS), -11, ""},
+      {use(UNKNOWN_MODE), -7, ""},
+      {use(KM_MODE_ECB, KM_PAD_NONE, 0, block), -40, ""},
+      {use(KM_MODE_CBC, KM_PAD_NONE, 0, twelve), -38, ""},
+      {use(KM_MODE_CTR).add_bytes(KM_TAG_NONCE, {}), -38, ""},
+      {use(KM_MODE_GCM, KM_PAD_NONE, 128, block), -38, ""},
+  };
+  for (const auto& row : rows) {
+    for (const auto& [purpose, create] :
+         {std::pair(ENCRYPT, "create_aes_encrypt: "), {DECRYPT, "create_aes_decrypt: "}}) {
+      SCOPED_TRACE(std::string(create) + row.message + std::to_string(row.error));
+      EXPECT_TRUE(refused(ta.begin(purpose, blob, row.params), row.error));
+      EXPECT_TRUE(*row.message == 0 || ta.trace().has(std::string(create) + row.message));
+      EXPECT_TRUE(ta.trace().has("begin: Create operation failed"));
+    }
+  }
+  EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, use(KM_MODE_ECB)), -2));
+  // Padding that is absent or repeated is NONE, for authorisation as well.
+  const bytes only_padded =
+      ta.import(any_use_but(KM_TAG_PADDING, {KM_PAD_PKCS7}), from_hex(KEY_128));
+  for (const param_set& none :
+       {use(KM_MODE_ECB), use(KM_MODE_ECB, KM_PAD_PKCS7).add(KM_TAG_PADDING, KM_PAD_PKCS7)}) {
+    EXPECT_TRUE(refused(ta.begin(ENCRYPT, only_padded, none), -11));
+  }
+}
+
+TEST_F(aes, nonces_are_put_out_given_or_drawn_also_for_decryption) {
+  const auto nonce_of = [&](uint32_t purpose, const param_set& params) {
+    const reply begun = ta.begin(purpose, blob, params);
+    EXPECT_TRUE(succeeded(begun));
+    EXPECT_TRUE(succeeded(ta.abort(begun.b)));
+    const param_set out = param_set::parse(begun.output());
+    return out.contains(KM_TAG_NONCE) ? out.find(KM_TAG_NONCE)->data : bytes();
+  };
+  const bytes given(BLOCK, 5);
+  for (uint32_t purpose : {ENCRYPT, DECRYPT}) {
+    EXPECT_EQ(nonce_of(purpose, use(KM_MODE_CTR, KM_PAD_NONE, 0, given)), given);
+    EXPECT_EQ(nonce_of(purpose, use(KM_MODE_ECB)), bytes());
+    EXPECT_EQ(nonce_of(purpose, use(KM_MODE_GCM, KM_PAD_NONE, 128)).size(), 12u);
+    const bytes drawn = nonce_of(purpose, use(KM_MODE_CBC));
+    EXPECT_EQ(drawn.size(), BLOCK);
+    EXPECT_NE(drawn, nonce_of(purpose, use(KM_MODE_CBC)));
+  }
+}
+
+TEST_F(aes, updates_refuse) {
+  const bytes two(2 * BLOCK, 3);
+  const byte_view first = byte_view(two).first(1);
+  const param_set aad = associated(two);
+  const struct {
+    const char* name;
+    uint32_t purpose;
+    param_set begun;
+    byte_view before;  // an earlier update
+    byte_view input;
+    param_set params;
+    size_t room;
+    TEEC_Result res;
+    int32_t error;
+  } rows[] = {
+      {"late associated data", ENCRYPT, gcm, first, {}, aad, 64, 0, -40},
+      {"late associated data", DECRYPT, gcm, first, {}, aad, 64, 0, -40},
+      {"associated data twice", ENCRYPT, gcm, {}, two, associated(two).append(aad), 64, 0, -40},
+      {"associated data without GCM", DECRYPT, padded, {}, two, aad, 64, 0, -40},
+      {"little room", ENCRYPT, padded, {}, two, {}, 31, TEEC_ERROR_SHORT_BUFFER, 0},
+      {"little room", DECRYPT, padded, {}, two, {}, 15, TEEC_ERROR_SHORT_BUFFER, 0},
+      {"little room", DECRYPT, gcm, {}, two, {}, 19, TEEC_ERROR_SHORT_BUFFER, 0},
+      {"little room for the block held back", DECRYPT, padded, two, first, {}, 15, 0, -41},
+  };
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.name);
+    const uint32_t handle = ta.begun(row.purpose, blob, row.begun);
+    EXPECT_TRUE(succeeded(ta.update(handle, row.before)));
+    const reply last =
+        ta.send(step_request(command::UPDATE, handle, row.input, row.params, row.room));
+    EXPECT_EQ(last.res, row.res);
+    EXPECT_EQ(last.km_error, row.error);
+  }
+}
+
+TEST_F(aes, streams_must_end_where_they_can) {
+  const struct {
+    uint32_t purpose;
+    param_set params;
+    size_t length;
+    int32_t error;
+  } rows[] = {
+      {ENCRYPT, use(KM_MODE_ECB), 15, -21},
+      {ENCRYPT, use(KM_MODE_CBC), 17, -21},
+      {ENCRYPT, use(KM_MODE_CBC), 0, 0},
+      {DECRYPT, use(KM_MODE_ECB), 15, -21},
+      {DECRYPT, padded, 17, -21},
+      {DECRYPT, padded, 0, -21},
+      {DECRYPT, gcm, 0, -30},
+      {DECRYPT, gcm, 11, -30},
+      {DECRYPT, gcm, 12, -30},
+  };
+  for (const auto& row : rows) {
+    const uint32_t handle = ta.begun(row.purpose, blob, row.params);
+    EXPECT_TRUE(succeeded(ta.update(handle, bytes(row.length, 3))));
+    EXPECT_TRUE(refused(ta.finish(handle), row.error)) << row.length << " bytes";
+  }
+}
+
+TEST_F(aes, gcm_decryption_puts_out_text_and_refuses_its_tag_at_the_end) {
+  const stream_vector& v = VECTORS[3];
+  const bytes its_blob = ta.import(any_use(), from_hex(v.key));
+  const bytes good = from_hex(v.ciphertext);
+  for (size_t altered : {size_t{0}, good.size() - 17, good.size() - 16, good.size() - 1}) {
+    bytes input = good;
+    input[altered] ^= 1;
+    const uint32_t handle = ta.begun(DECRYPT, its_blob, v.params());
+    const reply body = ta.update(handle, input, associated(from_hex(v.associated_data)));
+    EXPECT_EQ(body.output().size(), good.size() - 16);
+    EXPECT_TRUE(refused(ta.finish(handle), -30)) << "byte " << altered;
+  }
+}
+
+TEST_F(aes, padding_has_only_an_upper_bound) {
+  constexpr struct {
+    uint8_t last;
+    uint8_t before_last;
+    int32_t error;
+    size_t length;  // of the text, when it is accepted
+  } ROWS[] = {{0, 9, 0, 16},  {1, 9, 0, 15},    {2, 2, 0, 14},     {2, 9, -38, 0},
+              {16, 16, 0, 0}, {17, 17, -38, 0}, {255, 255, -38, 0}};
+  for (const auto& row : ROWS) {
+    bytes block(BLOCK, row.last < BLOCK ? 9 : row.last);
+    block[BLOCK - 2] = row.before_last;
+    block[BLOCK - 1] = row.last;
+    const bytes sealed = ta.run(ENCRYPT, blob, use(KM_MODE_ECB), block);
+    const uint32_t handle = ta.begun(DECRYPT, blob, use(KM_MODE_ECB, KM_PAD_PKCS7));
+    EXPECT_TRUE(succeeded(ta.update(handle, sealed)));
+    const reply last = ta.finish(handle);
+    EXPECT_TRUE(refused(last, row.error)) << "last byte " << int{row.last};
+    EXPECT_EQ(last.ok(), !ta.trace().has("aes_decrypt_finish: Illegal padding"));
+    block.resize(row.length);
+    EXPECT_EQ(finished(last), block);
+  }
+}
+
+// The commands of a key's life up to the first that fails; whether all are done.
+bool live_through(ta_under_test* ta, uint32_t purpose, const param_set& params, byte_view input) {
+  const reply made = ta->send(generate_request(any_use().add(KM_TAG_KEY_SIZE, 128)));
+  if (!made.ok()) return false;
+  const reply begun = ta->begin(purpose, made.output(), params);
+  return begun.ok() && ta->update(begun.b, input).ok() && ta->finish(begun.b).ok();
+}
+
+TEST_F(aes, failures_of_the_platform_are_reported_and_leave_nothing) {
+  const std::pair<uint32_t, param_set> uses[] = {
+      {ENCRYPT, gcm}, {ENCRYPT, padded}, {DECRYPT, use(KM_MODE_CBC)}};
+  for (const auto& [purpose, params] : uses) {
+    bool fired = true;
+    for (uint64_t n = 1; fired; n++) {
+      tee::host::fail_nth_call(n, TEEC_ERROR_OUT_OF_MEMORY);
+      const bool done = live_through(&ta, purpose, params, bytes(2 * BLOCK, 3));
+      fired = tee::host::fault_fired();
+      tee::host::clear_fault();
+      EXPECT_NE(done, fired) << "call " << n;
+    }
+  }
+}
+
+}  // namespace
+}  // namespace keymaster::test
