@@ -25,7 +25,7 @@ class representative {
     shifted_.assign(digest.begin(), digest.end());
     for (size_t i = 0; i < shifted_.size(); ++i) {
       unsigned next = i + 1 < shifted_.size() ? shifted_[i + 1] : 0U;
-      shifted_[i] = static_cast<uint8_t>(shifted_[i] << surplus | next >> (8 - surplus));
+      shifted_[i] = static_cast<uint8_t>(unsigned{shifted_[i]} << surplus | next >> (8 - surplus));
     }
     bytes_ = shifted_;
   }
