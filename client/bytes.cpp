@@ -16,7 +16,7 @@ uint8_t digit_value(char digit) {
 }
 
 template <typename T>
-void append(bytes* buffer, T value) {
+void append_number(bytes* buffer, T value) {
   for (size_t i = 0; i < sizeof(T); ++i) {
     buffer->push_back(static_cast<uint8_t>(value >> (8 * i)));
   }
@@ -32,6 +32,19 @@ T assemble(byte_view data) {
 }
 
 }  // namespace
+
+void append(bytes* to, byte_view data) {
+  if (data.empty()) return;  // memcpy wants no null pointer
+  size_t length = to->size();
+  to->resize(length + data.size());
+  memcpy(to->data() + length, data.data(), data.size());
+}
+
+bytes copy_of(byte_view data) {
+  bytes copy;
+  append(&copy, data);
+  return copy;
+}
 
 std::string to_hex(byte_view data) {
   constexpr char DIGITS[] = "0123456789abcdef";
@@ -55,17 +68,17 @@ bytes from_hex(std::string_view text) {
 }
 
 field_writer& field_writer::u32(uint32_t value) {
-  append(&buffer_, value);
+  append_number(&buffer_, value);
   return *this;
 }
 
 field_writer& field_writer::u64(uint64_t value) {
-  append(&buffer_, value);
+  append_number(&buffer_, value);
   return *this;
 }
 
 field_writer& field_writer::raw(byte_view data) {
-  buffer_.insert(buffer_.end(), data.begin(), data.end());
+  append(&buffer_, data);
   return *this;
 }
 
@@ -73,7 +86,6 @@ field_writer& field_writer::field(byte_view data) {
   if (data.size() > std::numeric_limits<uint32_t>::max()) {
     throw std::length_error("a field holds less than 4 GiB");
   }
-  buffer_.reserve(buffer_.size() + sizeof(uint32_t) + data.size());
   return u32(static_cast<uint32_t>(data.size())).raw(data);
 }
 

@@ -38,6 +38,13 @@ inline byte_view as_bytes(std::string_view text) {
   return {reinterpret_cast<const uint8_t*>(text.data()), text.size()};
 }
 
+// append: adds `data` to the end of `to`. Faster than the container's own insertion, which goes
+// byte by byte with an allocator that is not the standard one.
+void append(bytes* to, byte_view data);
+
+// copy_of: the bytes of a view, owned.
+bytes copy_of(byte_view data);
+
 // to_hex: two lower-case digits a byte.
 std::string to_hex(byte_view data);
 
@@ -54,6 +61,9 @@ class format_error : public std::runtime_error {
 // field_writer: builds a buffer of little-endian fields.
 class field_writer {
  public:
+  // `expected` is how much will be written; more is legal and costs a copy.
+  explicit field_writer(size_t expected = 0) { buffer_.reserve(expected); }
+
   field_writer& u32(uint32_t value);
   field_writer& u64(uint64_t value);
   field_writer& raw(byte_view data);

@@ -30,7 +30,7 @@ status operation::update(byte_view input, bytes* output, const param_set& params
       live_ = step.origin == TEEC_ORIGIN_API;
       return step;
     }
-    output->insert(output->end(), step.output.begin(), step.output.end());
+    append(output, step.output);
     if (step.consumed == 0 && !input.empty()) {
       return {TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API};  // it would never end
     }

@@ -43,7 +43,7 @@ param_set& param_set::add(keymaster_tag_t tag, uint64_t number) {
 
 param_set& param_set::add_bytes(keymaster_tag_t tag, byte_view data) {
   if (!has_blob(tag)) throw std::invalid_argument("the tag holds a number, not bytes");
-  params_.push_back({tag, 0, bytes(data.begin(), data.end())});
+  params_.push_back({tag, 0, copy_of(data)});
   return *this;
 }
 
@@ -102,8 +102,7 @@ param_set param_set::parse(byte_view marshalled) {
     uint32_t data_length = in.u32();
     in.u32();
     if (has_blob(entry.tag)) {
-      byte_view data = in.raw(data_length);
-      entry.data.assign(data.begin(), data.end());
+      entry.data = copy_of(in.raw(data_length));
     } else {
       // Wider than the class, the field carries what the writer's record held there.
       entry.number = value & largest_number(entry.tag);

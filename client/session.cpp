@@ -62,13 +62,14 @@ Result read_answer(const status& outcome, Parse parse) {
   return result;
 }
 
-bytes copy_of(byte_view data) {
-  return {data.begin(), data.end()};
-}
-
 bytes copy_blob(byte_view blob) {
   if (blob.empty()) throw format_error("an empty key blob");
   return copy_of(blob);
+}
+
+bytes two_fields(byte_view first, byte_view second) {
+  size_t length = 2 * sizeof(uint32_t) + first.size() + second.size();
+  return field_writer(length).field(first).field(second).take();
 }
 
 bytes key_request(byte_view blob, const application& app) {
@@ -173,8 +174,7 @@ data_result session::export_key(byte_view blob, const application& app) {
 }
 
 key_result session::upgrade_key(byte_view blob, const param_set& params) {
-  return call_for_blob(command::UPGRADE_KEY,
-                       field_writer().field(params.marshal()).field(blob).take());
+  return call_for_blob(command::UPGRADE_KEY, two_fields(params.marshal(), blob));
 }
 
 status session::delete_key(byte_view blob) {
@@ -186,13 +186,12 @@ status session::delete_all_keys() {
 }
 
 attest_result session::attest_key(byte_view blob, const param_set& params) {
-  exchange answer =
-      call_growing(command::ATTEST_KEY, field_writer().field(blob).field(params.marshal()).take());
+  exchange answer = call_growing(command::ATTEST_KEY, two_fields(blob, params.marshal()));
   return {{answer.outcome}, copy_of(answer.output), answer.b};
 }
 
 begin_result session::begin(uint32_t purpose, byte_view blob, const param_set& params) {
-  bytes input = field_writer().field(blob).field(params.marshal()).take();
+  bytes input = two_fields(blob, params.marshal());
   // Never sent twice: a begin that fails late has already counted as a use of the key.
   exchange answer = call(command::BEGIN, purpose, input, OUTPUT_CAPACITY);
   auto result = read_answer<begin_result>(answer.outcome, [&](begin_result* begun) {
@@ -204,7 +203,7 @@ begin_result session::begin(uint32_t purpose, byte_view blob, const param_set& p
 }
 
 update_result session::update(uint32_t handle, byte_view input, const param_set& params) {
-  bytes request = field_writer().field(input).field(params.marshal()).take();
+  bytes request = two_fields(input, params.marshal());
   // Ciphers put out at most what they held back more than they take in.
   exchange answer = call(command::UPDATE, handle, request, OUTPUT_CAPACITY + input.size());
   return read_answer<update_result>(answer.outcome, [&](update_result* result) {
@@ -215,7 +214,7 @@ update_result session::update(uint32_t handle, byte_view input, const param_set&
 }
 
 finish_result session::finish(uint32_t handle, byte_view input, const param_set& params) {
-  bytes request = field_writer().field(input).field(params.marshal()).take();
+  bytes request = two_fields(input, params.marshal());
   exchange answer = call(command::FINISH, handle, request, OUTPUT_CAPACITY + input.size());
   return read_answer<finish_result>(
       answer.outcome, [&](finish_result* result) { parse_finished(answer.output, result); });
