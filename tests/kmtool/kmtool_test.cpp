@@ -1,0 +1,230 @@
+// The command line as its users meet it: exit codes, messages, files and JSON of the built program.
+#include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "run.h"
+#include "tee/device/device.h"
+
+namespace {
+
+using nlohmann::json;
+using words = std::vector<std::string>;
+
+enum { DONE, REFUSED, WRONG_USAGE, TEE_FAILED };
+
+// A sandbox with a device (OS version 130000), and in it: k, an HMAC key of known bytes; m, a
+// message.
+class Kmtool : public testing::Test {
+ protected:
+  void SetUp() override {
+    ASSERT_EQ(box.run({"device", "create", "--os-version", "130000"}).exit_code, DONE);
+    std::string key;
+    for (char byte = 0; byte < 32; ++byte)
+      key += byte;
+    box.write("raw", key);
+    box.write("m", "message");
+    ASSERT_EQ(box.run({"import", "hmac", "raw", "-o", "k"}).exit_code, DONE);
+  }
+  // Runs a call and checks its exit code and that standard error says `message`.
+  void expect(const words& arguments, int exit_code, const std::string& message) {
+    call_result result = box.run(arguments);
+    EXPECT_EQ(result.exit_code, exit_code) << testing::PrintToString(arguments) << result.err;
+    EXPECT_NE(result.err.find(message), std::string::npos)
+        << testing::PrintToString(arguments) << result.err;
+  }
+  json run_json(words arguments) {
+    arguments.insert(arguments.begin(), "--json");
+    return json::parse(box.run(arguments).out);
+  }
+  sandbox box;
+};
+
+// printf message | openssl mac -digest SHA256 -macopt hexkey:000102...1f HMAC
+constexpr char MESSAGE_MAC[] = "6297b77508a1a30ea4dfadd8f847c31b49aba45de10a79daf721d3f7ec112a24";
+// The same of no bytes, and of 1000000 times 'a'.
+constexpr char EMPTY_MAC[] = "d38b42096d80f45f826b44a9d5607de72496a415d3f4a1a8c88e3bb9da8dc1cb";
+constexpr char MILLION_MAC[] = "e54a8adae4f9c784e86041bc64fbf511adaf7f5cefe17d053720dca6aa2358ab";
+
+TEST_F(Kmtool, SignsWhatOthersRecompute) {
+  EXPECT_EQ(box.run({"sign", "k", "-i", "m"}).out, std::string(MESSAGE_MAC) + "\n");
+  EXPECT_EQ(box.run({"sign", "k"}, "message").out, std::string(MESSAGE_MAC) + "\n");
+  EXPECT_EQ(box.run({"sign", "k"}).out, std::string(EMPTY_MAC) + "\n");
+  EXPECT_EQ(box.run({"sign", "k"}, std::string(1'000'000, 'a')).out,
+            std::string(MILLION_MAC) + "\n");
+  EXPECT_EQ(run_json({"sign", "k", "-i", "m", "--mac", "128"})["signature"],
+            std::string(MESSAGE_MAC).substr(0, 32));
+
+  EXPECT_EQ(box.run({"sign", "k", "-i", "m", "-o", "-"}).out.size(), 32u);
+  EXPECT_EQ(box.run({"sign", "k", "-i", "m", "-o", "s"}).exit_code, DONE);
+  EXPECT_EQ(box.read("s"), box.run({"sign", "k", "-i", "m", "-o", "-"}).out);
+}
+
+TEST_F(Kmtool, WrongUsageAndUnreadableInputExitWithTwoAndWriteNothing) {
+  box.write("empty", "");
+  words before = box.files();
+  struct {
+    words arguments;
+    const char* message;
+  } cases[] = {
+      {{}, "no verb"},
+      {{"nonsense"}, "nonsense"},
+      {{"device"}, "no verb"},
+      {{"device", "create"}, "exists"},
+      {{"device", "create", "--id", "not-a-uuid"}, "not a UUID"},
+      {{"device", "set", "--os-version", "4294967296"}, "not a number"},
+      {{"--device", "nowhere", "show", "k"}, "kmtool device create"},
+      {{"--trace", "9", "show", "k"}, "--trace"},
+      {{"generate", "hmac"}, "--output"},
+      {{"generate", "des", "-o", "x"}, "rsa ec aes hmac"},
+      {{"generate", "hmac", "-o", "x", "--size", "-8"}, "not a number"},
+      {{"generate", "hmac", "-o", "x", "--digest", "sha256,sha999"}, "'sha999' is none of"},
+      {{"generate", "hmac", "-o", "x", "--app-id", ""}, "--app-id"},
+      {{"generate", "hmac", "-o", "x", "--user-id", "7"}, "--auth-type"},
+      {{"generate", "hmac", "-o", "x", "--param", "KEY_SIZE"}, "TAG=VALUE"},
+      {{"generate", "hmac", "-o", "x", "--param", "NO_SUCH=1"}, "NO_SUCH"},
+      {{"generate", "hmac", "-o", "x", "--param", "KEY_SIZE=4294967296"}, "too large"},
+      {{"generate", "hmac", "-o", "x", "--param", "APPLICATION_ID=hex:0"}, "odd number"},
+      {{"generate", "hmac", "-o", "x", "--param", "ACTIVE_DATETIME=soon"}, "no value"},
+      {{"generate", "hmac", "-o", "no/folder/x"}, "no/folder/x"},
+      {{"generate", "hmac", "-o", "k"}, "--force"},
+      {{"--json", "generate", "hmac", "-o", "-"}, "standard output"},
+      {{"import", "hmac", "nowhere", "-o", "x"}, "nowhere"},
+      {{"import", "hmac", "empty", "-o", "x"}, "empty"},
+      {{"show", "nowhere"}, "nowhere"},
+      {{"show", "."}, "directory"},
+      {{"sign", "k", "-i", "nowhere"}, "nowhere"},
+      {{"sign", "k", "-i", "m", "--authenticate", "me"}, "USER_ID"},
+      {{"sign", "k", "-i", "m", "-o", "device"}, "folder"},
+      {{"sign", "k", "-i", "m", "-o", "/dev/full"}, "No space"},
+      {{"token", "-o", "t"}, "--user-id"},
+  };
+  for (const auto& c : cases)
+    expect(c.arguments, WRONG_USAGE, c.message);
+  EXPECT_EQ(box.files(), before);
+}
+
+TEST_F(Kmtool, RefusalsExitWithOneAndNameTheError) {
+  ASSERT_EQ(box.run({"generate", "hmac", "-o", "b", "--app-id", "bank"}).exit_code, DONE);
+  words before = box.files();
+  struct {
+    words arguments;
+    const char* message;
+  } cases[] = {
+      {{"generate", "hmac", "-o", "x", "--size", "1032"}, "KM_ERROR_UNSUPPORTED_KEY_SIZE (-6)"},
+      {{"generate", "hmac", "-o", "x", "--param", "ORIGIN=imported"}, "(-38)"},
+      {{"import", "hmac", "raw", "-o", "x", "--size", "128"}, "(-44)"},
+      {{"show", "b"}, "KM_ERROR_INVALID_KEY_BLOB (-33)\nGive the application id"},
+      {{"show", "b", "--app-id", "game"}, "(-33)"},
+      {{"show", "m"}, "KM_ERROR_KEY_REQUIRES_UPGRADE (-62)"},
+      {{"sign", "k", "-i", "m", "--mac", "64"}, "KM_ERROR_INVALID_MAC_LENGTH (-57)"},
+      {{"sign", "k", "-i", "m", "--digest", "sha1"}, "KM_ERROR_INCOMPATIBLE_DIGEST (-13)"},
+      {{"upgrade", "b", "-o", "x"}, "(-33)"},
+      {{"delete", "m"}, "holds no key of this device"},
+  };
+  for (const auto& c : cases)
+    expect(c.arguments, REFUSED, c.message);
+  EXPECT_EQ(box.files(), before);
+
+  json error = run_json({"show", "b"})["error"];
+  EXPECT_EQ(error["exit_code"], REFUSED);
+  EXPECT_EQ(error["keymaster_error"]["number"], -33);
+}
+
+TEST_F(Kmtool, TeeFailuresExitWithThree) {
+  {
+    auto holder = tee::device::open(box.path("device"));
+    std::string us = "process " + std::to_string(getpid());
+    expect({"show", "k"}, TEE_FAILED, us);
+    expect({"device", "reboot"}, TEE_FAILED, us);
+    expect({"token", "--user-id", "7", "-o", "t"}, TEE_FAILED, us);
+  }
+  expect({"show", "k"}, DONE, "");
+  box.write("device/device.json", "{");
+  expect({"show", "k"}, TEE_FAILED, "device.json");
+}
+
+TEST_F(Kmtool, DescribesKeys) {
+  struct {
+    words options;
+    json expected;
+  } cases[] = {
+      {{},
+       {{"key_size", 256},
+        {"digest", {"sha256"}},
+        {"min_mac_length", 128},
+        {"purpose", {"sign", "verify"}},
+        {"no_auth_required", true}}},
+      {{"--size", "512", "--digest", "SHA-512", "--min-mac", "64", "--purpose", "sign"},
+       {{"key_size", 512}, {"digest", {"sha512"}}, {"min_mac_length", 64}, {"purpose", {"sign"}}}},
+      {{"--user-id", "0x10", "--auth-type", "password,fingerprint", "--auth-timeout", "30"},
+       {{"user_secure_id", {16}},
+        {"user_auth_type", "password,fingerprint"},
+        {"auth_timeout", 30},
+        {"no_auth_required", nullptr}}},
+      {{"--param", "min_mac_length=72", "--param", "USAGE_EXPIRE_DATETIME=2031-02-03"},
+       {{"min_mac_length", 72}, {"usage_expire_datetime", "2031-02-03T00:00:00.000Z"}}},
+  };
+  for (const auto& c : cases) {
+    words call = {"generate", "hmac", "-o", "x", "--force"};
+    call.insert(call.end(), c.options.begin(), c.options.end());
+    call_result made = box.run(call);
+    ASSERT_EQ(made.exit_code, DONE) << made.err;
+    json found = run_json({"show", "x"})["characteristics"];
+    for (const auto& [name, value] : c.expected.items())
+      EXPECT_EQ(found[name], value) << name;
+  }
+  struct stat status {};
+  ASSERT_EQ(stat(box.path("x").c_str(), &status), 0);
+  EXPECT_EQ(status.st_mode & 0777, 0600u);
+}
+
+TEST_F(Kmtool, UpgradesAndDeletes) {
+  ASSERT_EQ(box.run({"device", "set", "--os-version", "140000"}).exit_code, DONE);
+  expect({"sign", "k", "-i", "m"}, REFUSED, "(-62)");
+  expect({"upgrade", "k", "-o", "k"}, DONE, "");
+  EXPECT_EQ(box.run({"sign", "k", "-i", "m"}).out, std::string(MESSAGE_MAC) + "\n");
+  EXPECT_EQ(run_json({"show", "k"})["characteristics"]["os_version"], 140000);
+
+  // Outdated keys can go; what is no key goes only by force.
+  ASSERT_EQ(box.run({"device", "set", "--os-version", "150000"}).exit_code, DONE);
+  expect({"delete", "k"}, DONE, "");
+  expect({"delete", "m"}, REFUSED, "--force");
+  EXPECT_EQ(box.files(), (words{"m", "raw"}));
+}
+
+TEST_F(Kmtool, ServesKeysThatWantTheirUser) {
+  auto generate = [&](const words& options) {
+    words call = {"generate",  "hmac", "-o",          "u",          "--force",
+                  "--user-id", "7",    "--auth-type", "fingerprint"};
+    call.insert(call.end(), options.begin(), options.end());
+    ASSERT_EQ(box.run(call).exit_code, DONE);
+  };
+  ASSERT_EQ(box.run({"token", "--user-id", "7", "--type", "fingerprint", "-o", "t"}).exit_code,
+            DONE);
+  EXPECT_EQ(box.read("t").size(), 69u);
+
+  generate({});  // each operation wants its own token
+  expect({"sign", "u", "-i", "m"}, REFUSED, "(-26)");
+  expect({"sign", "u", "-i", "m", "--token", "t"}, REFUSED, "--authenticate");
+  expect({"sign", "u", "-i", "m", "--authenticate", "7"}, REFUSED, "authentication types");
+  expect({"sign", "u", "-i", "m", "--authenticate", "7:fingerprint"}, DONE, "");
+
+  generate({"--auth-timeout", "60"});  // one token serves many
+  expect({"sign", "u", "-i", "m"}, REFUSED, "kmtool token");
+  expect({"sign", "u", "-i", "m", "--token", "t"}, DONE, "");
+  expect({"sign", "u", "-i", "m", "--authenticate", "7:fingerprint"}, DONE, "");
+  ASSERT_EQ(box.run({"device", "reboot"}).exit_code, DONE);
+  expect({"sign", "u", "-i", "m", "--token", "t"}, REFUSED, "(-38)");
+}
+
+TEST_F(Kmtool, TellsItsStory) {
+  json story = run_json({"--device", box.path("other"), "demo"});
+  EXPECT_EQ(story["sections"].size(), 8u);
+  EXPECT_NE(story.dump().find("KM_ERROR_INVALID_KEY_BLOB (-33)"), std::string::npos);
+  EXPECT_EQ(box.run({"demo"}).exit_code, DONE);
+  EXPECT_EQ(run_json({"device", "show"})["os_version"], 130000);
+}
+
+}  // namespace

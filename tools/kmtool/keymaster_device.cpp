@@ -1,0 +1,53 @@
+// Opening of devices and of the trusted applications that the tool speaks with.
+#include "keymaster_device.h"
+
+#include "tool.h"
+
+namespace kmtool {
+
+namespace client = keymaster::client;
+
+namespace {
+
+failure session_failure(const std::string& application, const client::open_error& error) {
+  std::string advice(error.reason().advice());
+  if (error.reason().tee == TEEC_ERROR_ITEM_NOT_FOUND) {
+    advice = "It is looked for in $TEE_TA_PATH, or else beside the TEE's library.";
+  }
+  return {"cannot start the " + application, error.reason(), advice};
+}
+
+client::session open_keymaster(const client::context& tee) try {
+  return client::session(tee);
+} catch (const client::open_error& error) {
+  throw session_failure("Keymaster trusted application", error);
+}
+
+}  // namespace
+
+client::context open_device(const std::string& folder) try {
+  return client::context(folder);
+} catch (const client::open_error& error) {
+  // The client API has a code alone; opening the folder itself gives the reason in words, such as
+  // which process has it open.
+  tee::device::open(folder);
+  throw failure("cannot open the device in " + folder, error.reason());
+}
+
+client::bytes issue_token(const client::context& tee, const client::token_request& request) try {
+  client::data_result token = client::authenticator(tee).issue(request);
+  require(token, "the authenticator issued no token");
+  return token.data;
+} catch (const client::open_error& error) {
+  throw session_failure("authenticator", error);
+}
+
+keymaster_device::keymaster_device(const std::string& folder)
+    : settings_(tee::device::read_settings(folder)),
+      context_(open_device(folder)),
+      session_(open_keymaster(context_)) {
+  require(session_.configure(settings_.os_version, settings_.os_patchlevel),
+          "cannot configure the device");
+}
+
+}  // namespace kmtool

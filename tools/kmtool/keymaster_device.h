@@ -1,0 +1,38 @@
+// The device of a call: opened, and its Keymaster configured.
+#pragma once
+
+#include <string>
+
+#include "client/authenticator.h"
+#include "client/session.h"
+#include "tee/device/device.h"
+
+namespace kmtool {
+
+// open_device: a context on the device in `folder`. Throws failure, or tee::device_error with the
+// reason in words when the folder cannot be opened.
+keymaster::client::context open_device(const std::string& folder);
+
+// issue_token: a token from the device's authenticator. Throws failure.
+keymaster::client::bytes issue_token(const keymaster::client::context& tee,
+                                     const keymaster::client::token_request& request);
+
+// keymaster_device: a session with a device's Keymaster, configured with the device's OS version
+// and patch level.
+class keymaster_device {
+ public:
+  // Throws what open_device throws.
+  explicit keymaster_device(const std::string& folder);
+
+  keymaster::client::session* operator->() { return &session_; }
+  keymaster::client::session* session() { return &session_; }
+  const keymaster::client::context& context() const { return context_; }
+  const tee::device_settings& settings() const { return settings_; }
+
+ private:
+  tee::device_settings settings_;
+  keymaster::client::context context_;
+  keymaster::client::session session_;
+};
+
+}  // namespace kmtool

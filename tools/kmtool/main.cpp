@@ -1,0 +1,150 @@
+// kmtool: creates devices, makes keys and uses them. The one place where results and failures are
+// printed and become exit codes.
+#include <cstdlib>
+#include <exception>
+#include <iostream>
+#include <new>
+#include <utility>
+
+#include "options.h"
+#include "tee/device/device.h"
+#include "tool.h"
+
+namespace kmtool {
+
+namespace client = keymaster::client;
+
+failure::failure(exit_code code, const std::string& message, std::string advice)
+    : std::runtime_error(message), code_(code), advice_(std::move(advice)) {}
+
+failure::failure(const std::string& action, const client::status& outcome, std::string advice)
+    : std::runtime_error(action + ": " + outcome.text()),
+      code_(outcome.tee == TEEC_SUCCESS ? REFUSED : TEE_FAILED),
+      advice_(advice.empty() ? outcome.advice() : std::move(advice)),
+      outcome_(outcome) {}
+
+std::string command_line::device_folder() const {
+  return device.empty() ? tee::device::default_path() : device;
+}
+
+namespace {
+
+void print_json(const json& object) {
+  // A file name need not be UTF-8.
+  std::cout << object.dump(2, ' ', false, json::error_handler_t::replace) << "\n";
+}
+
+json to_json(const failure& error) {
+  json object = {{"message", error.what()}, {"exit_code", error.code()}};
+  if (!error.advice().empty()) object["advice"] = error.advice();
+  if (error.outcome()) {
+    const client::status& outcome = *error.outcome();
+    object["keymaster_error"] = {{"name", client::error_name(outcome.error)},
+                                 {"number", outcome.error}};
+    object["tee_result"] = {{"name", client::tee_name(outcome.tee)}, {"number", outcome.tee}};
+  }
+  return {{"error", std::move(object)}};
+}
+
+int report(const failure& error, bool as_json) {
+  if (as_json) print_json(to_json(error));
+  std::cerr << "kmtool: " << error.what() << "\n";
+  if (!error.advice().empty()) std::cerr << error.advice() << "\n";
+  return error.code();
+}
+
+failure from_device_error(const tee::device_error& error) {
+  using kind = tee::device_error::kind;
+  switch (error.reason()) {
+    case kind::NOT_FOUND:
+      return {WRONG_USAGE, error.what(), "Make one with 'kmtool device create'."};
+    case kind::EXISTS:
+      return {WRONG_USAGE, error.what()};
+    default:
+      return {TEE_FAILED, error.what()};
+  }
+}
+
+// Runs the verb; every exception becomes a failure.
+verb_result run(const command_line& line) try {
+  return line.action();
+} catch (const tee::device_error& error) {
+  throw from_device_error(error);
+} catch (const client::open_error& error) {
+  throw failure("cannot reach the TEE", error.reason());
+} catch (const std::bad_alloc&) {
+  throw failure(TEE_FAILED, "out of memory");
+} catch (const failure&) {
+  throw;
+} catch (const std::exception& error) {
+  throw failure(TEE_FAILED, error.what());
+}
+
+void print_result(const verb_result& result, bool as_json) {
+  if (as_json) {
+    print_json(result.object);
+  } else {
+    std::cout << result.text;
+  }
+  std::cout.flush();
+  if (!std::cout) throw failure(WRONG_USAGE, "cannot write standard output");
+}
+
+void add_global_options(CLI::App* app, command_line* line) {
+  app->add_option("--device", line->device,
+                  "Folder of the device (default: $KEYMASTER_DEVICE, else below "
+                  "$XDG_STATE_HOME or ~/.local/state)")
+      ->type_name("DIR");
+  app->add_flag("--json", line->as_json, "Print one JSON object on standard output");
+  app->add_option_function<std::string>(
+         "--trace", [](const std::string& level) { setenv("TEE_TRACE_LEVEL", level.c_str(), 1); },
+         "Trace to standard error: 0 none, 1 errors (default), 2 info, 3 debug, 4 flow")
+      ->check(CLI::IsMember({"0", "1", "2", "3", "4"}))
+      ->type_name("LEVEL");
+}
+
+// Whether the command line is asked for what takes standard output for itself.
+void check_outputs(const CLI::App& app, const command_line& line) {
+  for (const CLI::App* verb : app.get_subcommands()) {
+    const CLI::Option* output = verb->get_option_no_throw("--output");
+    if (line.as_json && output && output->count() > 0 && output->as<std::string>() == "-") {
+      throw failure(WRONG_USAGE, "--json and -o - both want standard output");
+    }
+  }
+}
+
+int run_command_line(int argc, char** argv) {
+  CLI::App app("Keys in a trusted execution environment: make them, use them, look at them.",
+               "kmtool");
+  command_line line;
+  app.fallthrough();
+  add_global_options(&app, &line);
+  add_device_verbs(&app, &line);
+  add_key_verbs(&app, &line);
+  add_export_verb(&app, &line);
+  add_sign_verb(&app, &line);
+  add_crypt_verbs(&app, &line);
+  add_token_verb(&app, &line);
+  add_attest_verbs(&app, &line);
+  add_demo_verb(&app, &line);
+  try {
+    app.parse(argc, argv);
+    if (!line.action) throw failure(WRONG_USAGE, "no verb is given", "'kmtool --help' lists them.");
+    check_outputs(app, line);
+    print_result(run(line), line.as_json);
+    return DONE;
+  } catch (const CLI::ParseError& error) {
+    if (error.get_exit_code() == 0) return app.exit(error);  // help
+    return report({WRONG_USAGE, error.what(), "'kmtool VERB --help' tells what it takes."},
+                  line.as_json);
+  } catch (const failure& error) {
+    return report(error, line.as_json);
+  }
+}
+
+}  // namespace
+}  // namespace kmtool
+
+int main(int argc, char** argv) {
+  return kmtool::run_command_line(argc, argv);
+}

@@ -1,0 +1,70 @@
+// What the verbs share: the options of every call, results, failures and exit codes.
+#pragma once
+
+#include <CLI/CLI.hpp>
+#include <functional>
+#include <nlohmann/json.hpp>
+#include <optional>
+#include <stdexcept>
+#include <string>
+
+#include "client/status.h"
+
+namespace kmtool {
+
+using json = nlohmann::ordered_json;
+
+enum exit_code : int { DONE = 0, REFUSED = 1, WRONG_USAGE = 2, TEE_FAILED = 3 };
+
+// A call that cannot be carried out: the exit code, what happened, and what to do about it.
+class failure : public std::runtime_error {
+ public:
+  failure(exit_code code, const std::string& message, std::string advice = "");
+
+  // What the trusted application answered to `action` ("cannot generate the key"): REFUSED when it
+  // is a Keymaster error alone, TEE_FAILED when the TEE failed.
+  failure(const std::string& action, const keymaster::client::status& outcome,
+          std::string advice = "");
+
+  exit_code code() const { return code_; }
+  const std::string& advice() const { return advice_; }
+  const std::optional<keymaster::client::status>& outcome() const { return outcome_; }
+
+ private:
+  exit_code code_;
+  std::string advice_;
+  std::optional<keymaster::client::status> outcome_;
+};
+
+// require: throws failure unless the outcome is ok.
+inline void require(const keymaster::client::status& outcome, const std::string& action) {
+  if (!outcome.ok()) throw failure(action, outcome);
+}
+
+// What a verb has to say: the object for --json, and text for people (empty: nothing).
+struct verb_result {
+  json object = json::object();
+  std::string text;
+};
+
+// The command line as parsed: options of every call, and what the chosen verb will do.
+struct command_line {
+  std::string device;  // folder; empty: the default one
+  bool as_json = false;
+  std::function<verb_result()> action;
+
+  // device_folder: where the device lies.
+  std::string device_folder() const;
+};
+
+// Each adds its verbs to the application; their actions refer to `line`, which must outlive them.
+void add_device_verbs(CLI::App* app, command_line* line);
+void add_key_verbs(CLI::App* app, command_line* line);
+void add_crypt_verbs(CLI::App* app, command_line* line);
+void add_export_verb(CLI::App* app, command_line* line);
+void add_sign_verb(CLI::App* app, command_line* line);
+void add_token_verb(CLI::App* app, command_line* line);
+void add_attest_verbs(CLI::App* app, command_line* line);
+void add_demo_verb(CLI::App* app, command_line* line);
+
+}  // namespace kmtool
