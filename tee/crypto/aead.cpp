@@ -30,20 +30,23 @@ aead::aead(key_ptr key, bool encrypt)
 }
 
 aead::~aead() {
-  if (context_) key_->cipher_contexts.give(use_of(encrypt_), std::move(context_));
+  if (!context_ || nonce_length_ != USUAL_NONCE) return;
+  key_->cipher_contexts.give(use_of(encrypt_), std::move(context_));
 }
 
 void aead::start(std::span<const uint8_t> nonce, uint32_t tag_bits) {
   EVP_CIPHER_CTX* context = context_.get();
-  int length = static_cast<int>(nonce.size());
-  if (EVP_CIPHER_CTX_get_iv_length(context) != length) {
-    must(EVP_CIPHER_CTX_ctrl(context, EVP_CTRL_AEAD_SET_IVLEN, length, nullptr) == 1,
+  if (nonce.size() != nonce_length_) {
+    must(EVP_CIPHER_CTX_ctrl(context, EVP_CTRL_AEAD_SET_IVLEN, static_cast<int>(nonce.size()),
+                             nullptr) == 1,
          "EVP_CTRL_AEAD_SET_IVLEN");
+    nonce_length_ = nonce.size();
   }
   // Without a cipher and a key: the context keeps its own.
   must(EVP_CipherInit_ex2(context, nullptr, nullptr, nonce.data(), -1, nullptr) == 1,
        "EVP_CipherInit_ex2");
   tag_length_ = tag_bits / 8;
+  processed_ = 0;
 }
 
 void aead::add_associated_data(std::span<const uint8_t> bytes) {
@@ -51,6 +54,7 @@ void aead::add_associated_data(std::span<const uint8_t> bytes) {
 }
 
 void aead::update(std::span<const uint8_t> input, uint8_t* output) {
+  processed_ += input.size();
   update_in_chunks(context_.get(), input, output);
 }
 

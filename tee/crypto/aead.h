@@ -11,6 +11,8 @@ namespace tee::crypto {
 class aead {
  public:
   static constexpr size_t MAX_NONCE = 128;  // bytes; libcrypto's bound
+  static constexpr size_t USUAL_NONCE = 12;
+  static constexpr uint64_t MAX_MESSAGE = (uint64_t{1} << 36) - 32;  // bytes; SP 800-38D, 5.2.1.1
 
   // valid_tag_length: 96 to 128 bits in steps of 8. Shorter tags, which libcrypto takes, are too
   // easy to forge.
@@ -30,8 +32,11 @@ class aead {
   // add_associated_data: authenticates, before the first update.
   void add_associated_data(std::span<const uint8_t> bytes);
 
-  // update: writes as many bytes as it reads; `output` may be the input's own place. Decrypted
-  // bytes are not authentic before check_tag.
+  // takes: whether the message may go on with `length` more bytes.
+  bool takes(size_t length) const { return length <= MAX_MESSAGE - processed_; }
+
+  // update: writes as many bytes as it reads, as many as it takes; `output` may be the input's own
+  // place. Decrypted bytes are not authentic before check_tag.
   void update(std::span<const uint8_t> input, uint8_t* output);
 
   // make_tag: ends encryption; writes tag_length() bytes.
@@ -45,6 +50,9 @@ class aead {
   key_ptr key_;
   bool encrypt_;
   size_t tag_length_ = 0;
+  uint64_t processed_ = 0;  // bytes of this message
+  size_t nonce_length_ =
+      USUAL_NONCE;  // for which the context is set; spare ones have the usual one
   cipher_ctx_ptr context_;
 };
 

@@ -6,6 +6,7 @@
 #include <openssl/evp.h>
 
 #include "tee/crypto/algorithms.h"
+#include "tee/crypto/openssl.h"
 
 namespace tee::crypto {
 
@@ -15,11 +16,10 @@ const EVP_MD* digest_of(hash which);
 // cipher_of: AES in a mode other than NONE with keys of 128, 192 or 256 bits.
 const EVP_CIPHER* cipher_of(block_mode mode, uint32_t key_bits);
 
-// hmac_algorithm: HMAC (RFC 2104), of any digest.
-EVP_MAC* hmac_algorithm();
+// new_hmac: a context for HMAC (RFC 2104) with the digest, to which only the key is to be given.
+mac_ctx_ptr new_hmac(hash which);
 
-// name_of, length_of: libcrypto's name of a digest; its result's length in bytes. 0 for NONE.
-const char* name_of(hash which);
+// length_of: the length of a digest, in bytes; 0 for NONE.
 size_t length_of(hash which);
 
 }  // namespace tee::crypto

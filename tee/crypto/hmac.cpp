@@ -1,22 +1,15 @@
 // HMAC.
 #include "tee/crypto/hmac.h"
 
-#include <openssl/core_names.h>
-
 #include "tee/crypto/fetched.h"
 
 namespace tee::crypto {
 namespace {
 
 mac_ctx_ptr keyed_context(const key& key, hash which) {
-  mac_ctx_ptr context(EVP_MAC_CTX_new(hmac_algorithm()));
-  must(context != nullptr, "EVP_MAC_CTX_new");
-  // The parameter is an input; only its type is not const.
-  OSSL_PARAM params[] = {
-      OSSL_PARAM_construct_utf8_string(OSSL_MAC_PARAM_DIGEST, const_cast<char*>(name_of(which)), 0),
-      OSSL_PARAM_construct_end()};
+  mac_ctx_ptr context = new_hmac(which);
   std::span<const uint8_t> secret = key.secret();
-  must(EVP_MAC_init(context.get(), secret.data(), secret.size(), params) == 1, "EVP_MAC_init");
+  must(EVP_MAC_init(context.get(), secret.data(), secret.size(), nullptr) == 1, "EVP_MAC_init");
   return context;
 }
 

@@ -117,14 +117,15 @@ bool sound(std::span<const attribute> attributes, uint32_t max_bits) {
   }
 }
 
+// Null when libcrypto gives up, as it may for an exponent of many small factors.
 pkey_ptr generate_pkey(uint32_t bits, BIGNUM* exponent) {
   pkey_ctx_ptr context(EVP_PKEY_CTX_new_from_name(nullptr, "RSA", nullptr));
   EVP_PKEY* made = nullptr;
   must(context && EVP_PKEY_keygen_init(context.get()) == 1 &&
            EVP_PKEY_CTX_set_rsa_keygen_bits(context.get(), static_cast<int>(bits)) == 1 &&
-           EVP_PKEY_CTX_set1_rsa_keygen_pubexp(context.get(), exponent) == 1 &&
-           EVP_PKEY_generate(context.get(), &made) == 1,
-       "EVP_PKEY_generate");
+           EVP_PKEY_CTX_set1_rsa_keygen_pubexp(context.get(), exponent) == 1,
+       "EVP_PKEY_keygen_init");
+  if (EVP_PKEY_generate(context.get(), &made) != 1) forget_errors();
   return pkey_ptr(made);
 }
 
@@ -159,6 +160,7 @@ TEE_Result generate_rsa_key(uint32_t bits, std::span<const attribute> parameters
   if (!usable) return TEE_ERROR_BAD_PARAMETERS;
   bignum_ptr wanted = to_bignum(exponent);
   pkey_ptr pkey = generate_pkey(bits, wanted.get());
+  if (!pkey) return TEE_ERROR_BAD_PARAMETERS;
   std::vector<attribute> attributes;
   for (const number_name& name : NUMBERS) {
     attributes.push_back({name.attribute, to_bytes(number_of(pkey.get(), name.param).get())});

@@ -18,7 +18,14 @@ using tee::crypto::family;
 
 namespace {
 
-// Puts `input` through the cipher; there is room for it.
+// Whether `input` may come now: there is room for its output, and the message is not too long for
+// the algorithm (64 GiB).
+TEE_Result admit(const operation& op, std::span<const uint8_t> input, output_buffer* output) {
+  if (!std::get<aead>(op.engine).takes(input.size())) return TEE_ERROR_EXCESS_DATA;
+  return output->reserve(input.size());
+}
+
+// Puts `input`, which was admitted, through the cipher.
 void run(operation* op, std::span<const uint8_t> input, output_buffer output) {
   tee::steady_input steady(input, output.data(), input.size(), true);
   std::get<aead>(op->engine).update(steady.bytes(), output.data());
@@ -63,7 +70,7 @@ TEE_Result TEE_AEUpdate(TEE_OperationHandle operation, const void* srcData, size
     auto input = input_bytes(CALL, "srcData", srcData, srcLen);
     output_buffer output(CALL, "destData", destData, destLen);
     if (TEE_Result fault = fault_point()) return fault;
-    if (TEE_Result res = output.reserve(input.size())) return res;
+    if (TEE_Result res = admit(op, input, &output)) return res;
     run(&op, input, output);
     return TEE_SUCCESS;
   });
@@ -81,9 +88,9 @@ TEE_Result TEE_AEEncryptFinal(TEE_OperationHandle operation, const void* srcData
     output_buffer tag_output(CALL, "tag", tag, tagLen);
     if (TEE_Result fault = fault_point()) return fault;
     // Both are looked at, so that a caller with too little room for both learns both lengths.
-    TEE_Result data_room = output.reserve(input.size());
+    TEE_Result data_room = admit(op, input, &output);
     TEE_Result tag_room = tag_output.reserve(engine.tag_length());
-    if (data_room || tag_room) return TEE_ERROR_SHORT_BUFFER;
+    if (data_room || tag_room) return data_room ? data_room : tag_room;
     run(&op, input, output);
     engine.make_tag(tag_output.data());
     tag_output.set_length(engine.tag_length());
@@ -102,7 +109,7 @@ TEE_Result TEE_AEDecryptFinal(TEE_OperationHandle operation, const void* srcData
     auto tag_bytes = input_bytes(CALL, "tag", tag, tagLen);
     output_buffer output(CALL, "destData", destData, destLen);
     if (TEE_Result fault = fault_point()) return fault;
-    if (TEE_Result res = output.reserve(input.size())) return res;
+    if (TEE_Result res = admit(op, input, &output)) return res;
     run(&op, input, output);
     op.state = operation::progress::INITIAL;
     if (std::get<aead>(op.engine).check_tag(tag_bytes)) return TEE_SUCCESS;

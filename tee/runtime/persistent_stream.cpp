@@ -57,13 +57,15 @@ TEE_Result use_store(F call) {
 }
 
 TEE_Result load(device& dev, const object_name& name, std::optional<stored_object>* content) {
-  return use_store([&] {
+  TEE_Result res = use_store([&] {
     auto bytes = dev.objects().load(name);
     if (!bytes) return;
     *content = decode(*bytes);
     // Authentic, but not of this version.
     if (!*content) throw storage_error(TEE_ERROR_CORRUPT_OBJECT, "object store: unknown format");
   });
+  // What an earlier failure left half done is undone first, and on a full disk that can fail.
+  return res == TEE_ERROR_STORAGE_NO_SPACE ? TEE_ERROR_STORAGE_NOT_AVAILABLE : res;
 }
 
 TEE_Result save(device& dev, const object_name& name, const stored_object& content) {
@@ -80,7 +82,7 @@ struct persistent_stream::shared_objects {
   std::map<shared_key, std::shared_ptr<shared>> objects;
 
   static shared_objects& all() {
-    static shared_objects instance;
+    static auto& instance = *new shared_objects;  // outlives all that may still be open at exit
     return instance;
   }
 

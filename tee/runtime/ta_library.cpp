@@ -6,10 +6,11 @@
 #include <dlfcn.h>
 #include <string_view>
 #include <sys/mman.h>
+#include <sys/sendfile.h>
 #include <sys/stat.h>
-#include <unistd.h>
 #include <vector>
 
+#include "tee/device/os_open.h"
 #include "tee/device/uuid.h"
 #include "tee/runtime/log.h"
 
@@ -17,7 +18,7 @@ namespace tee {
 
 namespace {
 
-constexpr size_t FILE_LIMIT = 256 * 1024 * 1024;
+constexpr size_t COPY_AT_ONCE = 1024 * 1024;
 
 // Calls visit for every part of `text` between separators.
 template <typename Visit>
@@ -67,14 +68,14 @@ bool is_resident(const std::string& name) {
   return true;
 }
 
-bool write_whole(int fd, const secret_bytes& bytes) {
-  size_t done = 0;
-  while (done < bytes.size()) {
-    ssize_t written = write(fd, bytes.data() + done, bytes.size() - done);
-    if (written <= 0) return false;
-    done += static_cast<size_t>(written);
-  }
-  return true;
+bool copy_file(const std::string& path, int target) {
+  file_descriptor source(os::open_file(path.c_str(), os::open_mode::READ));
+  if (!source) return false;
+  ssize_t copied = 0;
+  do {
+    copied = sendfile(target, source.get(), nullptr, COPY_AT_ONCE);
+  } while (copied > 0);
+  return copied == 0;
 }
 
 property_value to_value(std::string_view text) {
@@ -121,11 +122,10 @@ TEE_Result ta_library::open(const std::string& path) {
 }
 
 TEE_Result ta_library::open_private_copy(const std::string& path) {
-  auto bytes = read_file(path, FILE_LIMIT);
   copy_ = file_descriptor(memfd_create("ta", MFD_CLOEXEC));
-  if (!bytes || !copy_ || !write_whole(copy_.get(), *bytes)) {
+  if (!copy_ || !copy_file(path, copy_.get())) {
     log_line(TEE_TRACE_ERROR, "cannot copy %s", path.c_str());
-    return TEE_ERROR_OUT_OF_MEMORY;
+    return TEE_ERROR_BAD_FORMAT;
   }
   return open("/proc/self/fd/" + std::to_string(copy_.get()));
 }
