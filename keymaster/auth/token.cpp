@@ -113,6 +113,7 @@ bool check_auth_token_valid(byte_view token) {
   const bool valid = ComputeSignature(mac, token_key, token.first(SIGNED_SIZE)) &&
                      equal_constant_time(mac, parsed.mac);
   wipe(mac);  // what a forger of this token would need
+  if (!valid) TRACE_ERROR("Wrong auth token MAC");
   return valid;
 }
 

@@ -48,7 +48,7 @@ constexpr uint8_t UNTOUCHED = 0xC3;
 
 // A command as it is sent: the default types are those that its table entry wants.
 struct request {
-  uint32_t id;
+  uint32_t id = 0;
   uint32_t a = 0;
   bytes input = {};
   size_t capacity = 0;  // of the output buffer, if the command has one

@@ -4,6 +4,7 @@
 
 #include "support/sets.h"
 #include "support/ta_under_test.h"
+#include "tee/runtime/instance.h"
 
 namespace keymaster::test {
 namespace {
@@ -80,23 +81,58 @@ TEST(Dispatch, WantsZerosInSlot0) {
   }
 }
 
-// The client API clears value outputs on their way in, so this rule shows at the entry point alone.
-TEST(Dispatch, WantsZerosInValueOutputsToo) {
+// The entry points without the TEE's part around them: in one instance, on the harness's device.
+class EntryPoints : public testing::Test {
+ protected:
+  ~EntryPoints() override { dlclose(loaded); }
+
+  template <typename F>
+  F* entry(const char* name) {
+    return reinterpret_cast<F*>(dlsym(loaded, name));
+  }
+  TEE_Result create() { return entry<TEE_Result()>("TA_CreateEntryPoint")(); }
+  void destroy() { entry<void()>("TA_DestroyEntryPoint")(); }
+  TEE_Result invoke(uint32_t id, uint32_t types, TEE_Param* params) {
+    return entry<decltype(TA_InvokeCommandEntryPoint)>("TA_InvokeCommandEntryPoint")(nullptr, id,
+                                                                                    types, params);
+  }
+
   ta_under_test ta;
+  std::unique_ptr<tee::device> device = (ta.stop(), tee::device::open(ta.path()));
+  tee::instance instance{KEYMASTER_TA, *device, 1 << 20};
+  tee::instance_scope running{instance};
   void* loaded = dlopen(KEYMASTER_TA_FILE, RTLD_NOW | RTLD_LOCAL);
-  ASSERT_NE(loaded, nullptr) << dlerror();
-  const auto invoke = reinterpret_cast<decltype(&TA_InvokeCommandEntryPoint)>(
-      dlsym(loaded, "TA_InvokeCommandEntryPoint"));
+};
+
+// The client API clears value outputs on their way in, so this rule shows here alone.
+TEST_F(EntryPoints, WantZerosInValueOutputsToo) {
+  ASSERT_EQ(create(), TEE_SUCCESS);
   uint8_t room[16];
   for (const uint32_t id : {0xFF02u, 0xFF03u}) {
     for (const auto& [a, b] : {std::pair{0u, 0u}, {0u, 5u}, {5u, 0u}}) {
       TEE_Param params[4] = {};
       params[0].value = {a, b};
       params[2].memref = {room, sizeof(room)};
-      EXPECT_EQ(invoke(nullptr, id, 0x602, params) == BAD_PARAMETERS, a + b != 0) << id;
+      EXPECT_EQ(invoke(id, 0x602, params) == BAD_PARAMETERS, a + b != 0) << id;
     }
   }
-  dlclose(loaded);
+  destroy();
+}
+
+// A platform may run instances one after the other over the same globals.
+TEST_F(EntryPoints, CreateForgetsTheInstanceBefore) {
+  for (int life = 0; life < 2; life++) {
+    ASSERT_EQ(create(), TEE_SUCCESS);
+    TEE_Param unconfigured[4] = {};
+    EXPECT_EQ(invoke(22, 0x3, unconfigured), TEE_SUCCESS);
+    EXPECT_EQ(static_cast<int32_t>(unconfigured[0].value.a), KM_ERROR_KEYMASTER_NOT_CONFIGURED);
+    uint8_t empty_set[4] = {};
+    TEE_Param configure[4] = {};
+    configure[1].memref = {empty_set, sizeof(empty_set)};
+    EXPECT_EQ(invoke(25, 0x53, configure), TEE_SUCCESS);
+    destroy();
+    EXPECT_EQ(instance.counts().heap_blocks, 0u);
+  }
 }
 
 TEST(Dispatch, RefusesUnknownCommands) {

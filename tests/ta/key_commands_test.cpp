@@ -90,6 +90,15 @@ TEST(MakeKey, RefusesWhatIsNoSet) {
   }
 }
 
+TEST(MakeKey, ImportWantsRoomForItsLengths) {
+  ta_under_test ta;
+  for (const size_t capacity : {0u, 3u, 4u, 7u, 8u}) {
+    const reply answer = ta.send(import_request(hmac_key(), bytes(20, 0x0b), capacity));
+    EXPECT_TRUE(failed_with(answer, capacity < 8 ? 0xFFFF0000 : 0xFFFF0010)) << capacity;
+    EXPECT_EQ(ta.trace().has("import_key: Too short buffer"), capacity < 8) << capacity;
+  }
+}
+
 TEST(MakeKey, CompletesTheCharacteristicsAndHidesTheBinding) {
   ta_under_test ta({.rpmb = false});
   const param_set description = bound().add_bytes(KM_TAG_ROOT_OF_TRUST, as_bytes("root"));
@@ -107,6 +116,8 @@ TEST(MakeKey, CompletesTheCharacteristicsAndHidesTheBinding) {
 
   const bytes blob = ta.generate(description);
   EXPECT_EQ(ta.characteristics(blob, app("id", "data")), visible(generated));
+  EXPECT_EQ(ta.send(key_request(command::GET_KEY_CHARACTER_SIZE, blob, app("id", "data"))).b,
+            visible(generated).marshal().size());
   const bytes plaintext = unseal(blob);
   client::field_reader sealed(plaintext);
   EXPECT_EQ(sealed.field().size(), 40u);
@@ -177,14 +188,11 @@ TEST(Version, KeysOpenUnderTheirOwnAlone) {
     uint32_t version, patchlevel;
     int32_t open_error, upgrade_error;
   } cases[] = {
-      {OS_VERSION, OS_PATCHLEVEL, 0, 0},
-      {OS_VERSION + 1, OS_PATCHLEVEL, -62, 0},
-      {OS_VERSION, OS_PATCHLEVEL + 1, -62, 0},
-      {OS_VERSION - 1, OS_PATCHLEVEL, -33, -38},
-      {OS_VERSION, OS_PATCHLEVEL - 1, -33, -38},
-      {OS_VERSION + 1, OS_PATCHLEVEL - 1, -62, -38},
-      {0x80000000, 0x80000000, -62, 0},  // compared without sign
-      {0, 0, -33, -38},
+      {OS_VERSION, OS_PATCHLEVEL, 0, 0},         {OS_VERSION + 1, OS_PATCHLEVEL, -62, 0},
+      {OS_VERSION, OS_PATCHLEVEL + 1, -62, 0},   {OS_VERSION - 1, OS_PATCHLEVEL, -33, -38},
+      {OS_VERSION, OS_PATCHLEVEL - 1, -33, -38}, {OS_VERSION + 1, OS_PATCHLEVEL - 1, -62, -38},
+      {0x80000000, OS_PATCHLEVEL, -62, 0},  // compared without sign
+      {OS_VERSION, 0x80000000, -62, 0},          {0, 0, -33, -38},
   };
   for (const auto& c : cases) {
     ta.configure(c.version, c.patchlevel);

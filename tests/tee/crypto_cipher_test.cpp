@@ -299,6 +299,13 @@ TEST_F(authenticated, tag_and_nonce_lengths) {
               bytes(message.tag.begin(), message.tag.begin() + static_cast<ptrdiff_t>(bits / 8)));
   }
   EXPECT_EQ(TEE_AEInit(op, nullptr, 0, 128, 0, 0), TEE_ERROR_NOT_SUPPORTED);
+  // A message longer than the algorithm allows is refused before a byte of it is read.
+  message.start(op);
+  uint8_t byte = 0;
+  size_t length = (size_t{1} << 36) - 31;
+  EXPECT_EQ(TEE_AEUpdate(op, &byte, length, &byte, &length), TEE_ERROR_EXCESS_DATA);
+  length = 1;
+  EXPECT_EQ(TEE_AEUpdate(op, &byte, length, &byte, &length), TEE_SUCCESS);
   TEE_FreeOperation(op);
 }
 

@@ -1,0 +1,401 @@
+// Authorisation of key use: what a begin, update and finish are refused for, tokens, counted and
+// rate-limited keys, the TA's clock, the operation pool.
+#include <gtest/gtest.h>
+#include <set>
+
+#include "support/ta_under_test.h"
+
+namespace keymaster::test {
+namespace {
+
+constexpr uint32_t SIGN = KM_PURPOSE_SIGN;
+constexpr uint32_t ENCRYPT = KM_PURPOSE_ENCRYPT;
+constexpr uint64_t USER = 42;
+constexpr uint64_t NOW = START_REE_MS;
+
+param_set one(keymaster_tag_t tag, uint64_t number) {
+  return param_set().add(tag, number);
+}
+
+// The key and the request that every case changes: an HMAC key that allows all it is asked for.
+param_set hmac_key(const param_set& more = {}) {
+  return param_set()
+      .add(KM_TAG_ALGORITHM, KM_ALGORITHM_HMAC)
+      .add(KM_TAG_KEY_SIZE, 256)
+      .add(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256)
+      .add(KM_TAG_MIN_MAC_LENGTH, 128)
+      .add(KM_TAG_PURPOSE, KM_PURPOSE_VERIFY)
+      .append(more);
+}
+
+param_set sign_key(const param_set& more = {}) {
+  return hmac_key(one(KM_TAG_PURPOSE, SIGN).append(more));
+}
+
+param_set signer(keymaster_tag_t tag, uint64_t number) {
+  return sign_key(one(tag, number));
+}
+
+param_set sign_request(const param_set& more = {}) {
+  return one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256).add(KM_TAG_MAC_LENGTH, 128).append(more);
+}
+
+param_set user_key(uint32_t auth_types) {
+  return signer(KM_TAG_USER_SECURE_ID, USER).add(KM_TAG_USER_AUTH_TYPE, auth_types);
+}
+
+param_set with_token(byte_view token) {
+  return param_set().add_bytes(KM_TAG_AUTH_TOKEN, token);
+}
+
+param_set aes_key(uint32_t mode, const param_set& more = {}) {
+  return one(KM_TAG_ALGORITHM, KM_ALGORITHM_AES)
+      .add(KM_TAG_KEY_SIZE, 128)
+      .add(KM_TAG_PURPOSE, ENCRYPT)
+      .add(KM_TAG_BLOCK_MODE, mode)
+      .add(KM_TAG_PADDING, KM_PAD_NONE)
+      .append(more);
+}
+
+param_set aes_request(uint32_t mode, const param_set& more = {}) {
+  return one(KM_TAG_BLOCK_MODE, mode).append(more);
+}
+
+const param_set OWN_NONCE = aes_request(KM_MODE_CBC).add_bytes(KM_TAG_NONCE, bytes(16));
+constexpr char NOT_YET[] = "check_active: Key not yet valid";
+constexpr char EXPIRED[] = "check_expiry: Key expired";
+constexpr char TOO_SOON[] = "check_rate_limit: key rate limit exceeded";
+constexpr char USED_UP[] = "check_use_count_and_add: Key max ops exceeded";
+constexpr char BAD_MAC[] = "check_auth_token_valid: Wrong auth token MAC";
+const std::string NOT_MET = "check_begin_auth: Auth token check failed";
+
+class auth : public testing::Test {
+ protected:
+  // A begin that ends with `error` (0: granted, and dropped again) and leaves these error lines,
+  // behind which a refusal's last line is supplied unless it is there.
+  void expect_begin(uint32_t purpose, byte_view blob, const param_set& request, int32_t error,
+                    std::string lines) {
+    const reply answer = ta.begin(purpose, blob, request);
+    EXPECT_TRUE(refused(answer, error));
+    if (error != 0 && lines.find("| begin") == std::string::npos) {
+      lines += " | begin: Authorization failed";
+    }
+    EXPECT_EQ(ta.trace().errors(), lines);
+    if (answer.ok()) {
+      EXPECT_TRUE(succeeded(ta.abort(answer.b)));
+    }
+  }
+  void expect_sign(byte_view blob, int32_t error = 0, std::string lines = "",
+                   const param_set& more = {}) {
+    expect_begin(SIGN, blob, sign_request(more), error, std::move(lines));
+  }
+
+  ta_under_test ta;
+};
+
+struct begin_case {
+  const char* name;
+  int32_t error;  // 0: granted
+  std::string reason;
+  param_set key;
+  param_set request = sign_request();
+  uint32_t purpose = SIGN;
+};
+
+const begin_case BEGINS[] = {
+    {"purpose", -3, "check_allowed: No such purpose in key_params", hmac_key()},
+    {"digest", -13, "check_allowed: No such digest in key_params", sign_key(),
+     one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_512).add(KM_TAG_MAC_LENGTH, 128)},
+    {"no digest", 0, "", sign_key(), one(KM_TAG_MAC_LENGTH, 128)},
+    {"padding", -11, "check_allowed: No such padding in key_params", aes_key(KM_MODE_CBC),
+     aes_request(KM_MODE_CBC, one(KM_TAG_PADDING, KM_PAD_PKCS7)), ENCRYPT},
+    {"block mode", -8, "check_allowed: No such block mode in key_params", aes_key(KM_MODE_ECB),
+     aes_request(KM_MODE_CBC), ENCRYPT},
+    {"nonce", -55, "check_caller_nonce: Caller nonce prohibited", aes_key(KM_MODE_CBC), OWN_NONCE,
+     ENCRYPT},
+    {"nonce allowed", 0, "", aes_key(KM_MODE_CBC, one(KM_TAG_CALLER_NONCE, 1)), OWN_NONCE, ENCRYPT},
+    {"no methods", -2, "begin: Algorithm HMAC purpose 0 not implemented",
+     signer(KM_TAG_PURPOSE, ENCRYPT), sign_request(), ENCRYPT},
+    {"no such purpose", -2, "begin: Algorithm HMAC purpose 4 not implemented",
+     signer(KM_TAG_PURPOSE, 4), sign_request(), 4},
+    {"MAC length", -57, "check_mac_length: MAC length 120 below the key's minimum 128", sign_key(),
+     one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256).add(KM_TAG_MAC_LENGTH, 120)},
+    {"tag length", -57, "check_mac_length: MAC length 96 below the key's minimum 128",
+     aes_key(KM_MODE_GCM, one(KM_TAG_MIN_MAC_LENGTH, 128)),
+     aes_request(KM_MODE_GCM, one(KM_TAG_MAC_LENGTH, 96)), ENCRYPT},
+    {"active now", 0, "", signer(KM_TAG_ACTIVE_DATETIME, NOW)},
+    {"no MAC length", -38,
+     "create_hmac_sign: No or too many KM_TAG_MAC_LENGTH | begin: Create operation failed",
+     sign_key(), one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256)},
+    {"not active", -24, NOT_YET, signer(KM_TAG_ACTIVE_DATETIME, NOW + 1)},
+    {"origination until now", 0, "", signer(KM_TAG_ORIGINATION_EXPIRE_DATETIME, NOW)},
+    {"origination over", -25, EXPIRED, signer(KM_TAG_ORIGINATION_EXPIRE_DATETIME, NOW - 1)},
+    {"no origination", 0, "", signer(KM_TAG_ORIGINATION_EXPIRE_DATETIME, 1), sign_request(),
+     KM_PURPOSE_VERIFY},
+    {"usage until now", 0, "", signer(KM_TAG_USAGE_EXPIRE_DATETIME, NOW), sign_request(),
+     KM_PURPOSE_VERIFY},
+    {"usage over", -25, EXPIRED, signer(KM_TAG_USAGE_EXPIRE_DATETIME, NOW - 1), sign_request(),
+     KM_PURPOSE_VERIFY},
+    {"no usage", 0, "", signer(KM_TAG_USAGE_EXPIRE_DATETIME, 1)},
+    {"bootloader", -33, "check_param: Bootloader only key",
+     sign_key(one(KM_TAG_BOOTLOADER_ONLY, 1).add(KM_TAG_ACTIVE_DATETIME, NOW + 1))},
+    {"the first decides", -24, NOT_YET,
+     sign_key(one(KM_TAG_ACTIVE_DATETIME, NOW + 1).add(KM_TAG_BOOTLOADER_ONLY, 1))},
+    {"user and no user", -38,
+     "check_secure_id: Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED",
+     user_key(1).add(KM_TAG_NO_AUTH_REQUIRED, 1)},
+    {"no type", -38, "check_secure_id: Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE",
+     signer(KM_TAG_USER_SECURE_ID, USER)},
+    {"timeout", -26, NOT_MET, user_key(1).add(KM_TAG_AUTH_TIMEOUT, UINT32_MAX)},
+    {"due, but refused later", -55, "check_caller_nonce: Caller nonce prohibited",
+     aes_key(KM_MODE_CBC, one(KM_TAG_USER_SECURE_ID, USER).add(KM_TAG_USER_AUTH_TYPE, 1)),
+     OWN_NONCE, ENCRYPT},
+};
+
+TEST_F(auth, begin_is_granted_or_refused_for_what_the_key_says) {
+  for (const begin_case& row : BEGINS) {
+    SCOPED_TRACE(row.name);
+    expect_begin(row.purpose, ta.generate(row.key), row.request, row.error, row.reason);
+  }
+}
+
+TEST_F(auth, clock_follows_system_time_alone) {
+  const bytes until = ta.generate(signer(KM_TAG_ORIGINATION_EXPIRE_DATETIME, NOW + 850));
+  const bytes from = ta.generate(signer(KM_TAG_ACTIVE_DATETIME, NOW + 850));
+  // The system clock's milliseconds are then fewer than at the start.
+  for (const uint64_t elapsed : {849, 850, 851}) {
+    SCOPED_TRACE(elapsed);
+    tee::host::set_clocks(START_SYSTEM_MS + elapsed, NOW + 1'000'000'000);
+    expect_sign(until, elapsed == 851 ? -25 : 0, elapsed == 851 ? EXPIRED : "");
+    expect_sign(from, elapsed == 849 ? -24 : 0, elapsed == 849 ? NOT_YET : "");
+  }
+}
+
+TEST_F(auth, rate_limit_counts_whole_seconds_and_includes_the_limit) {
+  const bytes key = ta.generate(signer(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 10));
+  expect_sign(key);
+  ta.advance(10'749);  // begun a quarter into a second: the last millisecond of the tenth
+  expect_sign(key, -54, TOO_SOON);
+  ta.advance(1);
+  expect_sign(key);
+  expect_sign(key, -54, TOO_SOON);
+}
+
+TEST_F(auth, counting_a_use_is_no_use_to_the_rate_limit) {
+  const bytes key = ta.generate(
+      signer(KM_TAG_MAX_USES_PER_BOOT, 9).add(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 1'000'000));
+  expect_sign(key);
+  expect_sign(key, -54, TOO_SOON);
+}
+
+TEST_F(auth, full_log_lets_a_rate_limited_key_pass_until_a_record_is_over) {
+  // The longest limits end after the clock does: their records are never over.
+  for (const uint32_t seconds : {UINT32_MAX, UINT32_MAX, 10u, 60u, 60u, 60u, 60u, 60u}) {
+    expect_sign(ta.generate(signer(KM_TAG_MIN_SECONDS_BETWEEN_OPS, seconds)));
+  }
+  const bytes ninth = ta.generate(signer(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 20));
+  const bytes tenth = ta.generate(signer(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 20));
+  expect_sign(ninth);
+  ta.advance(10'000);
+  expect_sign(ninth);
+  ta.advance(1'000);
+  expect_sign(ninth);
+  expect_sign(ninth, -54, TOO_SOON);
+  expect_sign(tenth);
+  expect_sign(tenth);
+}
+
+TEST_F(auth, uses_are_counted_even_when_the_begin_is_refused_later) {
+  for (const uint32_t maximum : {0, 1, 2}) {
+    SCOPED_TRACE(maximum);
+    const bytes key = ta.generate(signer(KM_TAG_MAX_USES_PER_BOOT, maximum));
+    expect_begin(SIGN, key, one(KM_TAG_DIGEST, KM_DIGEST_SHA1), -13,
+                 "check_allowed: No such digest in key_params");
+    if (maximum == 2) expect_sign(key);
+    expect_sign(key, -56, USED_UP);
+  }
+}
+
+TEST_F(auth, ninth_counted_key_is_refused_until_the_instance_ends) {
+  bytes key;
+  for (int i = 0; i < 8; i++) {
+    key = ta.generate(signer(KM_TAG_MAX_USES_PER_BOOT, 2));
+    expect_sign(key);
+  }
+  const bytes ninth = ta.generate(signer(KM_TAG_MAX_USES_PER_BOOT, 2));
+  ta.advance(86'400'000);
+  expect_sign(ninth, -31, "check_use_count_and_add: Too many use log");
+  expect_sign(key);  // it has a record
+  ta.restart();
+  expect_sign(ninth);
+}
+
+TEST_F(auth, keys_are_told_apart_also_when_their_blobs_are_longer_than_the_log_s_field) {
+  const param_set app = param_set().add_bytes(KM_TAG_APPLICATION_ID, bytes(3000, 7));
+  const param_set description = signer(KM_TAG_MAX_USES_PER_BOOT, 1).append(app);
+  for (const bytes& key : {ta.generate(description), ta.generate(description)}) {
+    expect_sign(key, 0, "", app);
+    expect_sign(key, -56, USED_UP, app);
+  }
+}
+
+TEST_F(auth, token_matches_at_begin) {
+  const struct {
+    const char* name;
+    client::token_request token;
+    int32_t error = 0;
+    std::string lines = "";
+    uint32_t key_types = 1;
+  } rows[] = {
+      {"user", {.user_id = USER}},
+      {"authenticator", {.user_id = 7, .authenticator_id = USER}},
+      {"any challenge", {.user_id = USER, .challenge = 99}},
+      {"second user", {.user_id = USER + 1}, 0, "check_auth: User id mismatch"},
+      {"half the id",
+       {.user_id = USER + (1ull << 32)},
+       -26,
+       "check_auth: User id mismatch | check_auth: User id mismatch | " + NOT_MET},
+      {"one of the types", {.user_id = USER, .type = 2}, 0, "", 3},
+      {"not the type",
+       {.user_id = USER, .type = 2},
+       -26,
+       "check_auth: Auth type mismatch | check_auth: User id mismatch | " + NOT_MET},
+  };
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.name);
+    // The shortest timeout: a token that comes with begin is not asked for its age.
+    const bytes key = ta.generate(
+        user_key(row.key_types).add(KM_TAG_USER_SECURE_ID, USER + 1).add(KM_TAG_AUTH_TIMEOUT, 1));
+    const bytes token = ta.token(row.token);
+    ta.advance(3'600'000);
+    expect_sign(key, row.error, row.lines, with_token(token));
+  }
+}
+
+TEST_F(auth, token_serves_only_the_begin_that_brings_it) {
+  const bytes key = ta.generate(user_key(1).add(KM_TAG_AUTH_TIMEOUT, UINT32_MAX));
+  expect_sign(key, 0, "", with_token(ta.token({.user_id = USER})));
+  expect_sign(key, -26, NOT_MET);
+}
+
+TEST_F(auth, damaged_and_foreign_tokens_are_invalid) {
+  const bytes key = ta.generate(user_key(1));
+  const bytes token = ta.token({.user_id = USER});
+  ASSERT_EQ(token.size(), 69u);
+  for (const size_t size : {0, 68, 70}) {
+    bytes resized = token;
+    resized.resize(size);
+    expect_sign(key, -38,
+                "check_auth_token_valid: Wrong auth token size, expected 69B, got " +
+                    std::to_string(size) + "B",
+                with_token(resized));
+  }
+  for (size_t i = 0; i < token.size(); i++) {
+    SCOPED_TRACE(i);
+    bytes flipped = token;
+    flipped[i] ^= 1;
+    expect_sign(
+        key, -38,
+        i == 0 ? "check_auth_token_valid: Wrong auth token version, expected 0, got 1" : BAD_MAC,
+        with_token(flipped));
+  }
+  ta.restart();
+  expect_sign(key, 0, "", with_token(token));
+  ta.reboot();
+  expect_sign(key, -38, BAD_MAC, with_token(token));
+}
+
+// Were a MAC that cannot be computed taken for zeros, this token would be genuine.
+TEST_F(auth, zero_mac_is_invalid_whatever_fails) {
+  const bytes key = ta.generate(user_key(1));
+  bytes token = ta.token({.user_id = USER});
+  std::fill(token.end() - 32, token.end(), uint8_t{0});
+  bool fired = true;
+  for (uint64_t n = 1; fired; n++) {
+    tee::host::fail_nth_call(n, TEE_ERROR_OUT_OF_MEMORY);
+    EXPECT_FALSE(ta.begin(SIGN, key, sign_request(with_token(token))).ok()) << "call " << n;
+    fired = tee::host::fault_fired();
+    tee::host::clear_fault();
+  }
+}
+
+TEST_F(auth, operation_wants_its_own_token_at_every_step) {
+  const bytes key = ta.generate(user_key(3));
+  const auto token_for = [&](uint64_t challenge) {
+    return with_token(ta.token({.user_id = USER, .challenge = challenge}));
+  };
+  const std::string missing = "check_operation_auth: Auth token check failed";
+  for (const command step : {command::UPDATE, command::FINISH}) {
+    const auto expect_refusal = [&](const param_set& brought, int32_t error,
+                                    const std::string& lines) {
+      // What came with begin is no token for this operation.
+      const uint32_t handle = ta.begun(SIGN, key, sign_request(token_for(99)));
+      EXPECT_TRUE(refused(ta.send(step_request(step, handle, {}, brought)), error));
+      EXPECT_EQ(ta.trace().errors(), lines + (step == command::UPDATE ? " | update" : " | finish") +
+                                         ": Authorization failed");
+      EXPECT_TRUE(refused(ta.abort(handle), -28));
+    };
+    expect_refusal({}, -26, missing);
+    expect_refusal(token_for(0), -26, "check_auth: Challenge mismatch | " + missing);
+    expect_refusal(with_token(bytes(69)), -38, BAD_MAC);
+  }
+  const uint32_t handle = ta.begun(SIGN, key, sign_request());
+  EXPECT_TRUE(ta.trace().has("check_begin_auth: OP AUTH NEEDED"));
+  EXPECT_TRUE(succeeded(ta.update(handle, bytes(5), token_for(handle))));
+  EXPECT_TRUE(succeeded(ta.finish(handle, {}, token_for(handle))));
+}
+
+TEST_F(auth, application_must_present_what_the_key_is_bound_to) {
+  const bytes id = {1, 2, 3};
+  const bytes data = {4, 5, 6};
+  const client::application bound{id, data};
+  const struct {
+    client::application key;
+    client::application given;
+    const char* mismatch = nullptr;
+  } rows[] = {
+      {bound, bound},
+      {{}, bound},
+      {bound, {}, "KM_TAG_APPLICATION_ID"},
+      {bound, {{1, 2, 4}, data}, "KM_TAG_APPLICATION_ID"},
+      {bound, {{1, 2}, data}, "KM_TAG_APPLICATION_ID"},
+      {bound, {id, {}}, "KM_TAG_APPLICATION_DATA"},
+      {bound, {id, {4, 5, 6, 7}}, "KM_TAG_APPLICATION_DATA"},
+  };
+  const std::string start = "check_app_id_and_app_data: ";
+  const std::string end = " | begin: Wrong AppId or AppData";
+  for (const auto& row : rows) {
+    param_set description = sign_key();
+    row.key.bind(&description);
+    param_set presented;
+    row.given.bind(&presented);
+    expect_sign(ta.generate(description), row.mismatch ? -33 : 0,
+                row.mismatch ? start + row.mismatch + " mismatch" + end : "", presented);
+  }
+  const param_set twice =
+      param_set().add_bytes(KM_TAG_APPLICATION_ID, id).add_bytes(KM_TAG_APPLICATION_ID, id);
+  expect_sign(ta.generate(sign_key(twice)), -33, start + "Duplicated KM_TAG_APPLICATION_ID" + end,
+              twice);
+}
+
+TEST_F(auth, pool_holds_sixteen_operations_of_all_sessions) {
+  const bytes key = ta.generate(sign_key());
+  std::set<uint32_t> handles;
+  for (int i = 0; i < 16; i++) {
+    if (i == 8) ta.change_session();
+    handles.insert(ta.begun(SIGN, key, sign_request()));
+  }
+  EXPECT_EQ(handles.size(), 16u);
+  EXPECT_FALSE(handles.contains(0));
+  expect_sign(key, -31,
+              "operation_pool_add: Too many operations | begin: Allocate in operation pool failed");
+  EXPECT_TRUE(succeeded(ta.abort(*handles.begin())));
+  EXPECT_TRUE(refused(ta.abort(*handles.begin()), -28));
+  EXPECT_EQ(ta.trace().errors(), "operation_pool_get: Operation handle not found");
+  EXPECT_TRUE(refused(ta.update(0, bytes(1)), -28));  // what a slot that was never used remembers
+  expect_sign(key);
+  EXPECT_TRUE(succeeded(ta.update(*handles.rbegin(), bytes(1))));
+}
+
+}  // namespace
+}  // namespace keymaster::test

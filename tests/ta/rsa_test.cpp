@@ -1,0 +1,462 @@
+// RSA through the command interface, against libcrypto: every padding and digest in both
+// directions, the limits of messages, keys of every form, and what is refused.
+#include <openssl/core_names.h>
+#include <openssl/rsa.h>
+
+#include "support/sets.h"
+#include "support/ta_under_test.h"
+#include "ta/pkey.h"
+
+namespace keymaster::test {
+namespace {
+
+using client::as_bytes;
+
+constexpr uint32_t UNKNOWN_DIGEST = 7;
+constexpr uint32_t UNKNOWN_PADDING = 9;
+
+constexpr scheme RAW = {KM_PAD_NONE, KM_DIGEST_NONE};
+constexpr scheme PKCS1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_NONE};
+constexpr scheme PKCS1_SHA1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA1};
+constexpr scheme PKCS1_ENCRYPT = {KM_PAD_RSA_PKCS1_1_5_ENCRYPT, KM_DIGEST_NONE};
+constexpr scheme OAEP_SHA256 = {KM_PAD_RSA_OAEP, KM_DIGEST_SHA_2_256};
+
+// Made with the openssl command.
+const pkey& key_512() {
+  static const pkey key =
+      pkey::rsa("fc8bac6a15bb3eb9223d6b2bf9cc1a35cd51620a7c3b9eb7e313359f0038e63b",
+                "f2e28ad4738b3978bc5e0843e34f1ff683e1d3f1817597ee9b77280bd3d3e369");
+  return key;
+}
+
+const pkey& key_1024() {
+  static const pkey key = pkey::rsa(
+      "fca8aa82aabaac028b8f7f585e08b017c84ccfdbe30b91101eb6f3d2d1cf12f7"
+      "fba950123901dbf5bd77cb4ac702d5ea82835577bb593e52e2d39aa61ac94369",
+      "f6b47d23c7312f9a6f86628fa0ca80ee45417a44e2364cf900cd1a8f587b3466"
+      "8f60bc2d35d0bbb6c864d7be80d3cf155d304dde78bcb613a1f049e29786017d");
+  return key;
+}
+
+const pkey& key_2048() {
+  static const pkey key = pkey::rsa(
+      "d09047564e7614ee5f69c4de1e9ac9d5ed314048d7c651746653c991a5d7098c"
+      "03a09c3764b0906cc76c5fb5da094d8c358608401164137acbc0124735c533f4"
+      "450026bdbb0812b978354d012566780617c9e0c721ee535cfb38bb60ff496fc8"
+      "5508ad724513f7e28ce390037d2a6e5be9a0b08c787f2b6e8ddb1c34becb079f",
+      "b95286d2d4f16289a7a87c6dda9426885e24af54f43532cb22100c148ede3d5d"
+      "a3adecf49a847fbe02076f300f2975ea772d15a5a6d3eb095e602682421203e7"
+      "b236eb148ab3bb66c172547371dfc1f4780c06344c4006eb65c421553ba20bea"
+      "340feef2e914b163689c14f48939841c273a8b4dbb4219671a261c7c00d94da9");
+  return key;
+}
+
+// A key for every purpose, padding and digest.
+param_set any_use() {
+  param_set key = one(KM_TAG_ALGORITHM, KM_ALGORITHM_RSA).add_flag(KM_TAG_NO_AUTH_REQUIRED);
+  for (uint32_t purpose = KM_PURPOSE_ENCRYPT; purpose <= KM_PURPOSE_VERIFY; purpose++)
+    key.add(KM_TAG_PURPOSE, purpose);
+  for (uint32_t padding = KM_PAD_NONE; padding <= UNKNOWN_PADDING; padding++)
+    key.add(KM_TAG_PADDING, padding);
+  for (uint32_t digest = KM_DIGEST_NONE; digest <= UNKNOWN_DIGEST; digest++)
+    key.add(KM_TAG_DIGEST, digest);
+  return key;
+}
+
+param_set new_key(uint64_t bits, uint64_t exponent) {
+  return any_use().add(KM_TAG_KEY_SIZE, bits).add(KM_TAG_RSA_PUBLIC_EXPONENT, exponent);
+}
+
+param_set use(scheme how) {
+  return one(KM_TAG_PADDING, how.padding).add(KM_TAG_DIGEST, how.digest);
+}
+
+bytes text(size_t length) {
+  bytes result(length);
+  for (size_t i = 0; i < length; i++)
+    result[i] = static_cast<uint8_t>(i * 7 + 1);
+  return result;
+}
+
+bytes right_aligned(bytes data, size_t size) {
+  data.insert(data.begin(), size - data.size(), 0);
+  return data;
+}
+
+class Rsa : public testing::Test {
+ protected:
+  bytes imported(const pkey& key) { return ta.import(any_use(), key.import_data()); }
+
+  // begin and update of a signature's verification; returns what finish answers to `signature`.
+  reply verify(byte_view blob, scheme how, byte_view message, byte_view signature) {
+    const uint32_t handle = ta.begun(KM_PURPOSE_VERIFY, blob, use(how));
+    EXPECT_TRUE(succeeded(ta.update(handle, message))) << ta.trace().errors();
+    return ta.finish(handle, signature);
+  }
+
+  ta_under_test ta;
+};
+
+// The answers of begin by padding (rows 1 to 5, then one that does not exist) and digest (columns).
+constexpr int32_t SIGNATURE_ANSWERS[][UNKNOWN_DIGEST + 1] = {
+    {0, -13, -13, -13, -13, -13, -13, -12},
+    {-10, -10, -10, -10, -10, -10, -10, -12},
+    {-13, -13, 0, 0, 0, 0, 0, -12},
+    {-10, -10, -10, -10, -10, -10, -10, -12},
+    {0, 0, 0, 0, 0, 0, 0, -12},
+    {-10, -10, -10, -10, -10, -10, -10, -12},
+};
+constexpr int32_t ENCRYPTION_ANSWERS[][UNKNOWN_DIGEST + 1] = {
+    {0, -13, -13, -13, -13, -13, -13, -12},   {-13, -13, 0, 0, 0, 0, 0, -12},
+    {-10, -10, -10, -10, -10, -10, -10, -12}, {0, -13, -13, -13, -13, -13, -13, -12},
+    {-10, -10, -10, -10, -10, -10, -10, -12}, {-10, -10, -10, -10, -10, -10, -10, -12},
+};
+
+// Calls with every scheme of a table and its answer.
+template <size_t N, class Row>
+void each_scheme(const int32_t (&answers)[N][UNKNOWN_DIGEST + 1], Row row) {
+  for (uint32_t i = 0; i < N; i++) {
+    for (uint32_t digest = 0; digest <= UNKNOWN_DIGEST; digest++) {
+      const uint32_t padding = i + 1 < N ? i + 1 : UNKNOWN_PADDING;
+      SCOPED_TRACE("padding " + std::to_string(padding) + ", digest " + std::to_string(digest));
+      row(scheme{padding, digest}, answers[i][digest]);
+    }
+  }
+}
+
+TEST_F(Rsa, SignaturesAreThoseOfTheStandards) {
+  for (const pkey* key : {&key_1024(), &key_2048()}) {
+    const bytes blob = imported(*key);
+    each_scheme(SIGNATURE_ANSWERS, [&](scheme how, int32_t answer) {
+      if (answer != 0) {
+        EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, use(how)), answer));
+        EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_VERIFY, blob, use(how)), answer));
+        return;
+      }
+      // Without padding the message is the whole block, whose first byte must be 0.
+      const bool raw = how.padding == KM_PAD_NONE;
+      const bytes message = raw ? right_aligned(text(key->size() - 1), key->size()) : text(70);
+      const bytes made = ta.run(KM_PURPOSE_SIGN, blob, use(how), message);
+      EXPECT_EQ(made.size(), key->size());
+      EXPECT_TRUE(key->verify(how, message, made));
+      const bytes foreign = key->sign(how, message);
+      EXPECT_TRUE(succeeded(verify(blob, how, message, foreign)));
+      bytes other = message;
+      other.back() ^= 1;
+      EXPECT_TRUE(refused(verify(blob, how, other, made), -30));
+      EXPECT_TRUE(how.digest == 0 ||
+                  refused(verify(blob, how, message, byte_view(made).subspan(1)), -30));
+    });
+  }
+}
+
+TEST_F(Rsa, CiphertextsAreThoseOfTheStandards) {
+  for (const pkey* key : {&key_1024(), &key_2048()}) {
+    const bytes blob = imported(*key);
+    each_scheme(ENCRYPTION_ANSWERS, [&](scheme how, int32_t answer) {
+      // 1024 bits are too short for OAEP with SHA-512: nothing but an error can come of it.
+      if (answer != 0 || (key->size() == 128 && how.digest == KM_DIGEST_SHA_2_512)) {
+        const int32_t error = answer != 0 ? answer : -21;
+        const reply begun = ta.begin(KM_PURPOSE_ENCRYPT, blob, use(how));
+        EXPECT_TRUE(refused(answer != 0 ? begun : ta.finish(begun.b), error));
+        return;
+      }
+      const bool raw = how.padding == KM_PAD_NONE;
+      const bytes message = text(20);
+      const bytes whole = raw ? right_aligned(message, key->size()) : message;
+      const bytes made = ta.run(KM_PURPOSE_ENCRYPT, blob, use(how), message);
+      EXPECT_EQ(made.size(), key->size());
+      EXPECT_EQ(key->decrypt(how, made), whole);
+      EXPECT_EQ(ta.run(KM_PURPOSE_DECRYPT, blob, use(how), key->encrypt(how, whole)), whole);
+      const uint32_t handle = ta.begun(KM_PURPOSE_DECRYPT, blob, use(how));
+      EXPECT_TRUE(succeeded(ta.update(handle, byte_view(made).subspan(1))));
+      EXPECT_EQ(ta.finish(handle).km_error, raw ? 0 : -38);
+    });
+    // Nothing but OAEP needs a digest to be named.
+    for (const auto& [padding, answer] :
+         {std::pair(KM_PAD_NONE, 0), {KM_PAD_RSA_PKCS1_1_5_ENCRYPT, 0}, {KM_PAD_RSA_OAEP, -13}}) {
+      const reply begun = ta.begin(KM_PURPOSE_ENCRYPT, blob, one(KM_TAG_PADDING, padding));
+      EXPECT_TRUE(refused(begun, answer)) << padding;
+      if (begun.ok()) ta.abort(begun.b);
+    }
+  }
+}
+
+TEST_F(Rsa, MessagesHaveLimits) {
+  const bytes blob = imported(key_2048());
+  const struct {
+    uint32_t purpose;
+    scheme how;
+    size_t longest;
+    bool at_update;  // else it is finish that refuses what is longer
+    const char* message;
+  } rows[] = {
+      {KM_PURPOSE_SIGN, PKCS1, 245, true, "too long to sign, key_size 2048, input 246B"},
+      {KM_PURPOSE_VERIFY, PKCS1, 245, true, "too long to verify, key_size 2048, input 246B"},
+      {KM_PURPOSE_SIGN, RAW, 256, true, "too long to sign, key_size 2048, input 257B"},
+      {KM_PURPOSE_ENCRYPT, RAW, 256, true, "too long to encrypt, key_size 2048, input 257B"},
+      {KM_PURPOSE_DECRYPT, PKCS1_ENCRYPT, 256, true,
+       "too long to decrypt, key_size 2048, input 257B"},
+      {KM_PURPOSE_ENCRYPT, PKCS1_ENCRYPT, 245, false, "Message too long, max 245B, got 246B"},
+      {KM_PURPOSE_ENCRYPT, OAEP_SHA256, 190, false, "Message too long, max 190B, got 191B"},
+  };
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.message);
+    const uint32_t handle = ta.begun(row.purpose, blob, use(row.how));
+    EXPECT_TRUE(succeeded(ta.update(handle, text(row.longest - 1))));
+    EXPECT_TRUE(succeeded(ta.update(handle, text(1))));
+    const reply over = ta.update(handle, text(1));
+    EXPECT_EQ(over.b, row.at_update ? 0U : 1U);
+    EXPECT_TRUE(refused(row.at_update ? over : ta.finish(handle), -21));
+    EXPECT_NE(ta.trace().errors().find(row.message), std::string::npos);
+    if (!row.at_update) ta.run(row.purpose, blob, use(row.how), text(row.longest));
+  }
+  const bytes too_big(256, 0xFF);  // not below the modulus
+  for (uint32_t purpose : {KM_PURPOSE_SIGN, KM_PURPOSE_ENCRYPT, KM_PURPOSE_DECRYPT}) {
+    const uint32_t handle = ta.begun(purpose, blob, use(RAW));
+    EXPECT_TRUE(succeeded(ta.update(handle, too_big)));
+    EXPECT_TRUE(refused(ta.finish(handle), -38)) << purpose;
+  }
+  EXPECT_TRUE(failed_with(verify(blob, RAW, text(9), too_big), TEEC_ERROR_BAD_PARAMETERS));
+}
+
+TEST_F(Rsa, RawResultsHaveTheKeysLength) {
+  const bytes blob = imported(key_2048());
+  // The public operation on what is wanted tells what to sign.
+  const bytes wanted = right_aligned(text(200), 256);
+  EXPECT_EQ(ta.run(KM_PURPOSE_SIGN, blob, use(RAW), key_2048().encrypt(RAW, wanted)), wanted);
+  const bytes short_message = text(10);
+  const bytes made = ta.run(KM_PURPOSE_SIGN, blob, use(RAW), short_message);
+  EXPECT_EQ(made, key_2048().sign(RAW, right_aligned(short_message, 256)));
+  // Verification takes the data as it came, at the front of the block.
+  EXPECT_TRUE(refused(verify(blob, RAW, short_message, made), -30));
+  EXPECT_TRUE(refused(verify(blob, RAW, right_aligned(short_message, 256), made), -30));
+  EXPECT_EQ(ta.run(KM_PURPOSE_ENCRYPT, blob, use(RAW), {}), bytes(256));
+}
+
+TEST_F(Rsa, PssSaltsAreAsLongAsTheDigestOrAsFits) {
+  const struct {
+    const pkey& key;
+    uint32_t digest;
+    int salt;
+  } rows[] = {{key_2048(), KM_DIGEST_SHA_2_256, 32},
+              {key_2048(), KM_DIGEST_SHA_2_512, 64},
+              {key_1024(), KM_DIGEST_SHA_2_384, 48},
+              {key_1024(), KM_DIGEST_SHA_2_512, 62},
+              {key_512(), KM_DIGEST_SHA_2_256, 30}};
+  for (const auto& row : rows) {
+    const scheme how = {KM_PAD_RSA_PSS, row.digest};
+    const bytes blob = imported(row.key);
+    const bytes made = ta.run(KM_PURPOSE_SIGN, blob, use(how), text(99));
+    EXPECT_TRUE(row.key.verify(how, text(99), made, row.salt)) << row.salt;
+    for (int salt : {0, 1, RSA_PSS_SALTLEN_MAX}) {
+      EXPECT_TRUE(succeeded(verify(blob, how, text(99), row.key.sign(how, text(99), salt))));
+    }
+  }
+  const param_set pss = use({KM_PAD_RSA_PSS, KM_DIGEST_SHA_2_512});
+  EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, imported(key_512()), pss), -13));
+  EXPECT_TRUE(
+      ta.trace().has("create_rsa_sign: Too short key to fit digest, flag and salt, "
+                     "key_size 512, need 688"));
+}
+
+TEST_F(Rsa, BeginWantsOnePaddingAndOneDigest) {
+  const bytes blob = imported(key_512());
+  for (const auto& [tag, name] :
+       {std::pair(KM_TAG_PADDING, "KM_TAG_PADDING"), {KM_TAG_DIGEST, "KM_TAG_DIGEST"}}) {
+    for (const param_set& params : {without(use(PKCS1), tag), use(PKCS1).add(tag, 5)}) {
+      EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_VERIFY, blob, params), -38));
+      EXPECT_TRUE(ta.trace().has(std::string("create_rsa_verify: No or too many ") + name));
+    }
+  }
+}
+
+TEST_F(Rsa, NewKeysAreChecked) {
+  const std::string no_exponent = "No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified";
+  const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
+  const param_set good = new_key(512, 65537);
+  const struct {
+    param_set description;
+    int32_t error;
+    std::string message;
+  } rows[] = {
+      {param_set(good).add(KM_TAG_ORIGIN, 0), -38, "Shouldn't specify KM_TAG_ORIGIN"},
+      {param_set(good).add(KM_TAG_CREATION_DATETIME, 1), -38,
+       "Shouldn't specify KM_TAG_CREATION_DATETIME"},
+      {without(good, KM_TAG_RSA_PUBLIC_EXPONENT), -38, no_exponent},
+      {param_set(good).add(KM_TAG_RSA_PUBLIC_EXPONENT, 3), -38, no_exponent},
+      {without(good, KM_TAG_KEY_SIZE), -38, no_size},
+      {param_set(good).add(KM_TAG_KEY_SIZE, 512), -38, no_size},
+      {new_key(8200, 65537), -6, "Invalid RSA key size 8200"},
+      {new_key(513, 65537), -6, "Invalid RSA key size 513"},
+  };
+  for (const auto& row : rows) {
+    EXPECT_TRUE(refused(ta.send(generate_request(row.description)), row.error)) << row.message;
+    EXPECT_TRUE(ta.trace().has("rsa_generate_key: " + row.message)) << ta.trace().errors();
+  }
+  // What the platform cannot do is its own code and an unknown error together.
+  for (const auto& [bits, exponent, code] : {std::tuple(504, 65537, TEEC_ERROR_NOT_SUPPORTED),
+                                             {512, 4, TEEC_ERROR_BAD_PARAMETERS},
+                                             {512, 1, TEEC_ERROR_BAD_PARAMETERS}}) {
+    const reply answer = ta.send(generate_request(new_key(bits, exponent)));
+    EXPECT_TRUE(failed_with(answer, code)) << bits << ", " << exponent;
+    EXPECT_EQ(answer.km_error, -1000);
+  }
+}
+
+TEST_F(Rsa, GeneratedKeysWorkAndAreExported) {
+  const scheme how = {KM_PAD_RSA_PSS, KM_DIGEST_SHA_2_256};
+  for (const auto& [bits, exponent] : {std::pair(1024, 3), {2048, 65537}}) {
+    const bytes blob = ta.generate(new_key(bits, exponent));
+    const param_set found = ta.characteristics(blob);
+    EXPECT_EQ(found.number(KM_TAG_ORIGIN), KM_ORIGIN_GENERATED);
+    EXPECT_EQ(found.number(KM_TAG_OS_VERSION), OS_VERSION);
+    EXPECT_EQ(found.number(KM_TAG_CREATION_DATETIME), START_REE_MS / 1000 * 1000);
+    const reply exported = ta.send(key_request(command::EXPORT_KEY, blob));
+    ASSERT_TRUE(succeeded(exported));
+    const pkey key = pkey::rsa_public(exported.output());
+    EXPECT_EQ(key.number(OSSL_PKEY_PARAM_RSA_E), (exponent == 3 ? bytes{3} : bytes{1, 0, 1}));
+    EXPECT_EQ(key.size() * 8, static_cast<size_t>(bits));
+    EXPECT_TRUE(key.verify(how, text(5), ta.run(KM_PURPOSE_SIGN, blob, use(how), text(5))));
+    const size_t size = exported.output().size();
+    EXPECT_TRUE(refused(ta.send(key_request(command::EXPORT_KEY, blob, {}, size - 1)), -1000));
+  }
+}
+
+// The import data of a 512-bit key with some of its eight numbers replaced.
+bytes altered(std::initializer_list<std::pair<size_t, bytes>> changes) {
+  const bytes good = key_512().import_data();
+  client::field_reader in(good);
+  client::field_writer out;
+  for (size_t i = 0; i < 8; i++) {
+    const byte_view field = in.field();
+    bytes number(field.begin(), field.end());
+    for (const auto& [index, value] : changes) {
+      if (index == i) number = value;
+    }
+    out.field(number);
+  }
+  return out.take();
+}
+
+constexpr size_t MODULUS = 0;
+constexpr size_t EXPONENT = 1;
+const bytes E_LONG = {0, 0, 0, 0, 0, 0, 1, 0, 1};  // nine bytes
+
+TEST_F(Rsa, ImportsTellTheirSizeAndExponent) {
+  const bytes modulus = key_512().number(OSSL_PKEY_PARAM_RSA_N);
+  const auto exponent = [](uint64_t e) { return any_use().add(KM_TAG_RSA_PUBLIC_EXPONENT, e); };
+  const struct {
+    param_set description;
+    bytes data;
+    int32_t error;
+    std::string message;
+    uint32_t bits;  // of a key that is taken; its exponent is 65537
+  } rows[] = {
+      {any_use().add(KM_TAG_KEY_SIZE, 512), altered({}), 0, "", 512},
+      {any_use(), altered({{MODULUS, right_aligned(modulus, 65)}}), 0, "", 520},
+      {any_use(), altered({{MODULUS, bytes()}}), 0, "", 0},
+      {any_use(), altered({{EXPONENT, E_LONG}}), 0, "", 512},
+      {exponent(65537), altered({{EXPONENT, {0, 1, 0, 1}}}), 0, "", 512},
+      {exponent(3), altered({}), -44, "Public exponent mismatch", 0},
+      {exponent(65537), altered({{EXPONENT, E_LONG}}), -44, "Public exponent mismatch", 0},
+      {any_use(), altered({{EXPONENT, bytes(9, 1)}}), -44, "Public exponent mismatch", 0},
+      {any_use().add(KM_TAG_KEY_SIZE, 511), altered({}), -44,
+       "Key size mismatch (given 511, guessed 512)", 0},
+      {any_use(), altered({{MODULUS, bytes(1025, 1)}}), -6, "Invalid RSA key size 8200", 0},
+      {any_use().add(KM_TAG_OS_VERSION, 1), altered({}), -38, "Shouldn't specify KM_TAG_OS_VERSION",
+       0},
+  };
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.message + std::to_string(row.bits));
+    const reply answer = ta.send(import_request(row.description, row.data));
+    ASSERT_TRUE(refused(answer, row.error)) << ta.trace().errors();
+    EXPECT_TRUE(row.error == 0 || ta.trace().has("rsa_import_key: " + row.message));
+    if (row.error != 0) continue;
+    client::key_result result;
+    client::parse_imported(answer.output(), &result);
+    const param_set found = ta.characteristics(result.blob);
+    EXPECT_EQ(found.numbers(KM_TAG_KEY_SIZE), std::vector<uint64_t>{row.bits});
+    EXPECT_EQ(found.numbers(KM_TAG_RSA_PUBLIC_EXPONENT), std::vector<uint64_t>{65537});
+    EXPECT_EQ(found.number(KM_TAG_ORIGIN), KM_ORIGIN_IMPORTED);
+    EXPECT_FALSE(found.contains(KM_TAG_CREATION_DATETIME));
+  }
+  const bytes dated = ta.import(any_use().add(KM_TAG_CREATION_DATETIME, 77), altered({}));
+  EXPECT_EQ(ta.characteristics(dated).number(KM_TAG_CREATION_DATETIME), 77U);
+  const bytes data = altered({});
+  for (size_t size = 0; size < data.size(); size++) {
+    const request cut = import_request(any_use(), byte_view(data).first(size));
+    EXPECT_TRUE(failed_with(ta.send(cut), TEEC_ERROR_GENERIC)) << size;
+  }
+}
+
+TEST_F(Rsa, ImportsOfUnusualFormAreUsed) {
+  const bytes modulus = key_512().number(OSSL_PKEY_PARAM_RSA_N);
+  const bytes longer = ta.import(any_use(), altered({{MODULUS, right_aligned(modulus, 65)}}));
+  EXPECT_EQ(ta.run(KM_PURPOSE_SIGN, longer, use(PKCS1_SHA1), text(3)),
+            key_512().sign(PKCS1_SHA1, text(3)));
+  EXPECT_EQ(ta.run(KM_PURPOSE_ENCRYPT, longer, use(RAW), text(1)).size(), 65U);
+  const bytes no_primes =
+      ta.import(any_use(), altered({{3, {}}, {4, {}}, {5, {}}, {6, {}}, {7, {}}}));
+  EXPECT_EQ(ta.run(KM_PURPOSE_SIGN, no_primes, use(PKCS1), text(3)),
+            key_512().sign(PKCS1, text(3)));
+}
+
+TEST_F(Rsa, NumbersThatAreNoKeyAreRefusedWhenUsed) {
+  bytes even = key_512().number(OSSL_PKEY_PARAM_RSA_N);
+  even.back() ^= 1;
+  const bytes broken[] = {
+      altered({{MODULUS, {}}}),
+      altered({{MODULUS, even}}),
+      altered({{MODULUS, bytes(64)}}),
+      altered({{MODULUS, {0x0b}}}),
+      altered({{EXPONENT, {4}}}),
+      altered({{EXPONENT, {}}}),
+      altered({{2, {}}}),
+      altered({{2, bytes(200, 0xEE)}}),
+      altered({{3, bytes(32, 0xEE)}}),
+      altered({{7, {1}}}),
+      altered({{3, {}}}),
+  };
+  for (size_t i = 0; i < std::size(broken); i++) {
+    const bytes blob = ta.import(any_use(), broken[i]);
+    EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, use(RAW)), -1000)) << i;
+    EXPECT_TRUE(ta.trace().has("create_rsa_sign: Resolve key data failed")) << i;
+    EXPECT_TRUE(refused(ta.send(key_request(command::EXPORT_KEY, blob)), -1000)) << i;
+    EXPECT_TRUE(ta.trace().has("rsa_export_key: resolve key from data stream error")) << i;
+  }
+}
+
+TEST_F(Rsa, SoterKeysWaitForTheirResources) {
+  const bytes blob = ta.import(any_use().add_flag(KM_TAG_SOTER_KEY), key_512().import_data());
+  const param_set params = use(PKCS1_SHA1);
+  EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, params), -1000));
+  EXPECT_NE(ta.trace().errors().find("create_rsa_sign: soter resources is not ready, error 0x"),
+            std::string::npos);
+  EXPECT_TRUE(succeeded(ta.abort(ta.begun(KM_PURPOSE_VERIFY, blob, params))));
+}
+
+TEST_F(Rsa, FailuresOfThePlatformAreReportedAndLeaveNothing) {
+  ta.watch_secret(key_512().number(OSSL_PKEY_PARAM_RSA_D));
+  const struct {
+    uint32_t purpose;
+    scheme how;
+    bytes last;  // what finish is given
+  } rows[] = {{KM_PURPOSE_SIGN, {KM_PAD_RSA_PSS, KM_DIGEST_SHA1}, {}},
+              {KM_PURPOSE_SIGN, RAW, {}},
+              {KM_PURPOSE_VERIFY, PKCS1_SHA1, key_512().sign(PKCS1_SHA1, text(8))},
+              {KM_PURPOSE_VERIFY, PKCS1, key_512().sign(PKCS1, text(8))},
+              {KM_PURPOSE_ENCRYPT, PKCS1_ENCRYPT, {}},
+              {KM_PURPOSE_DECRYPT, RAW, {}}};
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.purpose);
+    expect_faults_reported([&] {
+      return live_through(&ta, any_use(), key_512().import_data(), row.purpose, use(row.how),
+                          text(8), row.last);
+    });
+  }
+  expect_faults_reported([&] { return ta.send(generate_request(new_key(512, 65537))).ok(); });
+}
+
+}  // namespace
+}  // namespace keymaster::test
