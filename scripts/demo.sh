@@ -75,7 +75,32 @@ theirs=$(openssl mac -digest SHA256 -macopt "hexkey:$(hex known.bin)" -in README
 printf '\n    device   %s\n    openssl  %s\n' "$ours" "$theirs"
 same "$ours" "$theirs" "the MACs"
 
-say "5. The device's OS is updated: keys of the old version want an upgrade"
+say "5. RSA and EC keys sign; openssl verifies with the exported public keys"
+run kmtool generate rsa -o rsa.key --purpose sign --digest sha256 --padding pss
+run kmtool generate ec -o ec.key --purpose sign --digest sha256
+run kmtool export rsa.key -o rsa.pem
+run kmtool export ec.key -o ec.pem
+run kmtool sign rsa.key -i README.md -o rsa.sig
+run kmtool sign ec.key -i README.md -o ec.sig
+run openssl dgst -sha256 -sigopt rsa_padding_mode:pss -verify rsa.pem -signature rsa.sig README.md
+run openssl dgst -sha256 -verify ec.pem -signature ec.sig README.md
+
+say "6. The device vouches for a key: an attestation, and what it says"
+run kmtool attest ec.key --challenge c0ffee -o chain.pem
+run kmtool inspect chain.pem
+awk '/BEGIN/ {n++} {print > ("link" n ".pem")}' chain.pem
+run openssl verify -no_check_time -CAfile link2.pem link1.pem
+
+say "7. 100 MB through AES-GCM and back, in bounded memory"
+head -c 100000000 /dev/urandom >big.bin
+run kmtool generate aes -o aes.key --mode gcm
+kmtool encrypt aes.key -i big.bin -o big.enc | sed 's/^/    /'
+kmtool decrypt aes.key -i big.enc -o big.dec | sed 's/^/    /'
+cmp big.bin big.dec
+printf '    the same bytes again\n'
+rm big.bin big.enc big.dec
+
+say "8. The device's OS is updated: keys of the old version want an upgrade"
 run kmtool device set --os-version 130000
 refused kmtool sign known.key -i README.md -o again.mac
 run kmtool upgrade known.key -o upgraded.key
@@ -83,14 +108,14 @@ run kmtool sign upgraded.key -i README.md -o again.mac
 same "$(hex again.mac)" "$ours" "the MACs before and after the upgrade"
 printf '    the same MAC as before\n'
 
-say "6. A restart: a new boot, and the old blob still opens"
+say "9. A restart: a new boot, and the old blob still opens"
 run kmtool device reboot
 run kmtool upgrade known.key -o after-restart.key
 run kmtool sign after-restart.key -i README.md -o restart.mac
 same "$(hex restart.mac)" "$ours" "the MACs before and after the restart"
 printf '    the same MAC again\n'
 
-say "7. One bit of a blob is changed: it is no key any more"
+say "10. One bit of a blob is changed: it is no key any more"
 cp upgraded.key damaged.key
 byte=$(od -An -tu1 -j 200 -N 1 damaged.key)
 printf "\\x$(printf %x $((byte ^ 1)))" | dd of=damaged.key bs=1 seek=200 conv=notrunc status=none

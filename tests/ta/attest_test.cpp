@@ -83,7 +83,9 @@ std::string time_text(const ASN1_TIME* time) {
 
 // The content octets of extension `id` of a certificate, in hex.
 bytes extension_value(const certificate& from, const char* id) {
-  const int index = X509_get_ext_by_OBJ(from.get(), OBJ_txt2obj(id, 1), -1);
+  const std::unique_ptr<ASN1_OBJECT, decltype(&ASN1_OBJECT_free)> object(OBJ_txt2obj(id, 1),
+                                                                         ASN1_OBJECT_free);
+  const int index = X509_get_ext_by_OBJ(from.get(), object.get(), -1);
   if (index < 0) return {};
   const ASN1_OCTET_STRING* value = X509_EXTENSION_get_data(X509_get_ext(from.get(), index));
   const unsigned char* data = ASN1_STRING_get0_data(value);
