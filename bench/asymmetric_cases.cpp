@@ -86,7 +86,8 @@ bench_case sign_case(secure_world* world, const key_pair_ptr& key, scheme how, c
 }
 
 bench_case verify_case(secure_world* world, const key_pair_ptr& key, scheme how, const char* name) {
-  const view made = bare_operation(key->loaded.get(), how, way::SIGN).run(key->message);
+  bare_operation signer(key->loaded.get(), how, way::SIGN);
+  const view made = signer.run(key->message);
   const auto signature = std::make_shared<bytes>(made.begin(), made.end());
   auto secure = std::make_shared<operation>(world, KM_PURPOSE_VERIFY, key->blob, begin_params(how),
                                             key->message, *signature);
@@ -101,7 +102,8 @@ bench_case verify_case(secure_world* world, const key_pair_ptr& key, scheme how,
 }
 
 bench_case decrypt_case(secure_world* world, const key_pair_ptr& key, const char* name) {
-  const view made = bare_operation(key->loaded.get(), scheme::OAEP, way::ENCRYPT).run(key->message);
+  bare_operation sealer(key->loaded.get(), scheme::OAEP, way::ENCRYPT);
+  const view made = sealer.run(key->message);
   const auto sealed = std::make_shared<bytes>(made.begin(), made.end());
   auto secure = std::make_shared<operation>(world, KM_PURPOSE_DECRYPT, key->blob,
                                             begin_params(scheme::OAEP), *sealed);

@@ -14,6 +14,11 @@ using number_ptr = std::unique_ptr<BIGNUM, freed_by<BN_free>>;
 using builder_ptr = std::unique_ptr<OSSL_PARAM_BLD, freed_by<OSSL_PARAM_BLD_free>>;
 using params_ptr = std::unique_ptr<OSSL_PARAM, freed_by<OSSL_PARAM_free>>;
 
+const EVP_MD* sha256() {
+  static const md_ptr fetched(EVP_MD_fetch(nullptr, "SHA256", nullptr));
+  return fetched.get();
+}
+
 uint32_t take_u32(view* rest) {
   uint32_t value = 0;
   memcpy(&value, rest->data(), sizeof(value));
@@ -112,16 +117,14 @@ pkey_ptr ec_pkey(view material) {
 }
 
 bare_operation::bare_operation(EVP_PKEY* key, scheme how, way direction)
-    : direction_(direction),
-      sha256_(EVP_MD_fetch(nullptr, "SHA256", nullptr)),
-      context_(EVP_PKEY_CTX_new_from_pkey(nullptr, key, nullptr)) {
+    : direction_(direction), context_(EVP_PKEY_CTX_new_from_pkey(nullptr, key, nullptr)) {
   must(init(context_.get(), direction) == 1, "init");
-  set_scheme(context_.get(), how, sha256_.get());
+  set_scheme(context_.get(), how, sha256());
 }
 
 view bare_operation::hash(view message) {
   unsigned length = 0;
-  must(EVP_Digest(message.data(), message.size(), digest_, &length, sha256_.get(), nullptr) == 1,
+  must(EVP_Digest(message.data(), message.size(), digest_, &length, sha256(), nullptr) == 1,
        "EVP_Digest");
   return {digest_, length};
 }

@@ -32,7 +32,6 @@ class bare_operation {
   view hash(view message);
 
   way direction_;
-  md_ptr sha256_;
   pkey_ctx_ptr context_;
   uint8_t digest_[EVP_MAX_MD_SIZE];
   uint8_t output_[1024];

@@ -94,7 +94,7 @@ class EntryPoints : public testing::Test {
   void destroy() { entry<void()>("TA_DestroyEntryPoint")(); }
   TEE_Result invoke(uint32_t id, uint32_t types, TEE_Param* params) {
     return entry<decltype(TA_InvokeCommandEntryPoint)>("TA_InvokeCommandEntryPoint")(nullptr, id,
-                                                                                    types, params);
+                                                                                     types, params);
   }
 
   ta_under_test ta;

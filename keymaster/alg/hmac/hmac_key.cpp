@@ -84,7 +84,7 @@ TEE_Result normalise(byte_view key, const hmac_hash_t& hash, byte_span block) {
     copy_bytes(block, key);
     return TEE_SUCCESS;
   }
-  constexpr trace_site at{"hash", __LINE__};
+  const trace_site at{"hash", __LINE__};
   tee_operation digest;
   size_t length = 0;
   if (TEE_Result res = digest.allocate(hash.digest_algorithm, TEE_MODE_DIGEST, 0, at)) return res;

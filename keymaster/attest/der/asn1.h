@@ -30,10 +30,10 @@ constexpr uint32_t ASN1_EXPLICIT = 0x80000000;
 // asn1_field: one row of a record's template, in encoding order. A field whose presence byte is
 // zero is written as `fallback`, or left out when there is none.
 struct asn1_field {
-  size_t offset;
-  uint32_t tag;
-  const asn1_type* type;
-  size_t presence;  // offset of the presence byte, or ASN1_ALWAYS
+  size_t offset = 0;
+  uint32_t tag = ASN1_NO_TAG;
+  const asn1_type* type = nullptr;
+  size_t presence = 0;  // offset of the presence byte, or ASN1_ALWAYS
   const void* fallback = nullptr;
 };
 constexpr size_t ASN1_ALWAYS = SIZE_MAX;
@@ -202,6 +202,7 @@ extern const asn1_type ASN1_BIT_STRING_TYPE;
 extern const asn1_type ASN1_OID_TYPE;  // const ASN1_OID* in memory
 extern const asn1_type ASN1_TIME_TYPE;
 
+// NOLINTBEGIN(bugprone-macro-parentheses): the arguments are type names
 // Every record type X has X_TYPE, X_alloc (null, traced, when out of memory), X_free and X_write,
 // which encodes to the start of a buffer and returns the length or a negative code.
 #define KM_DECLARE_ASN1_OPERATIONS(type)                                \
@@ -227,5 +228,6 @@ extern const asn1_type ASN1_TIME_TYPE;
 #define KM_DEFINE_ASN1_RECORD(type, operations)   \
   const asn1_type type##_TYPE = operations::TYPE; \
   KM_DEFINE_ASN1_OPERATIONS(type)
+// NOLINTEND(bugprone-macro-parentheses)
 
 }  // namespace keymaster
