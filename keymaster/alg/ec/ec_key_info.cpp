@@ -1,4 +1,5 @@
 // The subject public key of an EC key's certificate (RFC 5480): named curve, uncompressed point.
+#include "keymaster/alg/big_endian.h"
 #include "keymaster/alg/ec/ec.h"
 #include "keymaster/alg/key_record.h"
 #include "keymaster/attest/der/oids.h"
@@ -26,8 +27,7 @@ const ASN1_OID* curve_oid(uint32_t key_bits) {
 
 // Right-aligns a number in `room`, which is zero. False when it does not fit.
 bool put_coordinate(byte_view number, byte_span room) {
-  while (!number.empty() && number[0] == 0)
-    number = number.subspan(1);
+  number = without_leading_zeros(number);
   if (number.size() > room.size()) return false;
   copy_bytes(room.last(number.size()), number);
   return true;
