@@ -168,13 +168,41 @@ TEST_F(sessions, calls_from_many_threads_take_turns) {
   EXPECT_EQ(count(user), 2001u);
 }
 
+// Each identity calls the other from a thread of its own, so that they keep meeting halfway.
+TEST_F(sessions, callers_that_wait_for_each_other_are_told_and_never_hang) {
+  client first(made.path(), echo::FIRST);
+  client second(made.path(), echo::SECOND);
+  host::set_trace_level(0);
+  auto call = [](client& from, const TEE_UUID& other) {
+    for (int calls = 0; calls < 2000; calls++) {
+      TEE_UUID path = other;
+      char identity[64];
+      TEEC_Operation operation{};
+      operation.paramTypes = TEEC_PARAM_TYPES(TEEC_MEMREF_TEMP_INPUT, TEEC_MEMREF_TEMP_OUTPUT,
+                                              TEEC_VALUE_OUTPUT, TEEC_NONE);
+      operation.params[0].tmpref = {&path, sizeof(path)};
+      operation.params[1].tmpref = {identity, sizeof(identity)};
+      TEEC_Result res = from.invoke(echo::RELAY, &operation);
+      EXPECT_TRUE(res == TEEC_SUCCESS || res == TEEC_ERROR_BUSY) << res;
+    }
+  };
+  std::thread other([&] { call(second, echo::FIRST); });
+  call(first, echo::SECOND);
+  other.join();
+  host::set_trace_level(TEE_TRACE_ERROR);
+  for (const TEE_UUID& ta : {echo::FIRST, echo::SECOND}) {
+    host::live_counts counts;
+    ASSERT_TRUE(host::counts_of(ta, &counts));
+    EXPECT_EQ(counts, host::live_counts{});
+  }
+}
+
 TEST_F(sessions, the_authenticator_issues_tokens_for_the_boot) {
   constexpr TEE_UUID AUTHENTICATOR = {
       0x2d8c6b71, 0xf45a, 0x4309, {0x86, 0xe2, 0x93, 0xb1, 0xd0, 0x7c, 0xa5, 0xfe}};
   client user(made.path(), AUTHENTICATOR);
-  std::string request = "challengeuser_id_authenticatype";
-  request = "CHALLENGUSER__IDAUTH__ID\x02\x01\x00\x00" + std::string(2, '\0');
-  request.resize(28);
+  std::string request = "CHALLENGUSER__IDAUTH__ID\x02\x01";
+  request.resize(28);  // the rest of the type is zero
   std::string token(70, '#');
   struct {
     size_t in, out;
