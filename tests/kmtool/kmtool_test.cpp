@@ -59,6 +59,11 @@ TEST_F(Kmtool, SignsWhatOthersRecompute) {
   EXPECT_EQ(box.run({"sign", "k", "-i", "m", "-o", "-"}).out.size(), 32u);
   EXPECT_EQ(box.run({"sign", "k", "-i", "m", "-o", "s"}).exit_code, DONE);
   EXPECT_EQ(box.read("s"), box.run({"sign", "k", "-i", "m", "-o", "-"}).out);
+
+  std::filesystem::create_symlink("later", box.path("link"));
+  EXPECT_EQ(box.run({"sign", "k", "-i", "m", "-o", "link"}).exit_code, DONE);
+  EXPECT_EQ(box.read("later").size(), 32u);
+  EXPECT_TRUE(std::filesystem::is_symlink(box.path("link")));
 }
 
 TEST_F(Kmtool, WrongUsageAndUnreadableInputExitWithTwoAndWriteNothing) {

@@ -26,6 +26,16 @@ mode_t mode_of(access mode) {
   return 0666 & ~mask;
 }
 
+// The file that a path leads to; it need not be there yet. A circle of links ends at one of them.
+std::string target_of(std::filesystem::path path) {
+  constexpr int MAX_LINKS = 40;
+  std::error_code error;
+  for (int links = 0; links < MAX_LINKS && std::filesystem::is_symlink(path, error); ++links) {
+    path = path.parent_path() / std::filesystem::read_symlink(path, error);
+  }
+  return path;
+}
+
 // Makes the new name durable; a folder that cannot be synchronised is no reason to call the write
 // failed, since the file is there.
 void sync_folder_of(const std::string& path) {
@@ -47,7 +57,7 @@ output_file::output_file(const std::string& path, access mode)
     if (S_ISDIR(status.st_mode)) throw failure(WRONG_USAGE, path + " is a folder");
     fd_ = open(path.c_str(), O_WRONLY | O_CLOEXEC);
   } else {
-    target_ = std::filesystem::exists(path) ? std::filesystem::canonical(path).string() : path;
+    target_ = target_of(path);
     temporary_ = target_ + ".XXXXXX";
     fd_ = mkostemp(temporary_.data(), O_CLOEXEC);
   }
