@@ -218,6 +218,7 @@ TEST_F(Ec, KeysAreDescribedAndExported) {
     bytes trailing = row.data();
     trailing.push_back(9);
     const bytes taken = ta.import(any_use(), trailing);
+    EXPECT_EQ(generated.size(), taken.size()) << "records of one size";
     for (const auto& [blob, origin] :
          {std::pair(generated, KM_ORIGIN_GENERATED), {taken, KM_ORIGIN_IMPORTED}}) {
       const param_set found = ta.characteristics(blob);

@@ -271,6 +271,28 @@ TEST_F(Rsa, BeginWantsOnePaddingAndOneDigest) {
   }
 }
 
+// Authorisation asks which digest an operation will use: OAEP and signatures have one.
+TEST_F(Rsa, KeysAreUsedWithTheirDigestsAlone) {
+  const param_set key = without(any_use(), KM_TAG_DIGEST).add(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256);
+  const bytes blob = ta.import(key, key_1024().import_data());
+  const struct {
+    uint32_t purpose;
+    scheme how;
+    bool authorized;
+  } rows[] = {{KM_PURPOSE_DECRYPT, {KM_PAD_RSA_OAEP, KM_DIGEST_SHA1}, false},
+              {KM_PURPOSE_DECRYPT, OAEP_SHA256, true},
+              {KM_PURPOSE_DECRYPT, PKCS1_ENCRYPT, true},
+              {KM_PURPOSE_SIGN, PKCS1_SHA1, false},
+              {KM_PURPOSE_SIGN, {KM_PAD_RSA_PSS, KM_DIGEST_SHA_2_256}, true},
+              {KM_PURPOSE_SIGN, RAW, false}};
+  for (const auto& row : rows) {
+    const reply begun = ta.begin(row.purpose, blob, use(row.how));
+    EXPECT_TRUE(refused(begun, row.authorized ? 0 : -13)) << row.how.padding;
+    EXPECT_EQ(ta.trace().has("begin: Authorization failed"), !row.authorized);
+    if (begun.ok()) ta.abort(begun.b);
+  }
+}
+
 TEST_F(Rsa, NewKeysAreChecked) {
   const std::string no_exponent = "No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified";
   const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
