@@ -146,6 +146,12 @@ void bare_operation::verify(view message, view signature) {
        "EVP_PKEY_verify");
 }
 
+void take_apart(EVP_PKEY* key) {
+  OSSL_PARAM* numbers = nullptr;
+  must(EVP_PKEY_todata(key, EVP_PKEY_KEYPAIR, &numbers) == 1, "EVP_PKEY_todata");
+  OSSL_PARAM_free(numbers);
+}
+
 bare_generator::bare_generator(const char* type)
     : context_(EVP_PKEY_CTX_new_from_name(nullptr, type, nullptr)) {
   must(EVP_PKEY_keygen_init(context_.get()) == 1, "EVP_PKEY_keygen_init");

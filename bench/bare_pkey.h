@@ -37,6 +37,9 @@ class bare_operation {
   uint8_t output_[1024];
 };
 
+// take_apart: reads all numbers of a key pair, as storing it takes, and drops them.
+void take_apart(EVP_PKEY* key);
+
 // bare_generator: makes key pairs of one kind.
 class bare_generator {
  public:

@@ -4,6 +4,7 @@
 
 #include "tee_internal_api.h"
 
+#include <optional>
 #include <string>
 
 #include "client/session.h"
@@ -14,7 +15,7 @@ using client::byte_view;
 using client::bytes;
 using client::param_set;
 
-// bytes_of: a field's bytes over and over, for inputs of any length.
+// pattern: bytes that differ from each other, as input or key.
 bytes pattern(size_t length);
 
 class secure_world {

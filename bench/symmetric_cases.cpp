@@ -1,6 +1,7 @@
 // HMAC and AES, and what handling a blob costs.
 #include <algorithm>
 #include <cstring>
+#include <memory>
 #include <stdexcept>
 
 #include "bench/bare.h"
