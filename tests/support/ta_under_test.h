@@ -21,6 +21,7 @@
 #include "client/session.h"
 #include "support/trace_capture.h"
 #include "tee/device/device.h"
+#include "tee/device/object_name.h"
 #include "tee/runtime/host_control.h"
 
 namespace keymaster::test {
@@ -42,6 +43,12 @@ constexpr TEE_UUID DEVICE_ID = {
     0x00112233, 0x4455, 0x6677, {0x88, 0x99, 0xaa, 0xbb, 0xcc, 0xdd, 0xee, 0xff}};
 constexpr TEE_UUID KEYMASTER_TA = {
     0xc1f6d2a8, 0x3b0e, 0x4f57, {0x9a, 0x6d, 0x2e, 0x8b, 0x77, 0x40, 0xd3, 0xf1}};
+
+// Where the TA keeps its key storage key on a device with replay-protected storage.
+inline const tee::object_name KSK_OBJECT = {
+    TEE_STORAGE_RPMB,
+    tee::to_bytes(KEYMASTER_TA),
+    {'K', 'e', 'y', 'm', 'a', 's', 't', 'e', 'r', ' ', 'K', 'S', 'K', 0}};
 
 // What the output buffer holds before a command.
 constexpr uint8_t UNTOUCHED = 0xC3;
