@@ -49,7 +49,7 @@ void object_store::create(const std::string& folder) {
   database::create(folder + "/storage.db", SCHEMA);
 }
 
-object_store::object_store(std::string folder, const device_key& key, bool has_rpmb)
+object_store::object_store(const std::string& folder, const device_key& key, bool has_rpmb)
     : path_(folder + "/storage.db"),
       content_key_(derive_key(key, "object content")),
       has_rpmb_(has_rpmb),

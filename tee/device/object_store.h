@@ -33,7 +33,7 @@ class object_store {
 
   // The store in `folder`, of a device with that key. Throws device_error: DAMAGED when the replay
   // table is not authentic. A missing database only shows in the calls.
-  object_store(std::string folder, const device_key& key, bool has_rpmb);
+  object_store(const std::string& folder, const device_key& key, bool has_rpmb);
 
   // make_rpmb: makes the replay-protected storage if the device has one and it is not made yet.
   void make_rpmb();

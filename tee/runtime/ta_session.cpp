@@ -15,6 +15,14 @@ TEE_Result report_cycle(ta_instance& target) {
   return TEE_ERROR_BUSY;
 }
 
+// Runs the create entry point when it has not run; an instance that fails it is forgotten.
+TEE_Result create_if_new(ta_host& host, const std::shared_ptr<ta_instance>& target) {
+  if (target->progress() != ta_instance::stage::LOADED) return TEE_SUCCESS;
+  TEE_Result res = target->create();
+  if (res != TEE_SUCCESS) host.drop(target);
+  return res;
+}
+
 }  // namespace
 
 TEE_Result ta_session::open(ta_host& host, const TEE_UUID& destination, const TEE_Identity& client,
@@ -31,12 +39,7 @@ TEE_Result ta_session::open(ta_host& host, const TEE_UUID& destination, const TE
     if (target->progress() == ta_instance::stage::FAILED) continue;
 
     *origin = TEE_ORIGIN_TRUSTED_APP;
-    if (target->progress() == ta_instance::stage::LOADED) {
-      if (TEE_Result res = target->create()) {
-        host.drop(target);
-        return res;
-      }
-    }
+    if (TEE_Result res = create_if_new(host, target)) return res;
     if (TEE_Result res = target->open_session(types, params, &made->context_)) return res;
     made->open_ = true;
     *session = std::move(made);
