@@ -175,7 +175,7 @@ void ta_under_test::inspect_freed(void* self, tee::host::block_stage stage, cons
   if (stage != tee::host::block_stage::RELEASED) return;
   const byte_view freed(block, size);
   for (const bytes& secret : static_cast<ta_under_test*>(self)->secrets_) {
-    EXPECT_TRUE(std::ranges::search(freed, secret).empty())
+    EXPECT_EQ(std::search(freed.begin(), freed.end(), secret.begin(), secret.end()), freed.end())
         << "a block of " << size << " bytes was freed with a secret in it";
   }
 }

@@ -23,8 +23,6 @@ class trace_capture {
   // errors: the lines of level 1, each "function: message", joined with " | ".
   std::string errors() const;
 
-  // all: every line, in the same form.
-  const std::vector<std::string>& all() const { return lines_; }
   void clear();
 
  private:

@@ -151,7 +151,7 @@ TEST_F(ParamSet, SurvivesEveryFailedAllocation) {
 
 TEST_F(ParamSet, NeverTrustsACount) {
   const struct {
-    const char* input;
+    std::string_view input;
     TEE_Result res;
     const char* message;
   } cases[] = {
@@ -164,6 +164,7 @@ TEST_F(ParamSet, NeverTrustsACount) {
   for (const auto& c : cases) {
     keymaster_key_param_set_t set;
     EXPECT_EQ(unmarshal(from_hex(c.input), &set), c.res) << c.input;
+    EXPECT_LE(platform::largest_request, c.input.size());
     EXPECT_TRUE(last_line().ends_with(std::string(": ") + c.message + "\n")) << last_line();
   }
   EXPECT_EQ(unmarshal(from_hex(THREE), nullptr), TEE_ERROR_SHORT_BUFFER);

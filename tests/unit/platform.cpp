@@ -9,6 +9,7 @@ namespace platform {
 size_t live_blocks;
 size_t unwiped_blocks;
 int allocations_to_fail;
+size_t largest_request;
 uint32_t trace_threshold;
 uint32_t trace_thread;
 std::vector<std::string> trace_lines;
@@ -18,7 +19,7 @@ std::map<void*, size_t> sizes;
 }  // namespace
 
 void reset() {
-  live_blocks = unwiped_blocks = 0;
+  live_blocks = unwiped_blocks = largest_request = 0;
   allocations_to_fail = 0;
   trace_threshold = TEE_TRACE_DEBUG;
   trace_thread = 0x2a;
@@ -30,6 +31,7 @@ void reset() {
 using namespace platform;
 
 void* TEE_Malloc(size_t size, uint32_t) {
+  largest_request = std::max(largest_request, size);
   if (allocations_to_fail > 0 && --allocations_to_fail == 0) return nullptr;
   void* block = std::calloc(size, 1);
   sizes[block] = size;

@@ -13,6 +13,7 @@ namespace platform {
 extern size_t live_blocks;        // of TEE_Malloc
 extern size_t unwiped_blocks;     // freed with something other than zeros in them
 extern int allocations_to_fail;   // the how-manieth allocation from now fails, once; 0: none
+extern size_t largest_request;    // in bytes
 extern uint32_t trace_threshold;  // TEE_TRACE_
 extern uint32_t trace_thread;
 extern std::vector<std::string> trace_lines;
