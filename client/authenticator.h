@@ -3,12 +3,11 @@
 
 #include "client/connection.h"
 #include "client/session.h"
+#include "product/uuids.h"
 
 namespace keymaster::client {
 
-// 2d8c6b71-f45a-4309-86e2-93b1d07ca5fe
-constexpr TEEC_UUID AUTHENTICATOR_UUID = {
-    0x2d8c6b71, 0xf45a, 0x4309, {0x86, 0xe2, 0x93, 0xb1, 0xd0, 0x7c, 0xa5, 0xfe}};
+constexpr TEEC_UUID AUTHENTICATOR_UUID = AUTHENTICATOR_TA_UUID;
 
 constexpr size_t AUTH_TOKEN_LENGTH = 69;
 

@@ -7,12 +7,11 @@
 
 #include "client/connection.h"
 #include "client/param_set.h"
+#include "product/uuids.h"
 
 namespace keymaster::client {
 
-// c1f6d2a8-3b0e-4f57-9a6d-2e8b7740d3f1
-constexpr TEEC_UUID KEYMASTER_UUID = {
-    0xc1f6d2a8, 0x3b0e, 0x4f57, {0x9a, 0x6d, 0x2e, 0x8b, 0x77, 0x40, 0xd3, 0xf1}};
+constexpr TEEC_UUID KEYMASTER_UUID = KEYMASTER_TA_UUID;
 
 enum class command : uint32_t {
   GENERATE_KEY = 13,

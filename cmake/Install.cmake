@@ -13,6 +13,7 @@ if(TARGET keymaster_client)
   install(TARGETS keymaster_client EXPORT keymaster ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR})
   install(DIRECTORY client DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster
           FILES_MATCHING PATTERN "*.h")
+  install(FILES product/uuids.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster/product)
   install(FILES keymaster/params/tags.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster/params)
   target_include_directories(keymaster_client INTERFACE
       $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>

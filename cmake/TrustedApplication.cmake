@@ -3,7 +3,8 @@
 # ta_library(NAME SOURCES file... [LIBRARIES target...])
 #   A static library of TA code: no exceptions, no RTTI, no hidden runtime.
 # trusted_application(NAME UUID uuid LIBRARIES target... [SOURCES file...])
-#   The shared object ta/<uuid>.ta that exports the five TA_ entry points (host builds only).
+#   The shared object ta/<uuid>.ta that exports the five TA_ entry points (host builds only). The
+#   uuid is written out or is a name of product/uuids.h.
 
 set(TA_COMPILE_OPTIONS
     $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions> $<$<COMPILE_LANGUAGE:CXX>:-fno-rtti>
@@ -30,8 +31,27 @@ function(ta_library name)
   target_link_libraries(${name} PUBLIC ${ARG_LIBRARIES})
 endfunction()
 
+# The text of a UUID that product/uuids.h defines under `name`, from the numbers that it gives there.
+set(PRODUCT_UUIDS ${CMAKE_CURRENT_LIST_DIR}/../product/uuids.h)
+set_property(DIRECTORY ${PROJECT_SOURCE_DIR} APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${PRODUCT_UUIDS})
+function(product_uuid name result)
+  file(READ ${PRODUCT_UUIDS} header)
+  if(NOT header MATCHES "define ${name} [^{]*{([^{]+){([^}]+)}}")
+    message(FATAL_ERROR "product/uuids.h does not define ${name}")
+  endif()
+  string(REGEX REPLACE "0x|[ ,\n]" "" digits "${CMAKE_MATCH_1}${CMAKE_MATCH_2}")
+  if(NOT digits MATCHES "^(........)(....)(....)(....)(............)$")
+    message(FATAL_ERROR "product/uuids.h: ${name} must give every number in full")
+  endif()
+  set(${result} ${CMAKE_MATCH_1}-${CMAKE_MATCH_2}-${CMAKE_MATCH_3}-${CMAKE_MATCH_4}-${CMAKE_MATCH_5}
+      PARENT_SCOPE)
+endfunction()
+
 function(trusted_application name)
   cmake_parse_arguments(ARG "" "UUID" "SOURCES;LIBRARIES" ${ARGN})
+  if(ARG_UUID MATCHES "^[A-Z_]+$")
+    product_uuid(${ARG_UUID} ARG_UUID)
+  endif()
   add_library(${name} MODULE ${ARG_SOURCES})
   target_compile_options(${name} PRIVATE ${TA_COMPILE_OPTIONS})
   target_link_libraries(${name} PRIVATE ${ARG_LIBRARIES} teec ${TA_LINK_LIBRARIES})

@@ -19,6 +19,7 @@
 
 #include "client/authenticator.h"
 #include "client/session.h"
+#include "product/uuids.h"
 #include "support/trace_capture.h"
 #include "tee/device/device.h"
 #include "tee/device/object_name.h"
@@ -41,8 +42,7 @@ constexpr uint64_t START_REE_MS = 1'700'000'000'500;
 // open for ever.
 constexpr TEE_UUID DEVICE_ID = {
     0x00112233, 0x4455, 0x6677, {0x88, 0x99, 0xaa, 0xbb, 0xcc, 0xdd, 0xee, 0xff}};
-constexpr TEE_UUID KEYMASTER_TA = {
-    0xc1f6d2a8, 0x3b0e, 0x4f57, {0x9a, 0x6d, 0x2e, 0x8b, 0x77, 0x40, 0xd3, 0xf1}};
+constexpr TEE_UUID KEYMASTER_TA = KEYMASTER_TA_UUID;
 
 // Where the TA keeps its key storage key on a device with replay-protected storage.
 inline const tee::object_name KSK_OBJECT = {

@@ -8,6 +8,7 @@
 #include <thread>
 #include <unistd.h>
 
+#include "product/uuids.h"
 #include "tee/device/clock.h"
 #include "tests/tee/client.h"
 #include "tests/tee/ta_echo/echo_ta.h"
@@ -198,8 +199,7 @@ TEST_F(sessions, callers_that_wait_for_each_other_are_told_and_never_hang) {
 }
 
 TEST_F(sessions, the_authenticator_issues_tokens_for_the_boot) {
-  constexpr TEE_UUID AUTHENTICATOR = {
-      0x2d8c6b71, 0xf45a, 0x4309, {0x86, 0xe2, 0x93, 0xb1, 0xd0, 0x7c, 0xa5, 0xfe}};
+  constexpr TEE_UUID AUTHENTICATOR = AUTHENTICATOR_TA_UUID;
   client user(made.path(), AUTHENTICATOR);
   std::string request = "CHALLENGUSER__IDAUTH__ID\x02\x01";
   request.resize(28);  // the rest of the type is zero
