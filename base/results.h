@@ -18,7 +18,11 @@ namespace keymaster {
 
 // KM_REFUSE(code, format, ...): traces at error level; the value is the Keymaster code itself. For
 // checks that have no TEE result.
-#define KM_REFUSE(code, ...) (TRACE_ERROR(__VA_ARGS__), static_cast<int32_t>(code))
+#define KM_REFUSE(code, ...) KM_REFUSE_AT(::keymaster::trace_site::here(), code, __VA_ARGS__)
+
+// KM_REFUSE_AT(at, code, format, ...): the same under the caller's function and line.
+#define KM_REFUSE_AT(at, code, ...) \
+  (::keymaster::trace(TEE_TRACE_ERROR, at, __VA_ARGS__), static_cast<int32_t>(code))
 
 // failed: whether a call with both results failed. 0 is success in both.
 [[nodiscard]] constexpr bool failed(TEE_Result res, int32_t km_error) {

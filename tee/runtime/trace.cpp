@@ -36,8 +36,8 @@ uint32_t TEE_TraceThreshold() {
 }
 
 uint32_t TEE_TraceThread() {
-  thread_local const auto id = static_cast<uint32_t>(gettid());
-  return id;
+  thread_local const auto THREAD = static_cast<uint32_t>(gettid());
+  return THREAD;
 }
 
 void TEE_TraceWrite(uint32_t level, const char* line, size_t length) {

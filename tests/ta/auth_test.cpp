@@ -62,12 +62,12 @@ param_set aes_request(uint32_t mode, const param_set& more = {}) {
 }
 
 const param_set OWN_NONCE = aes_request(KM_MODE_CBC).add_bytes(KM_TAG_NONCE, bytes(16));
-constexpr char NOT_YET[] = "check_active: Key not yet valid";
-constexpr char EXPIRED[] = "check_expiry: Key expired";
-constexpr char TOO_SOON[] = "check_rate_limit: key rate limit exceeded";
+constexpr char NOT_YET[] = "authorize_begin: Key not yet valid";
+constexpr char EXPIRED[] = "authorize_begin: Key expired";
+constexpr char TOO_SOON[] = "authorize_begin: key rate limit exceeded";
 constexpr char USED_UP[] = "check_use_count_and_add: Key max ops exceeded";
 constexpr char BAD_MAC[] = "check_auth_token_valid: Wrong auth token MAC";
-const std::string NOT_MET = "check_begin_auth: Auth token check failed";
+const std::string NOT_MET = "authorize_begin: Auth token check failed";
 
 class auth : public testing::Test {
  protected:
@@ -103,24 +103,24 @@ struct begin_case {
 };
 
 const begin_case BEGINS[] = {
-    {"purpose", -3, "check_allowed: No such purpose in key_params", hmac_key()},
-    {"digest", -13, "check_allowed: No such digest in key_params", sign_key(),
+    {"purpose", -3, "authorize_begin: No such purpose in key_params", hmac_key()},
+    {"digest", -13, "authorize_begin: No such digest in key_params", sign_key(),
      one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_512).add(KM_TAG_MAC_LENGTH, 128)},
     {"no digest", 0, "", sign_key(), one(KM_TAG_MAC_LENGTH, 128)},
-    {"padding", -11, "check_allowed: No such padding in key_params", aes_key(KM_MODE_CBC),
+    {"padding", -11, "authorize_begin: No such padding in key_params", aes_key(KM_MODE_CBC),
      aes_request(KM_MODE_CBC, one(KM_TAG_PADDING, KM_PAD_PKCS7)), ENCRYPT},
-    {"block mode", -8, "check_allowed: No such block mode in key_params", aes_key(KM_MODE_ECB),
+    {"block mode", -8, "authorize_begin: No such block mode in key_params", aes_key(KM_MODE_ECB),
      aes_request(KM_MODE_CBC), ENCRYPT},
-    {"nonce", -55, "check_caller_nonce: Caller nonce prohibited", aes_key(KM_MODE_CBC), OWN_NONCE,
+    {"nonce", -55, "authorize_begin: Caller nonce prohibited", aes_key(KM_MODE_CBC), OWN_NONCE,
      ENCRYPT},
     {"nonce allowed", 0, "", aes_key(KM_MODE_CBC, one(KM_TAG_CALLER_NONCE, 1)), OWN_NONCE, ENCRYPT},
     {"no methods", -2, "begin: Algorithm HMAC purpose 0 not implemented",
      signer(KM_TAG_PURPOSE, ENCRYPT), sign_request(), ENCRYPT},
     {"no such purpose", -2, "begin: Algorithm HMAC purpose 4 not implemented",
      signer(KM_TAG_PURPOSE, 4), sign_request(), 4},
-    {"MAC length", -57, "check_mac_length: MAC length 120 below the key's minimum 128", sign_key(),
+    {"MAC length", -57, "authorize_begin: MAC length 120 below the key's minimum 128", sign_key(),
      one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256).add(KM_TAG_MAC_LENGTH, 120)},
-    {"tag length", -57, "check_mac_length: MAC length 96 below the key's minimum 128",
+    {"tag length", -57, "authorize_begin: MAC length 96 below the key's minimum 128",
      aes_key(KM_MODE_GCM, one(KM_TAG_MIN_MAC_LENGTH, 128)),
      aes_request(KM_MODE_GCM, one(KM_TAG_MAC_LENGTH, 96)), ENCRYPT},
     {"active now", 0, "", signer(KM_TAG_ACTIVE_DATETIME, NOW)},
@@ -137,17 +137,17 @@ const begin_case BEGINS[] = {
     {"usage over", -25, EXPIRED, signer(KM_TAG_USAGE_EXPIRE_DATETIME, NOW - 1), sign_request(),
      KM_PURPOSE_VERIFY},
     {"no usage", 0, "", signer(KM_TAG_USAGE_EXPIRE_DATETIME, 1)},
-    {"bootloader", -33, "check_param: Bootloader only key",
+    {"bootloader", -33, "authorize_begin: Bootloader only key",
      sign_key(one(KM_TAG_BOOTLOADER_ONLY, 1).add(KM_TAG_ACTIVE_DATETIME, NOW + 1))},
     {"the first decides", -24, NOT_YET,
      sign_key(one(KM_TAG_ACTIVE_DATETIME, NOW + 1).add(KM_TAG_BOOTLOADER_ONLY, 1))},
     {"user and no user", -38,
-     "check_secure_id: Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED",
+     "authorize_begin: Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED",
      user_key(1).add(KM_TAG_NO_AUTH_REQUIRED, 1)},
-    {"no type", -38, "check_secure_id: Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE",
+    {"no type", -38, "authorize_begin: Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE",
      signer(KM_TAG_USER_SECURE_ID, USER)},
     {"timeout", -26, NOT_MET, user_key(1).add(KM_TAG_AUTH_TIMEOUT, UINT32_MAX)},
-    {"due, but refused later", -55, "check_caller_nonce: Caller nonce prohibited",
+    {"due, but refused later", -55, "authorize_begin: Caller nonce prohibited",
      aes_key(KM_MODE_CBC, one(KM_TAG_USER_SECURE_ID, USER).add(KM_TAG_USER_AUTH_TYPE, 1)),
      OWN_NONCE, ENCRYPT},
 };
@@ -210,7 +210,7 @@ TEST_F(auth, uses_are_counted_even_when_the_begin_is_refused_later) {
     SCOPED_TRACE(maximum);
     const bytes key = ta.generate(signer(KM_TAG_MAX_USES_PER_BOOT, maximum));
     expect_begin(SIGN, key, one(KM_TAG_DIGEST, KM_DIGEST_SHA1), -13,
-                 "check_allowed: No such digest in key_params");
+                 "authorize_begin: No such digest in key_params");
     if (maximum == 2) expect_sign(key);
     expect_sign(key, -56, USED_UP);
   }
@@ -324,7 +324,7 @@ TEST_F(auth, operation_wants_its_own_token_at_every_step) {
   const auto token_for = [&](uint64_t challenge) {
     return with_token(ta.token({.user_id = USER, .challenge = challenge}));
   };
-  const std::string missing = "check_operation_auth: Auth token check failed";
+  const std::string missing = "authorize_update_or_finish: Auth token check failed";
   for (const command step : {command::UPDATE, command::FINISH}) {
     const auto expect_refusal = [&](const param_set& brought, int32_t error,
                                     const std::string& lines) {
@@ -340,7 +340,7 @@ TEST_F(auth, operation_wants_its_own_token_at_every_step) {
     expect_refusal(with_token(bytes(69)), -38, BAD_MAC);
   }
   const uint32_t handle = ta.begun(SIGN, key, sign_request());
-  EXPECT_TRUE(ta.trace().has("check_begin_auth: OP AUTH NEEDED"));
+  EXPECT_TRUE(ta.trace().has("authorize_begin: OP AUTH NEEDED"));
   EXPECT_TRUE(succeeded(ta.update(handle, bytes(5), token_for(handle))));
   EXPECT_TRUE(succeeded(ta.finish(handle, {}, token_for(handle))));
 }
