@@ -159,6 +159,8 @@ TEE_Result rsa_sign(key& rsa_key, const algorithm& row, pss_salt salt,
 
 bool rsa_verify(key& rsa_key, const algorithm& row, pss_salt salt, std::span<const uint8_t> digest,
                 std::span<const uint8_t> signature) {
+  // libcrypto takes a shorter PSS signature for the same number.
+  if (signature.size() != modulus_length(rsa_key)) return false;
   pkey_context context(rsa_key, row.id, TEE_MODE_VERIFY, [&](EVP_PKEY_CTX* fresh) {
     return prepare_signature(fresh, row, TEE_MODE_VERIFY);
   });

@@ -33,7 +33,7 @@ using pss_salt = std::optional<uint32_t>;
 [[nodiscard]] TEE_Result rsa_sign(key& rsa_key, const algorithm& row, pss_salt salt,
                                   std::span<const uint8_t> digest, uint8_t* signature);
 
-// rsa_verify: whether the signature, of any length, is good.
+// rsa_verify: whether the signature is good; one of another length than the modulus never is.
 [[nodiscard]] bool rsa_verify(key& rsa_key, const algorithm& row, pss_salt salt,
                               std::span<const uint8_t> digest, std::span<const uint8_t> signature);
 

@@ -159,6 +159,21 @@ TEST_F(rsa, a_signature_of_the_openssl_command) {
   }
 }
 
+// A signature is as long as the modulus (RFC 8017, 8.1.2): without its leading zero, the same number
+// is none. One in 256 begins with a zero.
+TEST_F(rsa, a_signature_keeps_its_leading_zero) {
+  bytes signature{1};
+  for (int tries = 0; tries < 10000 && signature[0] != 0; ++tries) {
+    TEE_Result result = TEE_SUCCESS;
+    signature = sign(TEE_ALG_RSASSA_PKCS1_PSS_MGF1_SHA256, {}, ABC, &result);
+  }
+  ASSERT_EQ(signature[0], 0);
+  EXPECT_EQ(verify(TEE_ALG_RSASSA_PKCS1_PSS_MGF1_SHA256, {}, ABC, signature), TEE_SUCCESS);
+  signature.erase(signature.begin());
+  EXPECT_EQ(verify(TEE_ALG_RSASSA_PKCS1_PSS_MGF1_SHA256, {}, ABC, signature),
+            TEE_ERROR_SIGNATURE_INVALID);
+}
+
 // Every signature algorithm: libcrypto accepts what the platform signs with each salt.
 TEST_F(rsa, libcrypto_accepts_every_kind_of_signature) {
   for (uint32_t n = 0; n < 6; ++n) {
