@@ -118,14 +118,14 @@ constexpr keymaster_tag_t PASSED_OVER[] = {
     KM_TAG_MAC_LENGTH,
     KM_TAG_RESET_SINCE_ID_ROTATION,
     KM_TAG_SOTER_KEY,
-    0x70002AF9,
-    0x70002AFA,
-    0x90002AFB,
-    0x70002AFC,
+    KM_TAG_SOTER_ATTK_SIGNS,
+    KM_TAG_SOTER_KEY_SIGNS,
+    KM_TAG_SOTER_SIGN_KEY_NAME,
+    KM_TAG_SOTER_COUNTER,
     0x70002AFD,
     0x70002AFE,
-    0x30002AFF,
-    0x90002B00,
+    KM_TAG_SOTER_UID,
+    KM_TAG_SOTER_SIGN_KEY_BLOB,
 };
 
 bool passed_over(keymaster_tag_t tag) {

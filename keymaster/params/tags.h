@@ -80,7 +80,13 @@ constexpr bool has_blob(keymaster_tag_t tag) {
   X(KM_TAG_AUTH_TOKEN, KM_BYTES | 1002)                \
   X(KM_TAG_MAC_LENGTH, KM_UINT | 1003)                 \
   X(KM_TAG_RESET_SINCE_ID_ROTATION, KM_BOOL | 1004)    \
-  X(KM_TAG_SOTER_KEY, KM_BOOL | 11000)
+  X(KM_TAG_SOTER_KEY, KM_BOOL | 11000)                 \
+  X(KM_TAG_SOTER_ATTK_SIGNS, KM_BOOL | 11001)          \
+  X(KM_TAG_SOTER_KEY_SIGNS, KM_BOOL | 11002)           \
+  X(KM_TAG_SOTER_SIGN_KEY_NAME, KM_BYTES | 11003)      \
+  X(KM_TAG_SOTER_COUNTER, KM_BOOL | 11004)             \
+  X(KM_TAG_SOTER_UID, KM_UINT | 11007)                 \
+  X(KM_TAG_SOTER_SIGN_KEY_BLOB, KM_BYTES | 11008)
 
 // X(name, value). Failures are negative; 15 is begin's "authentication is still due".
 #define KM_ERROR_LIST(X)                                  \
