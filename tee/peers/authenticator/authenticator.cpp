@@ -17,7 +17,11 @@
 #include <cstdint>
 #include <cstring>
 
+#include "tee/peers/support.h"
+
 namespace {
+
+using peers::wipe;
 
 constexpr uint32_t COMMAND_ISSUE_TOKEN = 1;
 
@@ -37,12 +41,6 @@ constexpr size_t SEED_LENGTH = 32;
 constexpr uint32_t KEY_BITS = 8 * SEED_LENGTH;
 
 TEE_ObjectHandle token_key = TEE_HANDLE_NULL;
-
-void wipe(uint8_t* bytes, size_t length) {
-  volatile uint8_t* target = bytes;
-  while (length-- > 0)
-    *target++ = 0;
-}
 
 void put_big_endian(uint8_t* out, uint64_t value, size_t length) {
   for (size_t i = length; i-- > 0; value >>= 8)
