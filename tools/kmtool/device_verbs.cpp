@@ -1,6 +1,7 @@
-// kmtool device create | show | set | reboot
+// kmtool device create | provision | show | set | reboot
 #include "listing.h"
 #include "options.h"
+#include "soter_factory.h"
 #include "tee/device/device.h"
 #include "tee/device/uuid.h"
 #include "tool.h"
@@ -14,6 +15,7 @@ struct device_options {
   std::string id;
   std::optional<uint32_t> os_version;
   std::optional<uint32_t> os_patchlevel;
+  factory_options factory;
 
   void add_versions_to(CLI::App* verb) {
     add_number(verb, "--os-version", &os_version, "OS version, decimal MMmmss: 120000 is 12.0.0");
@@ -57,8 +59,16 @@ verb_result create_device(const std::string& folder, const device_options& optio
     throw failure(WRONG_USAGE, "--id: '" + options.id + "' is not a UUID",
                   "Its form is 00000000-0000-0000-0000-000000000000.");
   }
+  const keymaster::client::factory_data data = options.factory.data(settings);
   tee::device::create(folder, settings);
+  provision(folder, data);
   return describe("Created the device", folder, settings);
+}
+
+verb_result provision_device(const std::string& folder, const device_options& options) {
+  const tee::device_settings settings = tee::device::read_settings(folder);
+  provision(folder, options.factory.data(settings));
+  return describe("Provisioned the device", folder, settings);
 }
 
 verb_result set_versions(const std::string& folder, const device_options& options) {
@@ -82,13 +92,20 @@ void add_device_verbs(CLI::App* app, command_line* line) {
   CLI::App* verb = app->add_subcommand("device", "Create and administer a device");
   auto options = std::make_shared<device_options>();
 
-  CLI::App* create = verb->add_subcommand("create", "Create the device's folder");
+  CLI::App* create = verb->add_subcommand("create", "Create the device's folder and provision it");
   create->add_flag("--no-rpmb", options->no_rpmb, "A device without replay-protected storage");
   create->add_option("--id", options->id, "The device's identity (default: a random one)")
       ->type_name("UUID");
   options->add_versions_to(create);
+  options->factory.add_to(create);
   create->callback(
       [=] { line->action = [=] { return create_device(line->device_folder(), *options); }; });
+
+  CLI::App* provision = verb->add_subcommand(
+      "provision", "Give a device that has none its SOTER key and properties, as create does");
+  options->factory.add_to(provision);
+  provision->callback(
+      [=] { line->action = [=] { return provision_device(line->device_folder(), *options); }; });
 
   CLI::App* show = verb->add_subcommand("show", "Show the device's settings");
   show->callback([=] {

@@ -24,6 +24,10 @@ verb_result export_public(const std::string& folder, const export_options& optio
   keymaster_device keymaster(folder);
   auto key = keymaster->get_key_characteristics(blob, options.application.get());
   require(key, "cannot open the key");
+  if (key.characteristics.contains(KM_TAG_SOTER_KEY)) {
+    throw failure(WRONG_USAGE, options.key + " is a SOTER key",
+                  "'kmtool soter export' gives the signed document with its public key.");
+  }
   client::data_result exported = keymaster->export_key(blob, options.application.get());
   require(exported, "cannot export the key");
   const uint64_t algorithm = key.characteristics.number(KM_TAG_ALGORITHM).value_or(0);

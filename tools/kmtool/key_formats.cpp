@@ -1,34 +1,21 @@
 // Asymmetric keys in files: libcrypto reads and writes the public formats.
 #include "key_formats.h"
 
-#include <memory>
-#include <openssl/bio.h>
-#include <openssl/bn.h>
 #include <openssl/core_names.h>
-#include <openssl/decoder.h>
 #include <openssl/err.h>
-#include <openssl/evp.h>
 #include <openssl/param_build.h>
 #include <openssl/pem.h>
+#include <openssl/rsa.h>
 #include <openssl/x509.h>
 
 #include "keymaster/params/tags.h"
+#include "libcrypto.h"
 
 namespace kmtool {
 
 using namespace keymaster;
 
 namespace {
-
-struct deleter {
-  void operator()(EVP_PKEY* key) const { EVP_PKEY_free(key); }
-  void operator()(EVP_PKEY_CTX* context) const { EVP_PKEY_CTX_free(context); }
-  void operator()(OSSL_DECODER_CTX* context) const { OSSL_DECODER_CTX_free(context); }
-  void operator()(BIGNUM* number) const { BN_clear_free(number); }
-  void operator()(BIO* bio) const { BIO_free(bio); }
-};
-template <class T>
-using owned = std::unique_ptr<T, deleter>;
 
 struct curve {
   uint32_t bits;
@@ -153,6 +140,12 @@ bytes raw_key_data(uint32_t algorithm, const std::string& path, byte_view conten
     default:
       return client::copy_of(content);
   }
+}
+
+bytes new_rsa_key_data(uint32_t bits) {
+  const owned<EVP_PKEY> key(EVP_RSA_gen(bits));
+  if (!key) throw std::runtime_error("libcrypto cannot make an RSA key");
+  return raw_rsa(key.get(), "the new key");
 }
 
 bytes public_key_der(uint32_t algorithm, byte_view exported) {

@@ -17,6 +17,9 @@ using keymaster::client::bytes;
 // Throws failure (WRONG_USAGE) for a file that is no such key, is encrypted, or is another's.
 bytes raw_key_data(uint32_t algorithm, const std::string& path, byte_view content);
 
+// new_rsa_key_data: a fresh RSA key pair of `bits` with exponent 65537, in the same raw form.
+bytes new_rsa_key_data(uint32_t bits);
+
 // public_key_der: the DER SubjectPublicKeyInfo (RFC 5280) of what export_key gave: RSA keys come in
 // that form, EC keys as u32 key size, X and Y.
 bytes public_key_der(uint32_t algorithm, byte_view exported);

@@ -174,6 +174,10 @@ param_set describe_key(const key_options& options, key_source source) {
     default_size.reset();
     defaults.exponent.reset();
   }
+  if (options.soter.wanted) {
+    defaults.purposes = {KM_PURPOSE_SIGN};
+    defaults.paddings = {KM_PAD_RSA_PSS};
+  }
   description key(std::move(extra));
   key.one(KM_TAG_ALGORITHM, algorithm, {});
   key.one(KM_TAG_KEY_SIZE, options.size, default_size);
@@ -188,6 +192,7 @@ param_set describe_key(const key_options& options, key_source source) {
   key.one(KM_TAG_MIN_MAC_LENGTH, options.min_mac, defaults.min_mac);
   options.application.get().bind(key.set());
   key.user(options);
+  key.set()->append(options.soter.tags(algorithm));
   return key.take();
 }
 

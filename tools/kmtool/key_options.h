@@ -7,6 +7,7 @@
 
 #include "client/param_set.h"
 #include "options.h"
+#include "soter_key_options.h"
 
 namespace kmtool {
 
@@ -23,6 +24,7 @@ struct key_options {
   std::vector<uint32_t> auth_types;
   std::optional<uint32_t> auth_timeout;
   std::vector<std::string> params;  // TAG=VALUE
+  soter_key_options soter;          // of generate alone
 
   void add_to(CLI::App* verb);
 };

@@ -101,6 +101,11 @@ verb_result upgrade(const std::string& folder, const key_verb_options& options) 
   options.application.get().bind(&params);
   keymaster_device keymaster(folder);
   client::key_result made = keymaster->upgrade_key(blob, params);
+  if (made.tee != TEEC_SUCCESS) {
+    throw failure("cannot upgrade the key", made,
+                  "It opens neither here nor with the earlier Keymaster: it is damaged or belongs "
+                  "to another device.");
+  }
   require(made, "cannot upgrade the key");
   verb_result result = stored("Upgraded the key", options.output, made.blob);
   result.object["os_version"] = keymaster.settings().os_version;
@@ -160,6 +165,7 @@ void add_key_verbs(CLI::App* app, command_line* line) {
   {
     auto [verb, options] = add_verb(app, line, "generate", "Generate a key", generate);
     options->add_description_to(verb);
+    options->description.soter.add_to(verb);
     options->add_output_to(verb);
   }
   {

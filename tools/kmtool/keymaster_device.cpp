@@ -7,8 +7,6 @@ namespace kmtool {
 
 namespace client = keymaster::client;
 
-namespace {
-
 failure session_failure(const std::string& application, const client::open_error& error) {
   std::string advice(error.reason().advice());
   if (error.reason().tee == TEEC_ERROR_ITEM_NOT_FOUND) {
@@ -16,6 +14,8 @@ failure session_failure(const std::string& application, const client::open_error
   }
   return {"cannot start the " + application, error.reason(), advice};
 }
+
+namespace {
 
 client::session open_keymaster(const client::context& tee) try {
   return client::session(tee);
@@ -40,6 +40,13 @@ client::bytes issue_token(const client::context& tee, const client::token_reques
   return token.data;
 } catch (const client::open_error& error) {
   throw session_failure("authenticator", error);
+}
+
+void report_fingerprint(const keymaster_device& keymaster, uint32_t fid) try {
+  require(client::fingerprint_sensor(keymaster.context()).report_match(fid),
+          "the fingerprint was not accepted");
+} catch (const client::open_error& error) {
+  throw session_failure("fingerprint application", error);
 }
 
 keymaster_device::keymaster_device(const std::string& folder)

@@ -5,13 +5,18 @@
 
 #include "client/authenticator.h"
 #include "client/session.h"
+#include "client/soter.h"
 #include "tee/device/device.h"
+#include "tool.h"
 
 namespace kmtool {
 
 // open_device: a context on the device in `folder`. Throws failure, or tee::device_error with the
 // reason in words when the folder cannot be opened.
 keymaster::client::context open_device(const std::string& folder);
+
+// session_failure: that a trusted application of the device cannot be reached.
+failure session_failure(const std::string& application, const keymaster::client::open_error& error);
 
 // issue_token: a token from the device's authenticator. Throws failure.
 keymaster::client::bytes issue_token(const keymaster::client::context& tee,
@@ -34,5 +39,9 @@ class keymaster_device {
   keymaster::client::context context_;
   keymaster::client::session session_;
 };
+
+// report_fingerprint: has the device's fingerprint application report a match to this Keymaster.
+// Throws failure.
+void report_fingerprint(const keymaster_device& keymaster, uint32_t fid);
 
 }  // namespace kmtool

@@ -106,10 +106,13 @@ void add_global_options(CLI::App* app, command_line* line) {
 // Whether the command line is asked for what takes standard output for itself.
 void check_outputs(const CLI::App& app, const command_line& line) {
   for (const CLI::App* verb : app.get_subcommands()) {
-    const CLI::Option* output = verb->get_option_no_throw("--output");
-    if (line.as_json && output && output->count() > 0 && output->as<std::string>() == "-") {
-      throw failure(WRONG_USAGE, "--json and -o - both want standard output");
+    for (const char* name : {"--output", "--signature"}) {
+      const CLI::Option* output = verb->get_option_no_throw(name);
+      if (line.as_json && output && output->count() > 0 && output->as<std::string>() == "-") {
+        throw failure(WRONG_USAGE, "--json and -o - both want standard output");
+      }
     }
+    check_outputs(*verb, line);
   }
 }
 
@@ -126,6 +129,7 @@ int run_command_line(int argc, char** argv) {
   add_crypt_verbs(&app, &line);
   add_token_verb(&app, &line);
   add_attest_verbs(&app, &line);
+  add_soter_verbs(&app, &line);
   add_demo_verb(&app, &line);
   try {
     app.parse(argc, argv);

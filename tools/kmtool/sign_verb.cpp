@@ -1,6 +1,7 @@
 // kmtool sign | verify
 #include "client/names.h"
 #include "operation_run.h"
+#include "soter_document.h"
 
 namespace kmtool {
 
@@ -41,9 +42,36 @@ bytes sign_input(keymaster_device* keymaster, const operation_options& options,
   return signature;
 }
 
-verb_result sign(const std::string& folder, const operation_options& options) {
+// What SOTER keys alone have.
+struct soter_sign_options {
+  std::string signature_file;
+  std::optional<uint32_t> fid;
+};
+
+// A SOTER key signs a document that it makes of the input.
+verb_result sign_document(keymaster_device* keymaster, const operation_options& options,
+                          const soter_sign_options& soter, const opened_key& key) {
+  const document_files files = {options.output, soter.signature_file};
+  files.check();
+  if (soter.fid) report_fingerprint(*keymaster, *soter.fid);
+  const bytes output = sign_input(keymaster, options, key);
+  verb_result result = deliver(client::parse_signed_document(output), files);
+  result.object["key"] = options.key;
+  result.object["input"] = options.input;
+  return result;
+}
+
+verb_result sign(const std::string& folder, const operation_options& options,
+                 const soter_sign_options& soter) {
   keymaster_device keymaster(folder);
   const opened_key key = open_key(&keymaster, options);
+  if (key.characteristics.contains(KM_TAG_SOTER_KEY)) {
+    return sign_document(&keymaster, options, soter, key);
+  }
+  if (soter.fid || !soter.signature_file.empty()) {
+    throw failure(WRONG_USAGE, "--fingerprint, --signature: " + options.key + " is no SOTER key",
+                  "Other keys sign without a document; -o takes the signature.");
+  }
   const bytes signature = sign_input(&keymaster, options, key);
   verb_result result;
   const std::string hex = client::to_hex(signature);
@@ -102,14 +130,21 @@ verb_result verify(const std::string& folder, const operation_options& options,
 void add_sign_verb(CLI::App* app, command_line* line) {
   CLI::App* verb = app->add_subcommand("sign", "Sign a file, or compute its MAC");
   auto options = std::make_shared<operation_options>();
+  auto soter = std::make_shared<soter_sign_options>();
   options->add_key_and_input_to(verb, "What to sign");
   verb->add_option("-o,--output", options->output,
                    "File for the signature's bytes (- for standard output); without it the "
-                   "signature is printed in hexadecimal")
+                   "signature is printed in hexadecimal. A SOTER key writes its document there")
       ->type_name("FILE");
+  verb->add_option("--signature", soter->signature_file,
+                   "File for the signature over a SOTER key's document (default: FILE.sig)")
+      ->type_name("FILE");
+  add_number(verb, "--fingerprint", &soter->fid,
+             "Report this fingerprint first, so that a SOTER key's document names it");
   options->add_mac_to(verb, "MAC length in bits (default: the digest's)");
   options->add_choices_to(verb);
-  verb->callback([=] { line->action = [=] { return sign(line->device_folder(), *options); }; });
+  verb->callback(
+      [=] { line->action = [=] { return sign(line->device_folder(), *options, *soter); }; });
 
   verb = app->add_subcommand("verify", "Verify a signature, or a MAC");
   auto checked = std::make_shared<operation_options>();

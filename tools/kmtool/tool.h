@@ -65,6 +65,7 @@ void add_export_verb(CLI::App* app, command_line* line);
 void add_sign_verb(CLI::App* app, command_line* line);
 void add_token_verb(CLI::App* app, command_line* line);
 void add_attest_verbs(CLI::App* app, command_line* line);
+void add_soter_verbs(CLI::App* app, command_line* line);
 void add_demo_verb(CLI::App* app, command_line* line);
 
 }  // namespace kmtool

@@ -1,0 +1,200 @@
+// kmtool soter check-attk | export-attk | device-id | fingerprint | export | verify
+#include "files.h"
+#include "keymaster_device.h"
+#include "options.h"
+#include "soter_document.h"
+
+namespace kmtool {
+
+using namespace keymaster;
+
+namespace {
+
+constexpr size_t MAX_SIGNATURE_FILE = 64 * 1024;
+
+constexpr char PROVISION_ADVICE[] =
+    "'kmtool device provision' gives a device its key and properties.";
+
+// What the factory stores is often read where it must be there.
+client::soter_result require_data(client::soter_result result, const std::string& action) {
+  if (result.unavailable) {
+    throw failure(REFUSED, action + ": the device's SOTER data cannot be loaded (-1)",
+                  PROVISION_ADVICE);
+  }
+  require(result, action);
+  return result;
+}
+
+std::string text_of(byte_view data) {
+  return {data.begin(), data.end()};
+}
+
+verb_result check_attk(const std::string& folder) {
+  keymaster_device keymaster(folder);
+  const client::attk_result checked = client::soter(keymaster.session()).check_attk();
+  require(checked, "cannot check the ATTK");
+  if (checked.state == client::attk_state::NOT_PROVISIONED) {
+    throw failure(REFUSED, "the device has no ATTK (-1)", PROVISION_ADVICE);
+  }
+  if (checked.state == client::attk_state::UNREADABLE) {
+    throw failure(REFUSED, "the device's ATTK cannot be loaded (-2)",
+                  "--trace 3 tells what the vault answered.");
+  }
+  verb_result result;
+  result.object = {{"attk", "ready"}};
+  result.text = "The device's ATTK is ready\n";
+  return result;
+}
+
+verb_result export_attk(const std::string& folder, const std::string& output) {
+  keymaster_device keymaster(folder);
+  const client::soter_result exported =
+      require_data(client::soter(keymaster.session()).export_attk(), "cannot export the ATTK");
+  const std::string pem = text_of(exported.data) + "\n";
+  verb_result result;
+  result.object = {{"public_key", pem}};
+  if (output.empty()) {
+    result.text = pem;
+    return result;
+  }
+  write_file(output, client::as_bytes(pem), access::NORMAL);
+  result.object["output"] = output;
+  if (output != "-") result.text = "Wrote the ATTK's public key to " + output + "\n";
+  return result;
+}
+
+verb_result device_id(const std::string& folder) {
+  keymaster_device keymaster(folder);
+  client::soter_result id = client::soter(keymaster.session()).device_id();
+  if (id.error == KM_ERROR_UNKNOWN_ERROR) {
+    throw failure("cannot read the device's identifier", id, PROVISION_ADVICE);
+  }
+  require(id, "cannot read the device's identifier");
+  verb_result result;
+  result.object = {{"device_id", text_of(id.data)}};
+  result.text = printable(text_of(id.data)) + "\n";
+  return result;
+}
+
+verb_result report(const std::string& folder, uint32_t fid) {
+  keymaster_device keymaster(folder);
+  report_fingerprint(keymaster, fid);
+  verb_result result;
+  result.object = {{"fid", fid}, {"accepted", true}};
+  result.text = "The Keymaster took the report of fingerprint " + std::to_string(fid) +
+                "; it forgets it when this call ends ('kmtool sign --fingerprint' uses one)\n";
+  return result;
+}
+
+struct export_options {
+  std::string key;
+  document_files files;
+  application_options application;
+};
+
+verb_result export_document(const std::string& folder, const export_options& options) {
+  options.files.check();
+  const bytes blob = read_file(options.key);
+  keymaster_device keymaster(folder);
+  const client::application app = options.application.get();
+  auto key = keymaster->get_key_characteristics(blob, app);
+  require(key, "cannot open the key");
+  if (!key.characteristics.contains(KM_TAG_SOTER_KEY)) {
+    throw failure(WRONG_USAGE, options.key + " is no SOTER key",
+                  "'kmtool export' gives its public key.");
+  }
+  const client::data_result exported = keymaster->export_key(blob, app);
+  require(exported, "cannot export the key");
+  // The command tells of no failure but by putting out nothing.
+  if (exported.data.empty()) {
+    throw failure(REFUSED, "the key's document could not be made or signed",
+                  "What signs it is chosen with generate's --export-sign: the ATTK, which the "
+                  "device must have ('kmtool soter check-attk'), or an RSA key of 2048 bits at "
+                  "most. --trace 1 tells what failed.");
+  }
+  verb_result result = deliver(client::parse_signed_document(exported.data), options.files);
+  result.object["key"] = options.key;
+  return result;
+}
+
+struct verify_options {
+  std::string document;
+  std::string signature;
+  std::string key;
+  std::optional<uint32_t> digest;
+};
+
+verb_result verify_document(const verify_options& options) {
+  const bytes document = read_file(options.document);
+  const bytes signature = read_file(options.signature, MAX_SIGNATURE_FILE);
+  const bytes key = read_file(options.key);
+  const std::optional<std::string> padding = verifying_padding(
+      document, signature, options.digest.value_or(KM_DIGEST_SHA_2_256), options.key, key);
+  if (!padding) {
+    const std::string hint = document.back() == 0
+                                 ? "Give the key that signed it, and --digest unless it is sha256."
+                                 : "The signature covers the zero byte behind the text, which is "
+                                   "missing here.";
+    throw failure(
+        "the signature is not this key's over this document",
+        client::status{TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, KM_ERROR_VERIFICATION_FAILED}, hint);
+  }
+  std::string text = text_of(document);
+  if (text.back() == 0) text.pop_back();
+  verb_result result;
+  result.object = {{"verified", true}, {"padding", *padding}, {"document", text}};
+  result.text = printable(text) + "\n";
+  return result;
+}
+
+void add_plain_verbs(CLI::App* soter, command_line* line) {
+  soter->add_subcommand("check-attk", "Ask whether the device has its attestation key (ATTK)")
+      ->callback([=] { line->action = [=] { return check_attk(line->device_folder()); }; });
+
+  CLI::App* verb = soter->add_subcommand("export-attk", "Export the ATTK's public key as PEM");
+  auto output = std::make_shared<std::string>();
+  verb->add_option("-o,--output", *output, "File for the key (default: standard output)")
+      ->type_name("FILE");
+  verb->callback(
+      [=] { line->action = [=] { return export_attk(line->device_folder(), *output); }; });
+
+  soter->add_subcommand("device-id", "Print the identifier that the factory gave the device")
+      ->callback([=] { line->action = [=] { return device_id(line->device_folder()); }; });
+
+  verb = soter->add_subcommand("fingerprint", "Have the fingerprint application report a match");
+  auto fid = std::make_shared<std::optional<uint32_t>>();
+  add_number(verb, "FID", fid.get(), "Identifier of the fingerprint")->required();
+  verb->callback([=] { line->action = [=] { return report(line->device_folder(), **fid); }; });
+}
+
+void add_document_verbs(CLI::App* soter, command_line* line) {
+  CLI::App* verb =
+      soter->add_subcommand("export", "Export a SOTER key's public key in a signed document");
+  auto exported = std::make_shared<export_options>();
+  verb->add_option("KEY", exported->key, "File that holds the key blob")->required();
+  exported->files.add_to(verb, "File for the document (default: both are printed)");
+  exported->application.add_to(verb);
+  verb->callback(
+      [=] { line->action = [=] { return export_document(line->device_folder(), *exported); }; });
+
+  verb = soter->add_subcommand("verify", "Verify a document's signature and print the document");
+  auto checked = std::make_shared<verify_options>();
+  verb->add_option("DOCUMENT", checked->document, "The document with its zero byte, as stored")
+      ->required();
+  verb->add_option("SIGNATURE", checked->signature, "The signature's bytes")->required();
+  verb->add_option("--key", checked->key, "Public key of the signer, PEM or DER")
+      ->required()
+      ->type_name("FILE");
+  add_name(verb, "--digest", KM_TAG_DIGEST, &checked->digest, "Digest (default: sha256)");
+  verb->callback([=] { line->action = [=] { return verify_document(*checked); }; });
+}
+
+}  // namespace
+
+void add_soter_verbs(CLI::App* app, command_line* line) {
+  CLI::App* soter = app->add_subcommand("soter", "The device's attestation key and documents");
+  add_plain_verbs(soter, line);
+  add_document_verbs(soter, line);
+}
+
+}  // namespace kmtool
