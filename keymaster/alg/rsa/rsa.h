@@ -37,7 +37,7 @@ TEE_Result rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_
                                               uint32_t* key_bits);
 
 // resolve_key_from_data: the same for callers whose every failure is one: no object, traced.
-tee_object resolve_key_from_data(byte_view key_material);
+tee_object resolve_key_from_data(byte_view key_material, uint32_t* key_bits);
 
 // create_rsa_sign ... create_rsa_decrypt: begin an operation with KM_TAG_PADDING and KM_TAG_DIGEST
 // of `begin_params`; encryption and decryption go without the digest unless the padding is OAEP.

@@ -149,7 +149,8 @@ TEE_Result rsa_import_key(keymaster_key_param_set_t* description, byte_view key_
 TEE_Result rsa_export_key(byte_view key_material, byte_span output, size_t* produced,
                           keymaster_error_t* km_error) {
   *produced = 0;
-  const tee_object key = resolve_key_from_data(key_material);
+  uint32_t key_bits = 0;
+  const tee_object key = resolve_key_from_data(key_material, &key_bits);
   if (!key) {
     return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "resolve key from data stream error\n");
   }
@@ -165,10 +166,9 @@ TEE_Result rsa_resolve_key_data(byte_view key_material, tee_object* key, uint32_
   return load_key(TEE_TYPE_RSA_KEYPAIR, *key_bits, attributes, key);
 }
 
-tee_object resolve_key_from_data(byte_view key_material) {
+tee_object resolve_key_from_data(byte_view key_material, uint32_t* key_bits) {
   tee_object key;
-  uint32_t key_bits = 0;
-  if (rsa_resolve_key_data(key_material, &key, &key_bits) != TEE_SUCCESS) {
+  if (rsa_resolve_key_data(key_material, &key, key_bits) != TEE_SUCCESS) {
     TRACE_ERROR("Resolve key data failed");
   }
   return key;

@@ -57,11 +57,12 @@ TEE_Result update_soter(rsa_sign_operation_t* operation, byte_view input, size_t
   return TEE_SUCCESS;
 }
 
-TEE_Result finish_soter(rsa_sign_operation_t* operation, const keymaster_key_param_set_t& params,
-                        heap_buffer* output, keymaster_error_t* km_error, trace_site at) {
+TEE_Result finish_soter(rsa_sign_operation_t* operation, heap_buffer* output,
+                        keymaster_error_t* km_error, trace_site at) {
   trace(TEE_TRACE_DEBUG, at, "sign finish is from soter");
   const byte_view message = operation->soter_message.view().first(operation->soter_length);
-  if (TEE_Result res = soter_enhance_sign_finish(operation, params, message, output)) {
+  if (TEE_Result res =
+          soter_enhance_sign_finish(operation, operation->key_characteristics, message, output)) {
     trace(TEE_TRACE_ERROR, at, "soter enhance error %x", res);
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
@@ -119,12 +120,12 @@ TEE_Result rsa_sign_update(operation_t* operation, const keymaster_key_param_set
   return rsa_take_signed(record, input, "sign", consumed, km_error);
 }
 
-TEE_Result rsa_sign_finish(operation_t* operation, const keymaster_key_param_set_t& params,
-                           byte_view, heap_buffer* output, keymaster_key_param_set_t*,
+TEE_Result rsa_sign_finish(operation_t* operation, const keymaster_key_param_set_t&, byte_view,
+                           heap_buffer* output, keymaster_key_param_set_t*,
                            keymaster_error_t* km_error) {
   const trace_site at = trace_site::here();
   auto* record = static_cast<rsa_sign_operation_t*>(operation);
-  if (record->soter_message) return finish_soter(record, params, output, km_error, at);
+  if (record->soter_message) return finish_soter(record, output, km_error, at);
   heap_buffer signature;
   const TEE_Result res = record->message.is_hashed() ? sign_hashed(record, &signature, km_error, at)
                                                      : sign_raw(record, &signature, km_error, at);

@@ -12,9 +12,9 @@ namespace keymaster {
 
 // soter_enhance_sign_finish: wraps `message`, the whole message given to a SOTER key's sign
 // operation, into a document, signs that with the operation's own hash, key and padding, and puts
-// document and signature into *output. `params` are those of finish.
+// document and signature into *output. `key_params` are the key's characteristics.
 [[nodiscard]] TEE_Result soter_enhance_sign_finish(rsa_sign_operation_t* operation,
-                                                   const keymaster_key_param_set_t& params,
+                                                   const keymaster_key_param_set_t& key_params,
                                                    byte_view message, heap_buffer* output);
 
 }  // namespace keymaster
