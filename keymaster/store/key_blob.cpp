@@ -5,6 +5,7 @@
 
 #include "base/tee_handles.h"
 #include "keymaster/params/marshal.h"
+#include "keymaster/store/blob_plaintext.h"
 #include "keymaster/store/key_store.h"
 
 namespace keymaster {
@@ -135,33 +136,6 @@ TEE_Result decrypt(tee_operation* gcm, byte_view ciphertext, byte_view tag, byte
   return TEE_SUCCESS;
 }
 
-// Takes an authenticated plaintext apart; what follows the characteristics is ignored.
-TEE_Result parse_plaintext(byte_view plaintext, heap_buffer* key,
-                           keymaster_key_param_set_t* characteristics, keymaster_error_t* km_error,
-                           trace_site at) {
-  input_cursor in(plaintext);
-  byte_view key_bytes;
-  byte_view marshalled;
-  if (!in.read_field(&key_bytes)) {
-    trace(TEE_TRACE_ERROR, at, "Too short input");
-    return TEE_ERROR_GENERIC;
-  }
-  if (!key->copy_of(key_bytes)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
-    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
-    return TEE_SUCCESS;
-  }
-  if (!in.read_field(&marshalled)) {
-    trace(TEE_TRACE_ERROR, at, "Too short input");
-    return TEE_ERROR_GENERIC;
-  }
-  if (unmarshal(marshalled, characteristics) != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "Unmarshal failed");
-    *km_error = KM_ERROR_INVALID_ARGUMENT;
-  }
-  return TEE_SUCCESS;
-}
-
 // Decrypts the blob into *plaintext. Both results.
 TEE_Result unseal(byte_view blob, heap_buffer* plaintext, keymaster_error_t* km_error,
                   trace_site at) {
@@ -190,6 +164,32 @@ TEE_Result unseal(byte_view blob, heap_buffer* plaintext, keymaster_error_t* km_
 }
 
 }  // namespace
+
+TEE_Result parse_plaintext(byte_view plaintext, keymaster_error_t unreadable_set, heap_buffer* key,
+                           keymaster_key_param_set_t* characteristics, keymaster_error_t* km_error,
+                           trace_site at) {
+  input_cursor in(plaintext);
+  byte_view key_bytes;
+  byte_view marshalled;
+  if (!in.read_field(&key_bytes)) {
+    trace(TEE_TRACE_ERROR, at, "Too short input");
+    return TEE_ERROR_GENERIC;
+  }
+  if (!key->copy_of(key_bytes)) {
+    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
+    return TEE_SUCCESS;
+  }
+  if (!in.read_field(&marshalled)) {
+    trace(TEE_TRACE_ERROR, at, "Too short input");
+    return TEE_ERROR_GENERIC;
+  }
+  if (unmarshal(marshalled, characteristics) != TEE_SUCCESS) {
+    trace(TEE_TRACE_ERROR, at, "Unmarshal failed");
+    *km_error = unreadable_set;
+  }
+  return TEE_SUCCESS;
+}
 
 TEE_Result save_key(byte_view key, const keymaster_key_param_set_t& characteristics, byte_span blob,
                     size_t* blob_size) {
@@ -223,7 +223,8 @@ TEE_Result open_key(byte_view blob, heap_buffer* key, keymaster_key_param_set_t*
   heap_buffer plaintext;
   TEE_Result res = unseal(blob, &plaintext, km_error, trace_site::here());
   if (failed(res, *km_error)) return res;
-  res = parse_plaintext(plaintext.view(), key, characteristics, km_error, trace_site::here());
+  res = parse_plaintext(plaintext.view(), KM_ERROR_INVALID_ARGUMENT, key, characteristics, km_error,
+                        trace_site::here());
   if (failed(res, *km_error)) key->reset();
   return res;
 }

@@ -27,7 +27,11 @@ namespace keymaster {
                                   keymaster_key_param_set_t* characteristics,
                                   keymaster_error_t* km_error);
 
-// open_v1_key: the same for a blob of the earlier Keymaster TA.
+// open_v1_key: the same for a blob of the earlier Keymaster TA, which that TA opens: a session with
+// it, command 27. On failure the outputs are empty. Keymaster errors: -33 characteristics that do
+// not unmarshal; -41 out of memory. TEE codes: those of the session (TEE_ERROR_ITEM_NOT_FOUND where
+// there is no such TA) and of the earlier TA, unchanged; TEE_ERROR_GENERIC for an answer that is
+// longer than the blob or whose inner lengths do not fit.
 [[nodiscard]] TEE_Result open_v1_key(byte_view blob, heap_buffer* key,
                                      keymaster_key_param_set_t* characteristics,
                                      keymaster_error_t* km_error);

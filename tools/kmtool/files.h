@@ -36,6 +36,7 @@ class input_file {
 };
 
 constexpr size_t MAX_KEY_FILE = 1024 * 1024;
+constexpr size_t MAX_SIGNATURE_FILE = 64 * 1024;
 
 // read_file: the whole content, at least one byte; refuses files of more than `limit` bytes.
 bytes read_file(const std::string& path, size_t limit = MAX_KEY_FILE);

@@ -10,8 +10,6 @@ using client::param_set;
 
 namespace {
 
-constexpr size_t MAX_SIGNATURE_FILE = 64 * 1024;
-
 // The begin parameters: what was asked for, else what the key allows. Of several, SHA-256 and PSS.
 param_set begin_params(const operation_options& options, const opened_key& key) {
   param_set params;

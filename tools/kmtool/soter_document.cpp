@@ -15,11 +15,11 @@ using namespace keymaster;
 
 namespace {
 
-struct padding {
+struct padding_row {
   const char* name;
   int number;
 };
-constexpr padding PADDINGS[] = {{"pkcs1", RSA_PKCS1_PADDING}, {"pss", RSA_PKCS1_PSS_PADDING}};
+constexpr padding_row PADDINGS[] = {{"pkcs1", RSA_PKCS1_PADDING}, {"pss", RSA_PKCS1_PSS_PADDING}};
 
 const EVP_MD* digest_of(uint32_t digest) {
   switch (digest) {
@@ -112,7 +112,7 @@ verb_result deliver(const client::signed_document& made, const document_files& f
 std::optional<std::string> verifying_padding(byte_view data, byte_view signature, uint32_t digest,
                                              const std::string& path, byte_view key) {
   const owned<EVP_PKEY> with = public_key(path, key);
-  for (const padding& row : PADDINGS) {
+  for (const padding_row& row : PADDINGS) {
     if (verifies(with.get(), row.number, digest_of(digest), data, signature)) return row.name;
   }
   return std::nullopt;

@@ -10,8 +10,6 @@ using namespace keymaster;
 
 namespace {
 
-constexpr size_t MAX_SIGNATURE_FILE = 64 * 1024;
-
 constexpr char PROVISION_ADVICE[] =
     "'kmtool device provision' gives a device its key and properties.";
 
@@ -25,7 +23,7 @@ client::soter_result require_data(client::soter_result result, const std::string
   return result;
 }
 
-std::string text_of(byte_view data) {
+std::string as_text(byte_view data) {
   return {data.begin(), data.end()};
 }
 
@@ -50,7 +48,7 @@ verb_result export_attk(const std::string& folder, const std::string& output) {
   keymaster_device keymaster(folder);
   const client::soter_result exported =
       require_data(client::soter(keymaster.session()).export_attk(), "cannot export the ATTK");
-  const std::string pem = text_of(exported.data) + "\n";
+  const std::string pem = as_text(exported.data) + "\n";
   verb_result result;
   result.object = {{"public_key", pem}};
   if (output.empty()) {
@@ -71,12 +69,12 @@ verb_result device_id(const std::string& folder) {
   }
   require(id, "cannot read the device's identifier");
   verb_result result;
-  result.object = {{"device_id", text_of(id.data)}};
-  result.text = printable(text_of(id.data)) + "\n";
+  result.object = {{"device_id", as_text(id.data)}};
+  result.text = printable(as_text(id.data)) + "\n";
   return result;
 }
 
-verb_result report(const std::string& folder, uint32_t fid) {
+verb_result report_match(const std::string& folder, uint32_t fid) {
   keymaster_device keymaster(folder);
   report_fingerprint(keymaster, fid);
   verb_result result;
@@ -86,13 +84,13 @@ verb_result report(const std::string& folder, uint32_t fid) {
   return result;
 }
 
-struct export_options {
+struct document_export_options {
   std::string key;
   document_files files;
   application_options application;
 };
 
-verb_result export_document(const std::string& folder, const export_options& options) {
+verb_result export_document(const std::string& folder, const document_export_options& options) {
   options.files.check();
   const bytes blob = read_file(options.key);
   keymaster_device keymaster(folder);
@@ -117,14 +115,14 @@ verb_result export_document(const std::string& folder, const export_options& opt
   return result;
 }
 
-struct verify_options {
+struct document_verify_options {
   std::string document;
   std::string signature;
   std::string key;
   std::optional<uint32_t> digest;
 };
 
-verb_result verify_document(const verify_options& options) {
+verb_result verify_document(const document_verify_options& options) {
   const bytes document = read_file(options.document);
   const bytes signature = read_file(options.signature, MAX_SIGNATURE_FILE);
   const bytes key = read_file(options.key);
@@ -139,7 +137,7 @@ verb_result verify_document(const verify_options& options) {
         "the signature is not this key's over this document",
         client::status{TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, KM_ERROR_VERIFICATION_FAILED}, hint);
   }
-  std::string text = text_of(document);
+  std::string text = as_text(document);
   if (text.back() == 0) text.pop_back();
   verb_result result;
   result.object = {{"verified", true}, {"padding", *padding}, {"document", text}};
@@ -164,13 +162,14 @@ void add_plain_verbs(CLI::App* soter, command_line* line) {
   verb = soter->add_subcommand("fingerprint", "Have the fingerprint application report a match");
   auto fid = std::make_shared<std::optional<uint32_t>>();
   add_number(verb, "FID", fid.get(), "Identifier of the fingerprint")->required();
-  verb->callback([=] { line->action = [=] { return report(line->device_folder(), **fid); }; });
+  verb->callback(
+      [=] { line->action = [=] { return report_match(line->device_folder(), **fid); }; });
 }
 
 void add_document_verbs(CLI::App* soter, command_line* line) {
   CLI::App* verb =
       soter->add_subcommand("export", "Export a SOTER key's public key in a signed document");
-  auto exported = std::make_shared<export_options>();
+  auto exported = std::make_shared<document_export_options>();
   verb->add_option("KEY", exported->key, "File that holds the key blob")->required();
   exported->files.add_to(verb, "File for the document (default: both are printed)");
   exported->application.add_to(verb);
@@ -178,7 +177,7 @@ void add_document_verbs(CLI::App* soter, command_line* line) {
       [=] { line->action = [=] { return export_document(line->device_folder(), *exported); }; });
 
   verb = soter->add_subcommand("verify", "Verify a document's signature and print the document");
-  auto checked = std::make_shared<verify_options>();
+  auto checked = std::make_shared<document_verify_options>();
   verb->add_option("DOCUMENT", checked->document, "The document with its zero byte, as stored")
       ->required();
   verb->add_option("SIGNATURE", checked->signature, "The signature's bytes")->required();

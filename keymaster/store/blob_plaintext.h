@@ -1,0 +1,19 @@
+// The plaintext that blobs of this TA and of the earlier one share: u32 K, K bytes of key material,
+// u32 P, P bytes of marshalled characteristics with every tag; little-endian.
+#pragma once
+
+#include "base/heap.h"
+#include "base/trace.h"
+#include "keymaster/params/param_set.h"
+
+namespace keymaster {
+
+// parse_plaintext: takes a plaintext apart; what follows the characteristics is ignored. On failure
+// *key may be filled. Keymaster errors: `unreadable_set` for characteristics that do not unmarshal;
+// -41 out of memory. TEE_ERROR_GENERIC: a length passes the end.
+[[nodiscard]] TEE_Result parse_plaintext(byte_view plaintext, keymaster_error_t unreadable_set,
+                                         heap_buffer* key,
+                                         keymaster_key_param_set_t* characteristics,
+                                         keymaster_error_t* km_error, trace_site at);
+
+}  // namespace keymaster
