@@ -92,7 +92,7 @@ verb_result deliver(const client::signed_document& made, const document_files& f
   verb_result result;
   result.object = {{"document", made.text()}, {"signature", hex}};
   if (files.document.empty()) {
-    result.text = "document   " + printable(made.text()) + "\nsignature  " + hex + "\n";
+    result.text = "document   " + escape_controls(made.text()) + "\nsignature  " + hex + "\n";
     return result;
   }
   const std::string beside = files.document + ".sig";
@@ -118,7 +118,7 @@ std::optional<std::string> verifying_padding(byte_view data, byte_view signature
   return std::nullopt;
 }
 
-std::string printable(std::string_view text) {
+std::string escape_controls(std::string_view text) {
   std::string result;
   for (const char c : text) {
     const auto byte = static_cast<unsigned char>(c);

@@ -35,7 +35,8 @@ verb_result deliver(const keymaster::client::signed_document& made, const docume
 std::optional<std::string> verifying_padding(byte_view data, byte_view signature, uint32_t digest,
                                              const std::string& path, byte_view key);
 
-// printable: the text with control characters, which documents hold as they are, written as \u00XX.
-std::string printable(std::string_view text);
+// escape_controls: the text with control characters, which documents hold as they are, written as
+// \u00XX.
+std::string escape_controls(std::string_view text);
 
 }  // namespace kmtool

@@ -70,7 +70,7 @@ verb_result device_id(const std::string& folder) {
   require(id, "cannot read the device's identifier");
   verb_result result;
   result.object = {{"device_id", as_text(id.data)}};
-  result.text = printable(as_text(id.data)) + "\n";
+  result.text = escape_controls(as_text(id.data)) + "\n";
   return result;
 }
 
@@ -141,7 +141,7 @@ verb_result verify_document(const document_verify_options& options) {
   if (text.back() == 0) text.pop_back();
   verb_result result;
   result.object = {{"verified", true}, {"padding", *padding}, {"document", text}};
-  result.text = printable(text) + "\n";
+  result.text = escape_controls(text) + "\n";
   return result;
 }
 
