@@ -1,7 +1,6 @@
 // The heap of a trusted application: its bound, what blocks hold, and what is left in them.
 #include <algorithm>
 #include <cstring>
-#include <map>
 
 #include "support.h"
 #include "tee/runtime/host_control.h"
@@ -73,32 +72,6 @@ TEST_F(ta_heap, freed_blocks_are_wiped) {
   host::set_block_hook(nullptr, nullptr);
   EXPECT_TRUE(shown_as_left);
   EXPECT_TRUE(wiped);
-}
-
-// Many blocks that come and go in an order of their own, held against a map.
-TEST_F(ta_heap, blocks_are_told_apart) {
-  std::map<void*, size_t> live;
-  size_t total = 0;
-  uint32_t state = 1;
-  for (int step = 0; step < 20000; ++step) {
-    state = state * 1664525 + 1013904223;
-    size_t size = (state >> 8) % 200;
-    if (live.size() > 150 || (state >> 28 < 7 && !live.empty())) {
-      auto victim = std::next(live.begin(), static_cast<ptrdiff_t>(size % live.size()));
-      total -= victim->second;
-      TEE_Free(victim->first);
-      live.erase(victim);
-    } else {
-      void* block = TEE_Malloc(size, 0);
-      ASSERT_TRUE(live.emplace(block, size).second);
-      total += size;
-    }
-    ASSERT_EQ(ta_.counts().heap_bytes, total);
-    ASSERT_EQ(ta_.counts().heap_blocks, live.size());
-  }
-  for (auto& [block, size] : live)
-    TEE_Free(block);
-  EXPECT_EQ(ta_.counts(), host::live_counts{});
 }
 
 TEST_F(ta_heap_death, addresses_that_are_no_block_panic) {

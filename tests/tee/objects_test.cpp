@@ -82,19 +82,6 @@ TEST_F(objects, a_secret_comes_back_as_it_went_in) {
   TEE_CloseObject(object);
 }
 
-TEST_F(objects, generated_secrets_differ) {
-  bytes secrets[2] = {bytes(32), bytes(32)};
-  for (bytes& secret : secrets) {
-    TEE_ObjectHandle object = allocate(TEE_TYPE_AES, 256);
-    ASSERT_EQ(TEE_GenerateKey(object, 256, nullptr, 0), TEE_SUCCESS);
-    size_t length = secret.size();
-    EXPECT_EQ(TEE_GetObjectBufferAttribute(object, TEE_ATTR_SECRET_VALUE, secret.data(), &length),
-              TEE_SUCCESS);
-    TEE_FreeTransientObject(object);
-  }
-  EXPECT_NE(secrets[0], secrets[1]);
-}
-
 // The key behind an object is the one made before for the same secret, until enough others came; a
 // like secret of another type is another key.
 TEST_F(objects, keys_are_found_again) {

@@ -1,9 +1,7 @@
-// Operations: which ones there are, their keys and states, and planned faults.
+// Operations: which ones there are, their keys and states.
 #include <functional>
-#include <set>
 
 #include "support.h"
-#include "tee/runtime/host_control.h"
 
 namespace tee::test {
 namespace {
@@ -102,60 +100,6 @@ TEST_F(operations_death, calls_that_do_not_fit_panic) {
   for (const auto& row : rows) {
     EXPECT_DEATH(row.call(), std::string("panic: TEE_") + row.message) << row.message;
   }
-}
-
-// A whole use of the platform, stopped at each call that can fail in turn.
-TEE_Result use_everything(std::set<TEE_Result>* seen) {
-  auto note = [seen](TEE_Result result) {
-    seen->insert(result);
-    return result;
-  };
-  const bytes data(16);
-  uint8_t out[64];
-  size_t length = sizeof(out);
-  size_t tag_length = 16;
-  void* block = TEE_Malloc(10, 0);
-  if (!block) return note(TEE_ERROR_OUT_OF_MEMORY);
-  TEE_Free(block);
-  TEE_UUID uuid;
-  if (auto res = TEE_GetPropertyAsUUID(TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.deviceID", &uuid)) {
-    return note(res);
-  }
-  if (auto res = GetBootSeed(out, 32)) return note(res);
-  TEE_ObjectHandle key = nullptr;
-  TEE_OperationHandle op = nullptr;
-  TEE_Result res = TEE_AllocateTransientObject(TEE_TYPE_AES, 128, &key);
-  if (!res) res = TEE_GenerateKey(key, 128, nullptr, 0);
-  if (!res) res = TEE_AllocateOperation(&op, TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 128);
-  if (!res) res = TEE_SetOperationKey(op, key);
-  if (!res) res = TEE_AEInit(op, data.data(), 12, 128, 0, 0);
-  if (!res) res = TEE_AEUpdate(op, data.data(), 16, out, &length);
-  if (!res) res = TEE_AEEncryptFinal(op, nullptr, 0, nullptr, &(length = 0), out, &tag_length);
-  TEE_FreeOperation(op);
-  TEE_FreeTransientObject(key);
-  return note(res);
-}
-
-TEST_F(operations, every_fault_is_reported_and_leaves_nothing) {
-  constexpr TEE_Result CODE = TEE_ERROR_STORAGE_NO_SPACE;
-  std::set<TEE_Result> seen;
-  uint64_t faults = 0;
-  for (;;) {
-    uint64_t before = host::fallible_calls();
-    host::fail_nth_call(faults + 1, CODE);
-    TEE_Result res = use_everything(&seen);
-    EXPECT_EQ(ta_.counts(), host::live_counts{});
-    if (!host::fault_fired()) {
-      EXPECT_EQ(res, TEE_SUCCESS);
-      EXPECT_EQ(host::fallible_calls() - before, faults);
-      break;
-    }
-    EXPECT_NE(res, TEE_SUCCESS);
-    ++faults;
-  }
-  host::clear_fault();
-  EXPECT_EQ(faults, 10U);
-  EXPECT_EQ(seen, (std::set<TEE_Result>{TEE_SUCCESS, CODE, TEE_ERROR_OUT_OF_MEMORY}));
 }
 
 }  // namespace

@@ -1,5 +1,4 @@
-// Properties, time, trace and random.
-#include <algorithm>
+// Properties, trace and extensions.
 #include <string>
 
 #include "support.h"
@@ -70,19 +69,6 @@ TEST_F(platform, properties_as_uuid_and_identity) {
             TEE_ERROR_BAD_FORMAT);
 }
 
-TEST_F(platform, both_clocks) {
-  host::set_clocks(12345678, 1700000000999);
-  TEE_Time time{};
-  TEE_GetSystemTime(&time);
-  EXPECT_EQ(time.seconds, 12345U);
-  EXPECT_EQ(time.millis, 678U);
-  host::advance_clocks(1);
-  TEE_GetREETime(&time);
-  EXPECT_EQ(time.seconds, 1700000001U);
-  EXPECT_EQ(time.millis, 0U);
-  host::use_real_clocks();
-}
-
 TEST_F(platform, trace_lines_are_filtered) {
   static std::string seen;
   seen.clear();
@@ -99,17 +85,6 @@ TEST_F(platform, trace_lines_are_filtered) {
   host::set_trace_level(TEE_TRACE_ERROR);
   host::set_trace_sink(nullptr, nullptr);
   EXPECT_EQ(seen, "1line\n2line\n");
-}
-
-TEST_F(platform, random_fills_exactly) {
-  bytes first(1000);
-  bytes second(1000);
-  TEE_GenerateRandom(first.data(), first.size());
-  TEE_GenerateRandom(second.data(), second.size() - 1);
-  TEE_GenerateRandom(nullptr, 0);
-  EXPECT_NE(first, second);
-  EXPECT_EQ(second.back(), 0);
-  EXPECT_LT(std::count(first.begin(), first.end(), 0), 50);
 }
 
 TEST_F(platform, boot_seed_and_replay_protected_storage) {

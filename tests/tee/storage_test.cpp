@@ -115,28 +115,23 @@ INSTANTIATE_TEST_SUITE_P(kinds, storage, ::testing::Values(PRIVATE, RPMB));
 
 TEST_P(storage, edited_and_swapped_rows_are_corrupt_and_removed) {
   const char* attacks[] = {
-      "UPDATE objects SET sealed = substr(sealed, 1, length(sealed) - 1) WHERE id = CAST('a' AS "
-      "BLOB)",
-      "UPDATE objects SET sealed = CAST(substr(sealed, 1, 14) || x'5a' || substr(sealed, 16) AS "
-      "BLOB)"
-      " WHERE id = CAST('a' AS BLOB)",
-      "UPDATE objects SET sealed = x'' WHERE id = CAST('a' AS BLOB)",
-      "UPDATE objects SET sealed = 'text' WHERE id = CAST('a' AS BLOB)",
-      "UPDATE objects SET sealed = (SELECT sealed FROM objects WHERE id = CAST('b' AS BLOB))"
-      " WHERE id = CAST('a' AS BLOB)",
-      "UPDATE objects SET generation = generation + 1 WHERE id = CAST('a' AS BLOB)",
-      "DELETE FROM objects WHERE id = CAST('a' AS BLOB);"
-      "UPDATE objects SET id = CAST('a' AS BLOB) WHERE id = CAST('b' AS BLOB)",
-      "UPDATE objects SET sealed = (SELECT sealed FROM objects WHERE id = CAST('other' AS BLOB)),"
-      " generation = (SELECT generation FROM objects WHERE id = CAST('other' AS BLOB))"
-      " WHERE id = CAST('a' AS BLOB)",
+      "UPDATE objects SET sealed = substr(sealed, 1, length(sealed) - 1) WHERE id = x'61'",
+      "UPDATE objects SET sealed = CAST(substr(sealed, 1, 14) || x'5a' || substr(sealed, 16)"
+      " AS BLOB) WHERE id = x'61'",
+      "UPDATE objects SET sealed = x'' WHERE id = x'61'",
+      "UPDATE objects SET sealed = 'text' WHERE id = x'61'",
+      "UPDATE objects SET sealed = (SELECT sealed FROM objects WHERE id = x'62') WHERE id = x'61'",
+      "UPDATE objects SET generation = generation + 1 WHERE id = x'61'",
+      "DELETE FROM objects WHERE id = x'61'; UPDATE objects SET id = x'61' WHERE id = x'62'",
+      "UPDATE objects SET (sealed, generation) ="
+      " (SELECT sealed, generation FROM objects WHERE id = x'63') WHERE id = x'61'",
   };
   for (const char* attack : attacks) {
     {
       auto dev = made.open();
       save(*dev, GetParam(), "a", "content a");
       save(*dev, GetParam(), "b", "content b");
-      save(*dev, GetParam() == RPMB ? PRIVATE : RPMB, "other", "content a");
+      save(*dev, GetParam() == RPMB ? PRIVATE : RPMB, "c", "content a");
     }
     sql(made, "DELETE FROM quarantine");
     sql(made, attack);

@@ -65,6 +65,10 @@ TEST_F(teec, registered_and_allocated_memory) {
   TEEC_SharedMemory stale = in;
   stale.imp = nullptr;
 
+  constexpr uint32_t WHOLE = TEEC_MEMREF_WHOLE;
+  constexpr uint32_t PART_IN = TEEC_MEMREF_PARTIAL_INPUT;
+  constexpr uint32_t PART_OUT = TEEC_MEMREF_PARTIAL_OUTPUT;
+  constexpr TEEC_Result BAD = TEEC_ERROR_BAD_PARAMETERS;
   struct {
     uint32_t in_type;
     TEEC_RegisteredMemoryReference in;
@@ -73,57 +77,17 @@ TEST_F(teec, registered_and_allocated_memory) {
     TEEC_Result result;
     size_t size;  // of the output slot afterwards
   } cases[] = {
-      {TEEC_MEMREF_PARTIAL_INPUT, {&in, 4, 6}, TEEC_MEMREF_PARTIAL_OUTPUT, {&out, 5, 3}, 0, 4},
-      {TEEC_MEMREF_PARTIAL_INPUT, {&in, 2, 0}, TEEC_MEMREF_WHOLE, {&out, 0, 0}, 0, 2},
-      {TEEC_MEMREF_WHOLE,
-       {&in, 0, 0},
-       TEEC_MEMREF_WHOLE,
-       {&out, 0, 0},
-       TEEC_ERROR_SHORT_BUFFER,
-       10},
-      {TEEC_MEMREF_PARTIAL_INPUT, {&in, 0, 10}, TEEC_MEMREF_WHOLE, {&out, 0, 0}, 0, 0},
-      {TEEC_MEMREF_PARTIAL_INPUT,
-       {&in, 5, 6},
-       TEEC_MEMREF_WHOLE,
-       {&out, 9, 0},
-       TEEC_ERROR_BAD_PARAMETERS,
-       9},
-      {TEEC_MEMREF_PARTIAL_INPUT,
-       {&in, 2, SIZE_MAX},
-       TEEC_MEMREF_WHOLE,
-       {&out, 9, 0},
-       TEEC_ERROR_BAD_PARAMETERS,
-       9},
-      {TEEC_MEMREF_PARTIAL_INPUT,
-       {&in, SIZE_MAX, 2},
-       TEEC_MEMREF_WHOLE,
-       {&out, 9, 0},
-       TEEC_ERROR_BAD_PARAMETERS,
-       9},
-      {TEEC_MEMREF_WHOLE,
-       {&in, 0, 0},
-       TEEC_MEMREF_PARTIAL_OUTPUT,
-       {&in, 9, 0},
-       TEEC_ERROR_BAD_PARAMETERS,
-       9},
-      {TEEC_MEMREF_WHOLE,
-       {nullptr, 0, 0},
-       TEEC_MEMREF_WHOLE,
-       {&out, 9, 0},
-       TEEC_ERROR_BAD_PARAMETERS,
-       9},
-      {TEEC_MEMREF_WHOLE,
-       {&foreign, 0, 0},
-       TEEC_MEMREF_WHOLE,
-       {&out, 9, 0},
-       TEEC_ERROR_BAD_PARAMETERS,
-       9},
-      {TEEC_MEMREF_WHOLE,
-       {&stale, 0, 0},
-       TEEC_MEMREF_WHOLE,
-       {&out, 9, 0},
-       TEEC_ERROR_BAD_PARAMETERS,
-       9},
+      {PART_IN, {&in, 4, 6}, PART_OUT, {&out, 5, 3}, 0, 4},
+      {PART_IN, {&in, 2, 0}, WHOLE, {&out, 0, 0}, 0, 2},
+      {WHOLE, {&in, 0, 0}, WHOLE, {&out, 0, 0}, TEEC_ERROR_SHORT_BUFFER, 10},
+      {PART_IN, {&in, 0, 10}, WHOLE, {&out, 0, 0}, 0, 0},
+      {PART_IN, {&in, 5, 6}, WHOLE, {&out, 9, 0}, BAD, 9},
+      {PART_IN, {&in, 2, SIZE_MAX}, WHOLE, {&out, 9, 0}, BAD, 9},
+      {PART_IN, {&in, SIZE_MAX, 2}, WHOLE, {&out, 9, 0}, BAD, 9},
+      {WHOLE, {&in, 0, 0}, PART_OUT, {&in, 9, 0}, BAD, 9},
+      {WHOLE, {nullptr, 0, 0}, WHOLE, {&out, 9, 0}, BAD, 9},
+      {WHOLE, {&foreign, 0, 0}, WHOLE, {&out, 9, 0}, BAD, 9},
+      {WHOLE, {&stale, 0, 0}, WHOLE, {&out, 9, 0}, BAD, 9},
   };
   for (const auto& row : cases) {
     TEEC_Operation operation{};
