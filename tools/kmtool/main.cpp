@@ -17,10 +17,11 @@ namespace client = keymaster::client;
 failure::failure(exit_code code, const std::string& message, std::string advice)
     : std::runtime_error(message), code_(code), advice_(std::move(advice)) {}
 
-failure::failure(const std::string& action, const client::status& outcome, std::string advice)
+failure::failure(const std::string& action, const client::status& outcome,
+                 const std::string& advice)
     : std::runtime_error(action + ": " + outcome.text()),
       code_(outcome.tee == TEEC_SUCCESS ? REFUSED : TEE_FAILED),
-      advice_(advice.empty() ? outcome.advice() : std::move(advice)),
+      advice_(advice.empty() ? std::string(outcome.advice()) : advice),
       outcome_(outcome) {}
 
 std::string command_line::device_folder() const {
@@ -149,6 +150,10 @@ int run_command_line(int argc, char** argv) {
 }  // namespace
 }  // namespace kmtool
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
   return kmtool::run_command_line(argc, argv);
+} catch (const std::exception& error) {
+  // What failed while a failure was reported.
+  fprintf(stderr, "kmtool: %s\n", error.what());
+  return kmtool::TEE_FAILED;
 }

@@ -23,8 +23,8 @@ progress::~progress() {
   if (drawn_) fputs("\r\033[K", stderr);
 }
 
-void progress::advance(uint64_t bytes) {
-  done_ += bytes;
+void progress::advance(uint64_t count) {
+  done_ += count;
   if (!on_terminal_) return;
   clock::time_point now = clock::now();
   if (now - start_ < 1s || now - last_ < 100ms) return;

@@ -18,7 +18,7 @@ class progress {
   ~progress();
 
   // advance: so many bytes more are done.
-  void advance(uint64_t bytes);
+  void advance(uint64_t count);
 
  private:
   using clock = std::chrono::steady_clock;

@@ -24,7 +24,7 @@ class failure : public std::runtime_error {
   // What the trusted application answered to `action` ("cannot generate the key"): REFUSED when it
   // is a Keymaster error alone, TEE_FAILED when the TEE failed.
   failure(const std::string& action, const keymaster::client::status& outcome,
-          std::string advice = "");
+          const std::string& advice = "");
 
   exit_code code() const { return code_; }
   const std::string& advice() const { return advice_; }
