@@ -42,6 +42,10 @@ TEST(DerWriter, Primitives) {
   EXPECT_EQ(integer(65537), "0203010001");
   EXPECT_EQ(integer(UINT64_MAX), "020900ffffffffffffffff");
 
+  uint64_t fresh = 0;
+  ASN1_INTEGER_TYPE.initialise(&fresh);
+  EXPECT_EQ(integer(fresh), "020500deadbeaf") << "what was never set shows";
+
   const auto tag = [](uint32_t word) {
     return written([=](der_cursor* out) { return der_write_tag(out, word); });
   };

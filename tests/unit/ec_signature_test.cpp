@@ -133,14 +133,5 @@ TEST_F(EcSignature, OnlyTheShortestFormIsTaken) {
   }
 }
 
-TEST_F(EcSignature, OutOfMemoryIsTold) {
-  const bytes good = {0x30, 6, 2, 1, 1, 2, 1, 1};
-  bytes r(1);
-  bytes s(1);
-  platform::allocations_to_fail = 1;
-  EXPECT_EQ(der_decode_ec_signature(good, r, s), TEE_ERROR_OUT_OF_MEMORY);
-  EXPECT_EQ(der_decode_ec_signature(good, r, s), TEE_SUCCESS);
-}
-
 }  // namespace
 }  // namespace keymaster

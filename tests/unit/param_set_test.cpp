@@ -68,21 +68,6 @@ bytes marshalled(const keymaster_key_param_set_t& set, bool include_all) {
   return result;
 }
 
-TEST_F(ParamSet, CountsAndFindsTags) {
-  keymaster_key_param_set_t set;
-  EXPECT_TRUE(tag_at_most_once(set, KM_TAG_PADDING));
-  EXPECT_EQ(get_unique(set, KM_TAG_PADDING), nullptr);
-  for (uint32_t n = 1; n <= 3; n++) {
-    ASSERT_TRUE(add_integer(&set, KM_TAG_PADDING, n));
-    EXPECT_EQ(count_tag(set, KM_TAG_PADDING), n);
-    EXPECT_EQ(tag_at_most_once(set, KM_TAG_PADDING), n == 1);
-    EXPECT_EQ(get_unique(set, KM_TAG_PADDING) != nullptr, n == 1);
-  }
-  ASSERT_TRUE(add_blob(&set, KM_TAG_NONCE, from_hex("0102")));
-  EXPECT_EQ(unique_blob(set, KM_TAG_NONCE).size(), 2u);
-  EXPECT_FALSE(contains_tag(set, KM_TAG_DIGEST));
-}
-
 TEST_F(ParamSet, FreeingKeepsTheLength) {
   keymaster_key_param_set_t set;
   ASSERT_TRUE(add_integer(&set, KM_TAG_KEY_SIZE, 8));
@@ -93,17 +78,6 @@ TEST_F(ParamSet, FreeingKeepsTheLength) {
   ASSERT_TRUE(add_integer(&set, KM_TAG_KEY_SIZE, 8));
   EXPECT_EQ(set.length, 1u);
   free_param_set(nullptr);
-}
-
-TEST_F(ParamSet, AddingWithoutMemoryChangesNothing) {
-  keymaster_key_param_set_t set;
-  ASSERT_TRUE(add_integer(&set, KM_TAG_KEY_SIZE, 8));
-  for (int allocation = 1; allocation <= 2; allocation++) {
-    platform::allocations_to_fail = allocation;
-    EXPECT_FALSE(add_blob(&set, KM_TAG_NONCE, from_hex("0102")));
-    EXPECT_EQ(set.length, 1u);
-  }
-  EXPECT_EQ(get_unique(set, KM_TAG_KEY_SIZE)->integer, 8u);
 }
 
 TEST_F(ParamSet, MarshalsWhatItUnmarshalled) {
@@ -132,21 +106,6 @@ TEST_F(ParamSet, RefusesEveryPrefix) {
     EXPECT_TRUE(last_line().ends_with(": Too short input\n")) << last_line();
     EXPECT_EQ(platform::live_blocks, 0u) << size;
   }
-}
-
-TEST_F(ParamSet, SurvivesEveryFailedAllocation) {
-  const bytes input = from_hex(THREE);
-  int failures = 0;
-  for (;; failures++) {
-    platform::allocations_to_fail = failures + 1;
-    keymaster_key_param_set_t set;
-    if (unmarshal(input, &set) == TEE_SUCCESS) break;
-    EXPECT_EQ(set.length, 0u);
-    EXPECT_NE(last_line().find("Out of memory"), std::string::npos) << last_line();
-    EXPECT_EQ(platform::live_blocks, 0u) << failures;
-  }
-  EXPECT_EQ(failures, 3);  // the array and two blobs
-  platform::allocations_to_fail = 0;
 }
 
 TEST_F(ParamSet, NeverTrustsACount) {

@@ -39,13 +39,6 @@ TEST_F(Trace, NamesLevelThreadFunctionAndLine) {
   }
 }
 
-TEST_F(Trace, DropsWhatIsAboveTheThreshold) {
-  platform::trace_threshold = TEE_TRACE_INFO;
-  trace(TEE_TRACE_DEBUG, AT, "dropped");
-  trace(TEE_TRACE_INFO, AT, "kept");
-  EXPECT_EQ(platform::trace_lines.size(), 1u);
-}
-
 TEST_F(Trace, CutsLinesAt256BytesAndKeepsTheirNewline) {
   const size_t prefix = std::string("ERR [0x2a] KEYMASTER:begin:120: ").size();
   for (const size_t length : {255 - prefix, 256 - prefix, size_t{300}, size_t{5000}}) {
@@ -62,17 +55,6 @@ TEST_F(Trace, CutsLinesAt256BytesAndKeepsTheirNewline) {
   trace(TEE_TRACE_ERROR, {name.c_str(), 1}, "message");
   EXPECT_EQ(platform::trace_lines[0].size(), 256u);
   EXPECT_EQ(platform::trace_lines[0].back(), '\n');
-}
-
-// A helper reports under its caller's name.
-void shared_helper(trace_site at = trace_site::here()) {
-  trace(TEE_TRACE_ERROR, at, "helped");
-}
-
-TEST_F(Trace, ReportsTheCaller) {
-  shared_helper();
-  EXPECT_NE(platform::trace_lines[0].find(":TestBody:"), std::string::npos)
-      << platform::trace_lines[0];
 }
 
 TEST_F(Trace, DumpsEachClassOfTag) {
