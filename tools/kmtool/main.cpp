@@ -104,14 +104,17 @@ void add_global_options(CLI::App* app, command_line* line) {
       ->type_name("LEVEL");
 }
 
-// Whether the command line is asked for what takes standard output for itself.
+bool wants_standard_output(const CLI::App& verb, const char* option) {
+  const CLI::Option* output = verb.get_option_no_throw(option);
+  return output != nullptr && output->count() > 0 && output->as<std::string>() == "-";
+}
+
+// With --json the object takes standard output; no verb may write there, too.
 void check_outputs(const CLI::App& app, const command_line& line) {
+  if (!line.as_json) return;
   for (const CLI::App* verb : app.get_subcommands()) {
-    for (const char* name : {"--output", "--signature"}) {
-      const CLI::Option* output = verb->get_option_no_throw(name);
-      if (line.as_json && output && output->count() > 0 && output->as<std::string>() == "-") {
-        throw failure(WRONG_USAGE, "--json and -o - both want standard output");
-      }
+    if (wants_standard_output(*verb, "--output") || wants_standard_output(*verb, "--signature")) {
+      throw failure(WRONG_USAGE, "--json and -o - both want standard output");
     }
     check_outputs(*verb, line);
   }
