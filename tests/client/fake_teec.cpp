@@ -28,7 +28,8 @@ void take(uint32_t types, const TEEC_Parameter* slots, request* seen) {
 }
 
 void put(const answer& reply, uint32_t types, TEEC_Parameter* slots) {
-  if (type_of(types, 0) != TEEC_VALUE_INOUT) return;
+  const uint32_t kind = type_of(types, 0);
+  if (kind != TEEC_VALUE_INOUT && kind != TEEC_VALUE_OUTPUT) return;
   slots[0].value = {static_cast<uint32_t>(reply.a), reply.b};
   if (type_of(types, 2) != TEEC_MEMREF_TEMP_OUTPUT) return;
   size_t room = std::min(slots[2].tmpref.size, reply.output.size());
