@@ -54,6 +54,11 @@ request abort_request(uint32_t handle) {
   return what;
 }
 
+request attest_request(byte_view blob, const param_set& params, size_t capacity) {
+  return make(command::ATTEST_KEY,
+              client::field_writer().field(blob).field(params.marshal()).take(), capacity);
+}
+
 reply ta_under_test::configure(uint32_t os_version, uint32_t os_patchlevel) {
   param_set params;
   params.add(KM_TAG_OS_VERSION, os_version).add(KM_TAG_OS_PATCHLEVEL, os_patchlevel);

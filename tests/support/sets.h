@@ -9,6 +9,14 @@ inline client::param_set one(keymaster_tag_t tag, uint64_t number) {
   return client::param_set().add(tag, number);
 }
 
+// several: one parameter of that tag for each number.
+inline client::param_set several(keymaster_tag_t tag, std::initializer_list<uint32_t> numbers) {
+  client::param_set set;
+  for (const uint32_t number : numbers)
+    set.add(tag, number);
+  return set;
+}
+
 // without: `set` less its parameters of that tag.
 inline client::param_set without(const client::param_set& set, keymaster_tag_t tag) {
   client::param_set result;

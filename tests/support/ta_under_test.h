@@ -98,6 +98,7 @@ request begin_request(uint32_t purpose, byte_view blob, const param_set& params 
 request step_request(command id, uint32_t handle, byte_view input = {},
                      const param_set& params = {}, size_t capacity = AMPLE);
 request abort_request(uint32_t handle);
+request attest_request(byte_view blob, const param_set& params = {}, size_t capacity = AMPLE);
 
 struct options {
   bool rpmb = true;

@@ -16,20 +16,13 @@ constexpr uint32_t UNKNOWN_MODE = 99;
 constexpr uint32_t ENCRYPT = KM_PURPOSE_ENCRYPT;
 constexpr uint32_t DECRYPT = KM_PURPOSE_DECRYPT;
 
-param_set numbers(keymaster_tag_t tag, std::initializer_list<uint32_t> values) {
-  param_set set;
-  for (uint32_t value : values)
-    set.add(tag, value);
-  return set;
-}
-
 // A key for both purposes, with every mode and padding, that takes nonces.
 param_set any_use() {
   return one(KM_TAG_ALGORITHM, KM_ALGORITHM_AES)
-      .append(numbers(KM_TAG_PURPOSE, {ENCRYPT, DECRYPT}))
-      .append(numbers(KM_TAG_BLOCK_MODE,
+      .append(several(KM_TAG_PURPOSE, {ENCRYPT, DECRYPT}))
+      .append(several(KM_TAG_BLOCK_MODE,
                       {KM_MODE_ECB, KM_MODE_CBC, KM_MODE_CTR, KM_MODE_GCM, UNKNOWN_MODE}))
-      .append(numbers(KM_TAG_PADDING, {KM_PAD_NONE, KM_PAD_PKCS7, KM_PAD_RSA_PSS}))
+      .append(several(KM_TAG_PADDING, {KM_PAD_NONE, KM_PAD_PKCS7, KM_PAD_RSA_PSS}))
       .add(KM_TAG_MIN_MAC_LENGTH, 96)
       .add_flag(KM_TAG_CALLER_NONCE)
       .add_flag(KM_TAG_NO_AUTH_REQUIRED);
@@ -37,7 +30,7 @@ param_set any_use() {
 
 // any_use with the values of one tag replaced.
 param_set any_use_but(keymaster_tag_t tag, std::initializer_list<uint32_t> values) {
-  return without(any_use(), tag).append(numbers(tag, values));
+  return without(any_use(), tag).append(several(tag, values));
 }
 
 // What a begin asks for; 0 and an empty nonce leave the parameter out.
@@ -188,7 +181,7 @@ TEST_F(aes, keys_are_checked) {
       {any_use().add(KM_TAG_CREATION_DATETIME, 1), -38,
        "Shouldn't specify KM_TAG_CREATION_DATETIME"},
       {any_use(), -38, no_size},
-      {any_use().append(numbers(KM_TAG_KEY_SIZE, {128, 128})), -38, no_size},
+      {any_use().append(several(KM_TAG_KEY_SIZE, {128, 128})), -38, no_size},
       {any_use().add(KM_TAG_KEY_SIZE, 160), -6, "Invalid AES key size 160"},
       {any_use_but(KM_TAG_MIN_MAC_LENGTH, {}).add(KM_TAG_KEY_SIZE, 128), -58, no_minimum},
       {any_use_but(KM_TAG_MIN_MAC_LENGTH, {96, 96}).add(KM_TAG_KEY_SIZE, 128), -58, no_minimum},
@@ -378,29 +371,6 @@ TEST_F(aes, padding_has_only_an_upper_bound) {
     EXPECT_EQ(last.ok(), !ta.trace().has("aes_decrypt_finish: Illegal padding"));
     block.resize(row.length);
     EXPECT_EQ(finished(last), block);
-  }
-}
-
-// The commands of a key's life up to the first that fails; whether all are done.
-bool live_through(ta_under_test* ta, uint32_t purpose, const param_set& params, byte_view input) {
-  const reply made = ta->send(generate_request(any_use().add(KM_TAG_KEY_SIZE, 128)));
-  if (!made.ok()) return false;
-  const reply begun = ta->begin(purpose, made.output(), params);
-  return begun.ok() && ta->update(begun.b, input).ok() && ta->finish(begun.b).ok();
-}
-
-TEST_F(aes, failures_of_the_platform_are_reported_and_leave_nothing) {
-  const std::pair<uint32_t, param_set> uses[] = {
-      {ENCRYPT, gcm}, {ENCRYPT, padded}, {DECRYPT, use(KM_MODE_CBC)}};
-  for (const auto& [purpose, params] : uses) {
-    bool fired = true;
-    for (uint64_t n = 1; fired; n++) {
-      tee::host::fail_nth_call(n, TEEC_ERROR_OUT_OF_MEMORY);
-      const bool done = live_through(&ta, purpose, params, bytes(2 * BLOCK, 3));
-      fired = tee::host::fault_fired();
-      tee::host::clear_fault();
-      EXPECT_NE(done, fired) << "call " << n;
-    }
   }
 }
 

@@ -1,4 +1,5 @@
 // Attestation through the command interface, read back and verified with libcrypto.
+#include <algorithm>
 #include <cstring>
 #include <gtest/gtest.h>
 #include <memory>
@@ -7,12 +8,16 @@
 #include <openssl/x509v3.h>
 #include <string>
 
+#include "support/sets.h"
 #include "support/ta_under_test.h"
 
 namespace keymaster::test {
 namespace {
 
+using namespace std::string_literals;
+
 constexpr size_t STORED_SIZE = 783;
+constexpr char KEY_DESCRIPTION[] = "1.3.6.1.4.1.11129.2.1.17";
 
 struct deleter {
   void operator()(X509* certificate) const { X509_free(certificate); }
@@ -47,25 +52,16 @@ std::vector<certificate> parse_chain(byte_view chain) {
   return links;
 }
 
-request attest_request(byte_view blob, const param_set& params = {}, size_t capacity = AMPLE) {
-  client::field_writer input;
-  input.field(blob).field(params.marshal());
-  return {static_cast<uint32_t>(command::ATTEST_KEY), 0, input.take(), capacity};
-}
-
 param_set ec_description() {
-  param_set set;
-  set.add(KM_TAG_ALGORITHM, KM_ALGORITHM_EC)
+  return one(KM_TAG_ALGORITHM, KM_ALGORITHM_EC)
       .add(KM_TAG_KEY_SIZE, 256)
       .add(KM_TAG_PURPOSE, KM_PURPOSE_SIGN)
       .add(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256)
       .add_flag(KM_TAG_NO_AUTH_REQUIRED);
-  return set;
 }
 
 param_set rsa_description() {
-  param_set set;
-  set.add(KM_TAG_ALGORITHM, KM_ALGORITHM_RSA)
+  return one(KM_TAG_ALGORITHM, KM_ALGORITHM_RSA)
       .add(KM_TAG_KEY_SIZE, 1024)
       .add(KM_TAG_RSA_PUBLIC_EXPONENT, 65537)
       .add(KM_TAG_PURPOSE, KM_PURPOSE_SIGN)
@@ -73,12 +69,16 @@ param_set rsa_description() {
       .add(KM_TAG_ACTIVE_DATETIME, 1'000'000'000'999)
       .add(KM_TAG_USAGE_EXPIRE_DATETIME, 1'900'000'000'000)
       .add_flag(KM_TAG_NO_AUTH_REQUIRED);
-  return set;
 }
 
-std::string time_text(const ASN1_TIME* time) {
-  return std::string(reinterpret_cast<const char*>(ASN1_STRING_get0_data(time)),
-                     static_cast<size_t>(ASN1_STRING_length(time)));
+std::string text_of(const ASN1_STRING* string) {
+  return std::string(reinterpret_cast<const char*>(ASN1_STRING_get0_data(string)),
+                     static_cast<size_t>(ASN1_STRING_length(string)));
+}
+
+// With its terminating zero, which is part of it.
+std::string common_name(const X509_NAME* name) {
+  return text_of(X509_NAME_ENTRY_get_data(X509_NAME_get_entry(name, 0)));
 }
 
 // The content octets of extension `id` of a certificate, in hex.
@@ -96,18 +96,25 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
   ta_under_test ta;
   const struct {
     param_set description;
+    param_set params;
     const char* not_before;
     const char* not_after;
     bytes key_usage;
   } cases[] = {
-      {ec_description(), "700101000000Z", "060207062815Z", {3, 2, 0, 0x80}},
+      {ec_description(), {}, "700101000000Z", "060207062815Z", {3, 2, 0, 0x80}},
+      // The algorithm that is asked for chooses no other key.
+      {without(rsa_description(), KM_TAG_PURPOSE).add(KM_TAG_PURPOSE, KM_PURPOSE_DECRYPT),
+       one(KM_TAG_ALGORITHM, KM_ALGORITHM_EC),
+       "010909014640Z",
+       "700219170247Z",
+       {3, 2, 0, 0x30}},
       // The expiry is cut to 32 bits of milliseconds before it becomes seconds.
-      {rsa_description(), "010909014640Z", "700219170247Z", {3, 2, 0, 0xB0}},
+      {rsa_description(), {}, "010909014640Z", "700219170247Z", {3, 2, 0, 0xB0}},
   };
   for (const auto& row : cases) {
     const bytes blob = ta.generate(row.description);
-    param_set params;
-    params.add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes{1, 2, 3});
+    const param_set params =
+        param_set(row.params).add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes{1, 2, 3});
     const reply answer = ta.send(attest_request(blob, params));
     ASSERT_TRUE(succeeded(answer));
     EXPECT_EQ(answer.b, 2u);
@@ -118,14 +125,13 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     EXPECT_EQ(X509_check_issued(chain[1].get(), chain[0].get()), X509_V_OK);
     EXPECT_EQ(X509_get_version(chain[0].get()), 2);
     EXPECT_EQ(ASN1_INTEGER_get(X509_get0_serialNumber(chain[0].get())), 1);
-    EXPECT_EQ(time_text(X509_get0_notBefore(chain[0].get())), row.not_before);
-    EXPECT_EQ(time_text(X509_get0_notAfter(chain[0].get())), row.not_after);
+    EXPECT_EQ(text_of(X509_get0_notBefore(chain[0].get())), row.not_before);
+    EXPECT_EQ(text_of(X509_get0_notAfter(chain[0].get())), row.not_after);
     EXPECT_EQ(extension_value(chain[0], "2.5.29.15"), row.key_usage);
-    EXPECT_FALSE(extension_value(chain[0], "1.3.6.1.4.1.11129.2.1.17").empty());
-    // The common name keeps its terminating zero.
-    const X509_NAME* subject = X509_get_subject_name(chain[0].get());
-    const ASN1_STRING* name = X509_NAME_ENTRY_get_data(X509_NAME_get_entry(subject, 0));
-    EXPECT_EQ(ASN1_STRING_length(name), 16);
+    EXPECT_FALSE(extension_value(chain[0], KEY_DESCRIPTION).empty());
+    EXPECT_EQ(common_name(X509_get_subject_name(chain[0].get())), "A Keymaster Key\0"s);
+    EXPECT_EQ(common_name(X509_get_issuer_name(chain[0].get())).size(), 18u);
+    EXPECT_EQ(X509_get_signature_nid(chain[0].get()), NID_sha256WithRSAEncryption);
   }
 }
 
@@ -141,8 +147,8 @@ TEST(Attestation, SubjectKeyIsTheExportedKey) {
   EXPECT_EQ(EVP_PKEY_eq(key.get(), X509_get0_pubkey(chain.at(0).get())), 1);
 }
 
-// Capacities: a length that does not fit, a new certificate that does not fit, a stored one
-// that does not fit, and room for all.
+// A length, a new certificate or the stored one that does not fit, and room for all; the sizes
+// between are the sweep's.
 TEST(Attestation, Capacities) {
   ta_under_test ta;
   const bytes blob = ta.generate(ec_description());
@@ -150,44 +156,53 @@ TEST(Attestation, Capacities) {
   ASSERT_TRUE(succeeded(whole));
   const size_t first = 4 + load_u32(whole.output());
   ASSERT_EQ(whole.output_size, first + 4 + STORED_SIZE);
-  // Each one costs a signature: all near the boundaries, one in 61 between them.
-  const auto near = [](size_t a, size_t b) { return a + 6 > b && b + 6 > a; };
-  for (size_t capacity = 0; capacity <= whole.output_size + 1; capacity++) {
-    if (!near(capacity, 4) && !near(capacity, first) && !near(capacity, whole.output_size) &&
-        capacity % 61 != 0) {
-      continue;
-    }
-    const reply answer = ta.send(attest_request(blob, {}, capacity));
-    if (capacity < 4) {
-      ASSERT_TRUE(failed_with(answer, TEEC_ERROR_GENERIC)) << capacity;
-    } else if (capacity < first) {
-      ASSERT_TRUE(refused(answer, KM_ERROR_MEMORY_ALLOCATION_FAILED)) << capacity;
-    } else if (capacity < whole.output_size) {
-      ASSERT_TRUE(failed_with(answer, TEEC_ERROR_GENERIC)) << capacity;
-      ASSERT_EQ(answer.b, 1u);
-    } else {
-      ASSERT_TRUE(succeeded(answer)) << capacity;
-    }
-    ASSERT_EQ(answer.output_size, answer.ok() ? whole.output_size : 0u);
+  const struct {
+    size_t capacity;
+    TEEC_Result res;
+    int32_t error;
+    uint32_t b;
+  } rows[] = {{0, TEEC_ERROR_GENERIC, 0, 0},
+              {3, TEEC_ERROR_GENERIC, 0, 0},
+              {4, TEEC_SUCCESS, KM_ERROR_MEMORY_ALLOCATION_FAILED, 0},
+              {first - 1, TEEC_SUCCESS, KM_ERROR_MEMORY_ALLOCATION_FAILED, 0},
+              {first, TEEC_ERROR_GENERIC, 0, 1},
+              {whole.output_size - 1, TEEC_ERROR_GENERIC, 0, 1},
+              {whole.output_size, TEEC_SUCCESS, 0, 2}};
+  for (const auto& row : rows) {
+    const reply answer = ta.send(attest_request(blob, {}, row.capacity));
+    EXPECT_TRUE(failed_with(answer, row.res)) << row.capacity;
+    EXPECT_EQ(answer.km_error, row.error) << row.capacity;
+    EXPECT_EQ(answer.b, row.b) << row.capacity;
+    EXPECT_EQ(answer.output_size, answer.ok() ? whole.output_size : 0u);
   }
 }
 
 TEST(Attestation, Refusals) {
   ta_under_test ta;
-  param_set hmac;
-  hmac.add(KM_TAG_ALGORITHM, KM_ALGORITHM_HMAC)
-      .add(KM_TAG_KEY_SIZE, 256)
-      .add(KM_TAG_MIN_MAC_LENGTH, 128)
-      .add(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256);
-  EXPECT_TRUE(refused(ta.send(attest_request(ta.generate(hmac))), KM_ERROR_UNSUPPORTED_ALGORITHM));
+  EXPECT_TRUE(
+      refused(ta.send(attest_request(ta.generate(hmac_key(256)))), KM_ERROR_UNSUPPORTED_ALGORITHM));
   const bytes blob = ta.generate(ec_description());
-  param_set params;
-  params.add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes(129));
-  EXPECT_TRUE(refused(ta.send(attest_request(blob, params)), KM_ERROR_INVALID_INPUT_LENGTH));
+  const auto challenge = param_set().add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes(129));
+  EXPECT_TRUE(refused(ta.send(attest_request(blob, challenge)), KM_ERROR_INVALID_INPUT_LENGTH));
   EXPECT_TRUE(refused(ta.send(attest_request(bytes{1})), KM_ERROR_KEY_REQUIRES_UPGRADE));
-  param_set unique = ec_description();
-  unique.add_flag(KM_TAG_INCLUDE_UNIQUE_ID);
-  EXPECT_TRUE(refused(ta.send(attest_request(ta.generate(unique))), KM_ERROR_UNIMPLEMENTED));
+  const bytes unique = ta.generate(ec_description().add_flag(KM_TAG_INCLUDE_UNIQUE_ID));
+  EXPECT_TRUE(refused(ta.send(attest_request(unique)), KM_ERROR_UNIMPLEMENTED));
+  request no_set = attest_request(blob);
+  no_set.input[4 + blob.size() + 4] = 3;  // announces parameters that are not there
+  EXPECT_TRUE(failed_with(ta.send(no_set), TEEC_ERROR_BAD_PARAMETERS));
+}
+
+// A description beyond 2048 bytes; the application is attested without being asked for.
+TEST(Attestation, OfLongDescriptions) {
+  ta_under_test ta;
+  const bytes application(2500, 'x');
+  const bytes blob = ta.generate(ec_description().add_bytes(KM_TAG_APPLICATION_ID, application));
+  const reply answer = ta.send(attest_request(blob));
+  ASSERT_TRUE(succeeded(answer)) << ta.trace().errors();
+  const std::vector<certificate> chain = parse_chain(answer.output());
+  const bytes description = extension_value(chain.at(0), KEY_DESCRIPTION);
+  EXPECT_NE(std::ranges::search(description, application).begin(), description.end());
+  EXPECT_EQ(X509_verify(chain[0].get(), X509_get0_pubkey(chain.at(1).get())), 1);
 }
 
 }  // namespace

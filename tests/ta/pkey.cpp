@@ -1,9 +1,6 @@
 #include "ta/pkey.h"
 
-#include <openssl/core_names.h>
 #include <openssl/err.h>
-#include <openssl/param_build.h>
-#include <openssl/rsa.h>
 #include <openssl/x509.h>
 #include <stdexcept>
 #include <string>
@@ -11,45 +8,26 @@
 namespace keymaster::test {
 namespace {
 
-using client::from_hex;
-
 void must(bool done, const char* what) {
   if (!done) throw std::runtime_error(std::string(what) + " failed in libcrypto");
 }
 
 struct deleter {
-  void operator()(BIGNUM* p) const { BN_free(p); }
-  void operator()(BN_CTX* p) const { BN_CTX_free(p); }
   void operator()(EVP_PKEY_CTX* p) const { EVP_PKEY_CTX_free(p); }
-  void operator()(OSSL_PARAM_BLD* p) const { OSSL_PARAM_BLD_free(p); }
-  void operator()(OSSL_PARAM* p) const { OSSL_PARAM_free(p); }
 };
-template <typename T>
-using owner = std::unique_ptr<T, deleter>;
-
-owner<BIGNUM> number_of(byte_view big_endian) {
-  return owner<BIGNUM>(BN_bin2bn(big_endian.data(), static_cast<int>(big_endian.size()), nullptr));
-}
+using owned_context = std::unique_ptr<EVP_PKEY_CTX, deleter>;
 
 constexpr const char* RSA_NUMBERS[] = {
     OSSL_PKEY_PARAM_RSA_N,         OSSL_PKEY_PARAM_RSA_E,           OSSL_PKEY_PARAM_RSA_D,
     OSSL_PKEY_PARAM_RSA_FACTOR1,   OSSL_PKEY_PARAM_RSA_FACTOR2,     OSSL_PKEY_PARAM_RSA_EXPONENT1,
     OSSL_PKEY_PARAM_RSA_EXPONENT2, OSSL_PKEY_PARAM_RSA_COEFFICIENT1};
+constexpr const char* EC_NUMBERS[] = {OSSL_PKEY_PARAM_EC_PUB_X, OSSL_PKEY_PARAM_EC_PUB_Y,
+                                      OSSL_PKEY_PARAM_PRIV_KEY};
 
 const char* curve_name(uint32_t bits) {
   if (bits == 521) return "secp521r1";
   if (bits == 384) return "secp384r1";
   return bits == 256 ? "prime256v1" : "secp224r1";
-}
-
-EVP_PKEY* build(const char* type, OSSL_PARAM_BLD* parts) {
-  const owner<OSSL_PARAM> params(OSSL_PARAM_BLD_to_param(parts));
-  const owner<EVP_PKEY_CTX> context(EVP_PKEY_CTX_new_from_name(nullptr, type, nullptr));
-  EVP_PKEY* key = nullptr;
-  must(EVP_PKEY_fromdata_init(context.get()) == 1 &&
-           EVP_PKEY_fromdata(context.get(), &key, EVP_PKEY_KEYPAIR, params.get()) == 1,
-       "EVP_PKEY_fromdata");
-  return key;
 }
 
 const EVP_MD* digest_of(uint32_t digest) {
@@ -74,15 +52,15 @@ void set_padding(EVP_PKEY_CTX* context, scheme how, int salt) {
 
 using init_call = int (*)(EVP_PKEY_CTX*);
 
-owner<EVP_PKEY_CTX> prepared(EVP_PKEY* key, init_call init, scheme how, int salt) {
-  owner<EVP_PKEY_CTX> context(EVP_PKEY_CTX_new_from_pkey(nullptr, key, nullptr));
-  must(init(context.get()) == 1, "init");
-  set_padding(context.get(), how, salt);
+owned_context prepared(EVP_PKEY* key, init_call init, scheme how, int salt) {
+  owned_context made(EVP_PKEY_CTX_new_from_pkey(nullptr, key, nullptr));
+  must(init(made.get()) == 1, "init");
+  set_padding(made.get(), how, salt);
   const bool signs = init == EVP_PKEY_sign_init || init == EVP_PKEY_verify_init;
   if (signs && how.digest != KM_DIGEST_NONE) {
-    must(EVP_PKEY_CTX_set_signature_md(context.get(), digest_of(how.digest)) == 1, "signature_md");
+    must(EVP_PKEY_CTX_set_signature_md(made.get(), digest_of(how.digest)) == 1, "signature_md");
   }
-  return context;
+  return made;
 }
 
 bytes hashed(uint32_t digest, byte_view message) {
@@ -110,33 +88,12 @@ pkey::pkey(EVP_PKEY* key) : key_(key) {
   must(key != nullptr, "making a key");
 }
 
-pkey pkey::rsa(const char* p, const char* q) {
-  const owner<BN_CTX> scratch(BN_CTX_new());
-  const auto made = [] { return owner<BIGNUM>(BN_new()); };
-  owner<BIGNUM> numbers[] = {made(),
-                             number_of(from_hex("010001")),
-                             made(),
-                             number_of(from_hex(p)),
-                             number_of(from_hex(q)),
-                             made(),
-                             made(),
-                             made()};
-  auto& [n, e, d, p_, q_, dp, dq, qi] = numbers;
-  const owner<BIGNUM> p1(BN_dup(p_.get()));
-  const owner<BIGNUM> q1(BN_dup(q_.get()));
-  const owner<BIGNUM> order = made();
-  must(BN_sub_word(p1.get(), 1) && BN_sub_word(q1.get(), 1) &&
-           BN_mul(n.get(), p_.get(), q_.get(), scratch.get()) &&
-           BN_mul(order.get(), p1.get(), q1.get(), scratch.get()) &&
-           BN_mod_inverse(d.get(), e.get(), order.get(), scratch.get()) != nullptr &&
-           BN_mod(dp.get(), d.get(), p1.get(), scratch.get()) &&
-           BN_mod(dq.get(), d.get(), q1.get(), scratch.get()) &&
-           BN_mod_inverse(qi.get(), q_.get(), p_.get(), scratch.get()) != nullptr,
-       "RSA numbers");
-  const owner<OSSL_PARAM_BLD> parts(OSSL_PARAM_BLD_new());
-  for (size_t i = 0; i < std::size(RSA_NUMBERS); i++)
-    OSSL_PARAM_BLD_push_BN(parts.get(), RSA_NUMBERS[i], numbers[i].get());
-  return pkey(build("RSA", parts.get()));
+pkey pkey::rsa(uint32_t bits) {
+  return pkey(EVP_RSA_gen(bits));
+}
+
+pkey pkey::ec(uint32_t bits) {
+  return pkey(EVP_EC_gen(curve_name(bits)));
 }
 
 pkey pkey::rsa_public(byte_view spki) {
@@ -146,7 +103,7 @@ pkey pkey::rsa_public(byte_view spki) {
   return key;
 }
 
-pkey pkey::ec(byte_view raw) {
+pkey pkey::ec_public(byte_view raw) {
   client::field_reader in(raw);
   const uint32_t bits = in.u32();
   bytes point{4};
@@ -155,42 +112,52 @@ pkey pkey::ec(byte_view raw) {
     must(coordinate.size() == (bits + 7) / 8, "a coordinate of full length");
     point.insert(point.end(), coordinate.begin(), coordinate.end());
   }
-  owner<BIGNUM> secret;
-  if (in.left() != 0) secret = number_of(in.field());
-  const owner<OSSL_PARAM_BLD> parts(OSSL_PARAM_BLD_new());
-  OSSL_PARAM_BLD_push_utf8_string(parts.get(), OSSL_PKEY_PARAM_GROUP_NAME, curve_name(bits), 0);
-  OSSL_PARAM_BLD_push_octet_string(parts.get(), OSSL_PKEY_PARAM_PUB_KEY, point.data(),
-                                   point.size());
-  if (secret) OSSL_PARAM_BLD_push_BN(parts.get(), OSSL_PKEY_PARAM_PRIV_KEY, secret.get());
-  return pkey(build("EC", parts.get()));
+  must(in.left() == 0, "the end of the record");
+  OSSL_PARAM parts[] = {
+      OSSL_PARAM_construct_utf8_string(OSSL_PKEY_PARAM_GROUP_NAME,
+                                       const_cast<char*>(curve_name(bits)), 0),
+      OSSL_PARAM_construct_octet_string(OSSL_PKEY_PARAM_PUB_KEY, point.data(), point.size()),
+      OSSL_PARAM_construct_end()};
+  const owned_context maker(EVP_PKEY_CTX_new_from_name(nullptr, "EC", nullptr));
+  EVP_PKEY* key = nullptr;
+  must(EVP_PKEY_fromdata_init(maker.get()) == 1 &&
+           EVP_PKEY_fromdata(maker.get(), &key, EVP_PKEY_PUBLIC_KEY, parts) == 1,
+       "EVP_PKEY_fromdata");
+  return pkey(key);
 }
 
 bytes pkey::import_data() const {
   client::field_writer out;
-  for (const char* name : RSA_NUMBERS)
-    out.field(number(name));
+  if (EVP_PKEY_is_a(key_.get(), "RSA")) {
+    for (const char* name : RSA_NUMBERS)
+      out.field(number(name));
+    return out.take();
+  }
+  out.u32(bits());
+  for (const char* name : EC_NUMBERS)
+    out.field(right_aligned(number(name), (bits() + 7) / 8));
   return out.take();
 }
 
 bytes pkey::number(const char* name) const {
   BIGNUM* found = nullptr;
   must(EVP_PKEY_get_bn_param(key_.get(), name, &found) == 1, name);
-  const owner<BIGNUM> number(found);
   bytes result(static_cast<size_t>(BN_num_bytes(found)));
   BN_bn2bin(found, result.data());
+  BN_clear_free(found);
   return result;
 }
 
 bytes pkey::sign(scheme how, byte_view message, int salt) const {
-  const auto context = prepared(key_.get(), EVP_PKEY_sign_init, how, salt);
-  return run(EVP_PKEY_sign, context.get(), hashed(how.digest, message));
+  const auto made = prepared(key_.get(), EVP_PKEY_sign_init, how, salt);
+  return run(EVP_PKEY_sign, made.get(), hashed(how.digest, message));
 }
 
 bool pkey::verify(scheme how, byte_view message, byte_view signature, int salt) const {
-  const auto context = prepared(key_.get(), EVP_PKEY_verify_init, how, salt);
+  const auto made = prepared(key_.get(), EVP_PKEY_verify_init, how, salt);
   const bytes digest = hashed(how.digest, message);
-  const int outcome = EVP_PKEY_verify(context.get(), signature.data(), signature.size(),
-                                      digest.data(), digest.size());
+  const int outcome =
+      EVP_PKEY_verify(made.get(), signature.data(), signature.size(), digest.data(), digest.size());
   ERR_clear_error();
   return outcome == 1;
 }
@@ -203,26 +170,9 @@ bytes pkey::decrypt(scheme how, byte_view message) const {
   return run(EVP_PKEY_decrypt, prepared(key_.get(), EVP_PKEY_decrypt_init, how, 0).get(), message);
 }
 
-void expect_faults_reported(const std::function<bool()>& use) {
-  bool fired = true;
-  for (uint64_t n = 1; fired; n++) {
-    tee::host::fail_nth_call(n, TEEC_ERROR_OUT_OF_MEMORY);
-    const bool done = use();
-    fired = tee::host::fault_fired();
-    tee::host::clear_fault();
-    EXPECT_NE(done, fired) << "call " << n;
-  }
-}
-
-bool live_through(ta_under_test* ta, const param_set& description, byte_view key_data,
-                  uint32_t purpose, const param_set& params, byte_view input, byte_view last) {
-  const reply made = ta->send(import_request(description, key_data));
-  if (!made.ok()) return false;
-  client::key_result key;
-  client::parse_imported(made.output(), &key);
-  const reply begun = ta->begin(purpose, key.blob, params);
-  return begun.ok() && ta->update(begun.b, input).ok() && ta->finish(begun.b, last).ok() &&
-         ta->send(key_request(command::EXPORT_KEY, key.blob)).ok();
+bytes right_aligned(bytes data, size_t size) {
+  data.insert(data.begin(), size - data.size(), 0);
+  return data;
 }
 
 }  // namespace keymaster::test

@@ -2,9 +2,10 @@
 // makes what the TA checks.
 #pragma once
 
-#include <functional>
 #include <memory>
+#include <openssl/core_names.h>
 #include <openssl/evp.h>
+#include <openssl/rsa.h>
 
 #include "support/ta_under_test.h"
 
@@ -19,23 +20,25 @@ struct scheme {
 // pkey: a key pair or public key. Failures of libcrypto throw.
 class pkey {
  public:
-  // With e = 65537; from two primes in hexadecimal.
-  static pkey rsa(const char* p, const char* q);
-  // From a SubjectPublicKeyInfo.
+  // New ones; RSA keys have the exponent 65537.
+  static pkey rsa(uint32_t bits);
+  static pkey ec(uint32_t bits);
+  // What export_key gives: a SubjectPublicKeyInfo; the size in bits and the fields X and Y.
   static pkey rsa_public(byte_view spki);
-  // From the raw form of an imported or, without the private value, exported key.
-  static pkey ec(byte_view raw);
+  static pkey ec_public(byte_view raw);
 
-  // RSA: in the form that import_key takes.
+  // In the form that import_key takes.
   bytes import_data() const;
   // A number of the key, OSSL_PKEY_PARAM_*, without leading zeros.
   bytes number(const char* name) const;
   size_t size() const { return static_cast<size_t>(EVP_PKEY_get_size(key_.get())); }
+  uint32_t bits() const { return static_cast<uint32_t>(EVP_PKEY_get_bits(key_.get())); }
 
   // Over `message`; with KM_DIGEST_NONE over its bytes as they are. A PSS salt is `salt` bytes
   // long, or as libcrypto's RSA_PSS_SALTLEN_* say.
-  bytes sign(scheme how, byte_view message, int salt = -2) const;
-  bool verify(scheme how, byte_view message, byte_view signature, int salt = -2) const;
+  bytes sign(scheme how, byte_view message, int salt = RSA_PSS_SALTLEN_AUTO) const;
+  bool verify(scheme how, byte_view message, byte_view signature,
+              int salt = RSA_PSS_SALTLEN_AUTO) const;
 
   bytes encrypt(scheme how, byte_view message) const;
   bytes decrypt(scheme how, byte_view message) const;
@@ -49,12 +52,7 @@ class pkey {
   std::unique_ptr<EVP_PKEY, closer> key_;
 };
 
-// expect_faults_reported: runs `use`, which tells whether all of it was done, failing the first
-// call of the platform that can fail, then the second and so on, until none is left to fail.
-void expect_faults_reported(const std::function<bool()>& use);
-
-// live_through: imports a key and uses it once, `last` being given to finish; whether all was done.
-bool live_through(ta_under_test* ta, const param_set& description, byte_view key_data,
-                  uint32_t purpose, const param_set& params, byte_view input, byte_view last);
+// right_aligned: `data` with zeros in front, `size` bytes in all.
+bytes right_aligned(bytes data, size_t size);
 
 }  // namespace keymaster::test

@@ -1,8 +1,5 @@
 // RSA through the command interface, against libcrypto: every padding and digest in both
 // directions, the limits of messages, keys of every form, and what is refused.
-#include <openssl/core_names.h>
-#include <openssl/rsa.h>
-
 #include "support/sets.h"
 #include "support/ta_under_test.h"
 #include "ta/pkey.h"
@@ -21,33 +18,18 @@ constexpr scheme PKCS1_SHA1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA1};
 constexpr scheme PKCS1_ENCRYPT = {KM_PAD_RSA_PKCS1_1_5_ENCRYPT, KM_DIGEST_NONE};
 constexpr scheme OAEP_SHA256 = {KM_PAD_RSA_OAEP, KM_DIGEST_SHA_2_256};
 
-// Made with the openssl command.
 const pkey& key_512() {
-  static const pkey key =
-      pkey::rsa("fc8bac6a15bb3eb9223d6b2bf9cc1a35cd51620a7c3b9eb7e313359f0038e63b",
-                "f2e28ad4738b3978bc5e0843e34f1ff683e1d3f1817597ee9b77280bd3d3e369");
+  static const pkey key = pkey::rsa(512);
   return key;
 }
 
 const pkey& key_1024() {
-  static const pkey key = pkey::rsa(
-      "fca8aa82aabaac028b8f7f585e08b017c84ccfdbe30b91101eb6f3d2d1cf12f7"
-      "fba950123901dbf5bd77cb4ac702d5ea82835577bb593e52e2d39aa61ac94369",
-      "f6b47d23c7312f9a6f86628fa0ca80ee45417a44e2364cf900cd1a8f587b3466"
-      "8f60bc2d35d0bbb6c864d7be80d3cf155d304dde78bcb613a1f049e29786017d");
+  static const pkey key = pkey::rsa(1024);
   return key;
 }
 
 const pkey& key_2048() {
-  static const pkey key = pkey::rsa(
-      "d09047564e7614ee5f69c4de1e9ac9d5ed314048d7c651746653c991a5d7098c"
-      "03a09c3764b0906cc76c5fb5da094d8c358608401164137acbc0124735c533f4"
-      "450026bdbb0812b978354d012566780617c9e0c721ee535cfb38bb60ff496fc8"
-      "5508ad724513f7e28ce390037d2a6e5be9a0b08c787f2b6e8ddb1c34becb079f",
-      "b95286d2d4f16289a7a87c6dda9426885e24af54f43532cb22100c148ede3d5d"
-      "a3adecf49a847fbe02076f300f2975ea772d15a5a6d3eb095e602682421203e7"
-      "b236eb148ab3bb66c172547371dfc1f4780c06344c4006eb65c421553ba20bea"
-      "340feef2e914b163689c14f48939841c273a8b4dbb4219671a261c7c00d94da9");
+  static const pkey key = pkey::rsa(2048);
   return key;
 }
 
@@ -76,11 +58,6 @@ bytes text(size_t length) {
   for (size_t i = 0; i < length; i++)
     result[i] = static_cast<uint8_t>(i * 7 + 1);
   return result;
-}
-
-bytes right_aligned(bytes data, size_t size) {
-  data.insert(data.begin(), size - data.size(), 0);
-  return data;
 }
 
 class Rsa : public testing::Test {
@@ -253,11 +230,39 @@ TEST_F(Rsa, PssSaltsAreAsLongAsTheDigestOrAsFits) {
       EXPECT_TRUE(succeeded(verify(blob, how, text(99), row.key.sign(how, text(99), salt))));
     }
   }
+  for (uint32_t digest : {KM_DIGEST_SHA_2_384, KM_DIGEST_SHA_2_512}) {
+    const param_set pss = use({KM_PAD_RSA_PSS, digest});
+    EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_VERIFY, imported(key_512()), pss), -13));
+  }
   const param_set pss = use({KM_PAD_RSA_PSS, KM_DIGEST_SHA_2_512});
   EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, imported(key_512()), pss), -13));
   EXPECT_TRUE(
       ta.trace().has("create_rsa_sign: Too short key to fit digest, flag and salt, "
                      "key_size 512, need 688"));
+}
+
+// The smallest key takes every digest but with PKCS #1 v1.5 and SHA-512 the block has no room: an
+// error, and no harm. The largest ones work.
+TEST_F(Rsa, KeysOfEverySizeSign) {
+  for (uint32_t bits : {512u, 520u, 752u, 3072u, 4096u}) {
+    const pkey key = pkey::rsa(bits);
+    const bytes blob = imported(key);
+    for (uint32_t digest = KM_DIGEST_SHA_2_256; digest <= KM_DIGEST_SHA_2_512; digest++) {
+      SCOPED_TRACE(std::to_string(bits) + " bits, digest " + std::to_string(digest));
+      const scheme how = {KM_PAD_RSA_PKCS1_1_5_SIGN, digest};
+      const size_t need = 11 + 19 + 16 * (digest - 2);  // padding, DigestInfo and digest
+      if (key.size() >= need) {
+        const bytes made = ta.run(KM_PURPOSE_SIGN, blob, use(how), text(70));
+        EXPECT_TRUE(key.verify(how, text(70), made));
+        EXPECT_TRUE(succeeded(verify(blob, how, text(70), made)));
+        continue;
+      }
+      const uint32_t handle = ta.begun(KM_PURPOSE_SIGN, blob, use(how));
+      EXPECT_TRUE(succeeded(ta.update(handle, text(70))));
+      EXPECT_FALSE(ta.finish(handle).ok());
+      EXPECT_FALSE(verify(blob, how, text(70), bytes(key.size(), 1)).ok());
+    }
+  }
 }
 
 TEST_F(Rsa, BeginWantsOnePaddingAndOneDigest) {
@@ -267,6 +272,18 @@ TEST_F(Rsa, BeginWantsOnePaddingAndOneDigest) {
     for (const param_set& params : {without(use(PKCS1), tag), use(PKCS1).add(tag, 5)}) {
       EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_VERIFY, blob, params), -38));
       EXPECT_TRUE(ta.trace().has(std::string("create_rsa_verify: No or too many ") + name));
+    }
+  }
+  // Digests that nothing knows, in a key that allows them.
+  const uint32_t strange[] = {8, 0x7FFFFFFF, 0x80000000, 0xFFFFFFFF};
+  param_set key = any_use();
+  for (uint32_t digest : strange)
+    key.add(KM_TAG_DIGEST, digest);
+  const bytes lenient = ta.import(key, key_512().import_data());
+  for (uint32_t digest : strange) {
+    for (uint32_t padding : {KM_PAD_NONE, KM_PAD_RSA_PSS, KM_PAD_RSA_OAEP}) {
+      const uint32_t purpose = padding == KM_PAD_RSA_OAEP ? KM_PURPOSE_DECRYPT : KM_PURPOSE_SIGN;
+      EXPECT_TRUE(refused(ta.begin(purpose, lenient, use({padding, digest})), -12)) << digest;
     }
   }
 }
@@ -405,11 +422,6 @@ TEST_F(Rsa, ImportsTellTheirSizeAndExponent) {
   }
   const bytes dated = ta.import(any_use().add(KM_TAG_CREATION_DATETIME, 77), altered({}));
   EXPECT_EQ(ta.characteristics(dated).number(KM_TAG_CREATION_DATETIME), 77U);
-  const bytes data = altered({});
-  for (size_t size = 0; size < data.size(); size++) {
-    const request cut = import_request(any_use(), byte_view(data).first(size));
-    EXPECT_TRUE(failed_with(ta.send(cut), TEEC_ERROR_GENERIC)) << size;
-  }
 }
 
 TEST_F(Rsa, ImportsOfUnusualFormAreUsed) {
@@ -456,28 +468,6 @@ TEST_F(Rsa, SoterKeysWaitForTheirResources) {
   EXPECT_NE(ta.trace().errors().find("create_rsa_sign: soter resources is not ready, error 0x"),
             std::string::npos);
   EXPECT_TRUE(succeeded(ta.abort(ta.begun(KM_PURPOSE_VERIFY, blob, params))));
-}
-
-TEST_F(Rsa, FailuresOfThePlatformAreReportedAndLeaveNothing) {
-  ta.watch_secret(key_512().number(OSSL_PKEY_PARAM_RSA_D));
-  const struct {
-    uint32_t purpose;
-    scheme how;
-    bytes last;  // what finish is given
-  } rows[] = {{KM_PURPOSE_SIGN, {KM_PAD_RSA_PSS, KM_DIGEST_SHA1}, {}},
-              {KM_PURPOSE_SIGN, RAW, {}},
-              {KM_PURPOSE_VERIFY, PKCS1_SHA1, key_512().sign(PKCS1_SHA1, text(8))},
-              {KM_PURPOSE_VERIFY, PKCS1, key_512().sign(PKCS1, text(8))},
-              {KM_PURPOSE_ENCRYPT, PKCS1_ENCRYPT, {}},
-              {KM_PURPOSE_DECRYPT, RAW, {}}};
-  for (const auto& row : rows) {
-    SCOPED_TRACE(row.purpose);
-    expect_faults_reported([&] {
-      return live_through(&ta, any_use(), key_512().import_data(), row.purpose, use(row.how),
-                          text(8), row.last);
-    });
-  }
-  expect_faults_reported([&] { return ta.send(generate_request(new_key(512, 65537))).ok(); });
 }
 
 }  // namespace
