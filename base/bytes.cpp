@@ -32,11 +32,26 @@ bool input_cursor::read_into(byte_span to) {
   return true;
 }
 
+bool input_cursor::read_u16(uint16_t* value) {
+  uint8_t bytes[2];
+  if (!read_into(bytes)) return false;
+  *value = static_cast<uint16_t>(bytes[0] | bytes[1] << 8);
+  return true;
+}
+
 bool input_cursor::read_u32(uint32_t* value) {
   uint8_t bytes[4];
   if (!read_into(bytes)) return false;
   *value = static_cast<uint32_t>(bytes[0]) | static_cast<uint32_t>(bytes[1]) << 8 |
            static_cast<uint32_t>(bytes[2]) << 16 | static_cast<uint32_t>(bytes[3]) << 24;
+  return true;
+}
+
+bool input_cursor::read_u64(uint64_t* value) {
+  uint32_t low = 0;
+  uint32_t high = 0;
+  if (left() < sizeof(*value) || !read_u32(&low) || !read_u32(&high)) return false;
+  *value = low | uint64_t{high} << 32;
   return true;
 }
 
@@ -67,6 +82,11 @@ bool output_cursor::write_bytes(byte_view bytes) {
   if (!reserve(bytes.size(), &room)) return false;
   copy_bytes(room, bytes);
   return true;
+}
+
+bool output_cursor::write_u16(uint16_t value) {
+  const uint8_t bytes[] = {static_cast<uint8_t>(value), static_cast<uint8_t>(value >> 8)};
+  return write_bytes(bytes);
 }
 
 bool output_cursor::write_u32(uint32_t value) {

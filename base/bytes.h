@@ -48,7 +48,9 @@ class input_cursor {
  public:
   explicit input_cursor(byte_view input) : rest_(input) {}
 
+  [[nodiscard]] bool read_u16(uint16_t* value);
   [[nodiscard]] bool read_u32(uint32_t* value);
+  [[nodiscard]] bool read_u64(uint64_t* value);
   [[nodiscard]] bool read_bytes(size_t length, byte_view* bytes);
   [[nodiscard]] bool read_into(byte_span to);
   // A 32-bit length and that many bytes.
@@ -67,6 +69,7 @@ class output_cursor {
  public:
   explicit output_cursor(byte_span output) : rest_(output), capacity_(output.size()) {}
 
+  [[nodiscard]] bool write_u16(uint16_t value);
   [[nodiscard]] bool write_u32(uint32_t value);
   [[nodiscard]] bool write_bytes(byte_view bytes);
   // A 32-bit length and the bytes.

@@ -75,4 +75,29 @@ void heap_delete(T* record) {
   heap_give_back(record, sizeof(T));
 }
 
+// heap_ptr: owns one record of heap_new. Moves, never copies.
+template <class T>
+class heap_ptr {
+ public:
+  heap_ptr() = default;
+  explicit heap_ptr(T* record) : record_(record) {}
+  heap_ptr(heap_ptr&& other) noexcept : record_(std::exchange(other.record_, nullptr)) {}
+  heap_ptr& operator=(heap_ptr&& other) noexcept {
+    heap_ptr taken(std::move(other));
+    std::swap(record_, taken.record_);
+    return *this;
+  }
+  ~heap_ptr() { heap_delete(record_); }
+
+  T* get() const { return record_; }
+  // Hands the record to the caller, who frees it with heap_delete.
+  [[nodiscard]] T* release() { return std::exchange(record_, nullptr); }
+  T* operator->() const { return record_; }
+  T& operator*() const { return *record_; }
+  explicit operator bool() const { return record_ != nullptr; }
+
+ private:
+  T* record_ = nullptr;
+};
+
 }  // namespace keymaster

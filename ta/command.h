@@ -38,6 +38,11 @@ TEE_Result _abort(command_io* io, keymaster_error_t* km_error);
 TEE_Result attest_key(command_io* io, keymaster_error_t* km_error);
 TEE_Result configure(command_io* io, keymaster_error_t* km_error);
 TEE_Result upgrade_key(command_io* io, keymaster_error_t* km_error);
+TEE_Result soter_handle_generate_attk_key_pair(command_io* io, keymaster_error_t* km_error);
+TEE_Result soter_handle_verify_attk_key_pair(command_io* io, keymaster_error_t* km_error);
+TEE_Result soter_handle_export_attk_public_key(command_io* io, keymaster_error_t* km_error);
+TEE_Result soter_handle_get_device_id(command_io* io, keymaster_error_t* km_error);
+TEE_Result soter_handle_setFid(command_io* io, keymaster_error_t* km_error);
 
 }  // namespace commands
 }  // namespace keymaster

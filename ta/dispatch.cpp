@@ -39,11 +39,6 @@ constexpr uint32_t VALUE_IN_OUT = 0x653;
 constexpr uint32_t VALUE_OUT = 0x602;
 constexpr uint32_t IN_ONLY = 0x50;
 
-// The commands of the biometric framework answer this until their code is there.
-TEE_Result soter_not_implemented(command_io*, keymaster_error_t*) {
-  return TEE_ERROR_NOT_IMPLEMENTED;
-}
-
 using enum slot0_rule;
 using enum failure_rule;
 
@@ -66,14 +61,15 @@ constexpr command_row COMMANDS[] = {
     {25, "configure", VALUE_IN, BOTH_ZERO, false, SIZE_ZERO, commands::configure},
     {26, "upgrade_key", VALUE_IN_OUT, BOTH_ZERO, true, UNTOUCHED, commands::upgrade_key},
     {0xFF00, "soter_handle_generate_attk_key_pair", VALUE_ONLY, B_ZERO, false, SIZE_ZERO,
-     soter_not_implemented},
+     commands::soter_handle_generate_attk_key_pair},
     {0xFF01, "soter_handle_verify_attk_key_pair", VALUE_ONLY, BOTH_ZERO, false, SIZE_ZERO,
-     soter_not_implemented},
+     commands::soter_handle_verify_attk_key_pair},
     {0xFF02, "soter_handle_export_attk_public_key", VALUE_OUT, BOTH_ZERO, false, SIZE_ZERO,
-     soter_not_implemented},
+     commands::soter_handle_export_attk_public_key},
     {0xFF03, "soter_handle_get_device_id", VALUE_OUT, BOTH_ZERO, false, SIZE_ZERO,
-     soter_not_implemented},
-    {0xFF04, "soter_handle_setFid", IN_ONLY, UNUSED, false, SIZE_ZERO, soter_not_implemented},
+     commands::soter_handle_get_device_id},
+    {0xFF04, "soter_handle_setFid", IN_ONLY, UNUSED, false, SIZE_ZERO,
+     commands::soter_handle_setFid},
 };
 
 const command_row* find_command(uint32_t id) {

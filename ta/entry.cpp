@@ -6,6 +6,8 @@
 #include "keymaster/auth/auth_state.h"
 #include "keymaster/auth/operation_pool.h"
 #include "keymaster/store/key_store.h"
+#include "soter/finger_id.h"
+#include "soter/provisioning.h"
 #include "ta/configured.h"
 #include "ta/dispatch.h"
 
@@ -13,6 +15,7 @@ using keymaster::dispatch;
 
 TEE_Result TA_CreateEntryPoint() {
   keymaster::configured_init();
+  keymaster::finger_id_init();
   if (TEE_Result res = keymaster::key_store_init()) {
     return TEE_FAIL(res, "Init key store failed");
   }
@@ -28,6 +31,7 @@ TEE_Result TA_CreateEntryPoint() {
 // Live operations are not walked: the TEE takes back what an instance leaves.
 void TA_DestroyEntryPoint() {
   keymaster::authorization_destroy();
+  keymaster::soter_deinit();
 }
 
 TEE_Result TA_OpenSessionEntryPoint(uint32_t, TEE_Param*, void**) {
