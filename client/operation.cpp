@@ -39,10 +39,10 @@ status operation::update(byte_view input, bytes* output, const param_set& params
   return {};
 }
 
-finish_result operation::finish(byte_view signature, const param_set& params) {
+finish_result operation::finish(byte_view signature, const param_set& params, size_t room) {
   if (!live_) return {{NOT_LIVE}, {}, {}};
   live_ = false;
-  return keymaster_->finish(handle_, signature, params);
+  return keymaster_->finish(handle_, signature, params, room);
 }
 
 }  // namespace keymaster::client

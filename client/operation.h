@@ -24,7 +24,7 @@ class operation {
   status update(byte_view input, bytes* output, const param_set& params = {});
 
   // finish: ends the operation; see session::finish.
-  finish_result finish(byte_view signature = {}, const param_set& params = {});
+  finish_result finish(byte_view signature = {}, const param_set& params = {}, size_t room = 0);
 
  private:
   session* keymaster_;

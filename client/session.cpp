@@ -213,9 +213,10 @@ update_result session::update(uint32_t handle, byte_view input, const param_set&
   });
 }
 
-finish_result session::finish(uint32_t handle, byte_view input, const param_set& params) {
+finish_result session::finish(uint32_t handle, byte_view input, const param_set& params,
+                              size_t room) {
   bytes request = two_fields(input, params.marshal());
-  exchange answer = call(command::FINISH, handle, request, OUTPUT_CAPACITY + input.size());
+  exchange answer = call(command::FINISH, handle, request, OUTPUT_CAPACITY + input.size() + room);
   return read_answer<finish_result>(
       answer.outcome, [&](finish_result* result) { parse_finished(answer.output, result); });
 }

@@ -111,7 +111,10 @@ class session {
 
   // finish: ends the operation whatever the outcome. `input` is a signature to verify; data belongs
   // into update, since HMAC and AES do not look at what finish brings.
-  finish_result finish(uint32_t handle, byte_view input = {}, const param_set& params = {});
+  // `room`: how much output to expect when it may be more than 16 KiB: a SOTER key's document holds
+  // the message, at most doubled.
+  finish_result finish(uint32_t handle, byte_view input = {}, const param_set& params = {},
+                       size_t room = 0);
 
   status abort(uint32_t handle);
 

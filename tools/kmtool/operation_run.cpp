@@ -15,6 +15,10 @@ namespace {
 
 constexpr size_t CHUNK = 64 * 1024;
 
+constexpr char DOCUMENT_ADVICE[] =
+    "A SOTER key signs UTF-8 text without zero bytes, with a digest, on a device that has its "
+    "SOTER data ('kmtool soter check-attk'). The trace on standard error tells what failed.";
+
 // Who authenticates for the operation, as --authenticate says.
 client::token_request parse_user(const std::string& text) {
   size_t colon = text.find(':');
@@ -120,7 +124,9 @@ std::optional<uint64_t> choose(const std::optional<uint32_t>& asked, const param
 operation_run::operation_run(keymaster_device* keymaster, const operation_options& options,
                              const opened_key& key, uint32_t purpose, param_set params,
                              const std::string& action)
-    : action_("cannot " + action), tokens_(options, key.characteristics) {
+    : action_("cannot " + action),
+      tokens_(options, key.characteristics),
+      puts_out_document_(key.characteristics.contains(KM_TAG_SOTER_KEY)) {
   options.application.get().bind(&params);
   params.append(tokens_.for_begin(keymaster->context()));
   client::begin_result begun = (*keymaster)->begin(purpose, key.blob, params);
@@ -135,6 +141,9 @@ void operation_run::require(const client::status& outcome) const {
   if (outcome.error == KM_ERROR_KEY_USER_NOT_AUTHENTICATED) {
     throw failure(action_, outcome, tokens_.advice());
   }
+  if (puts_out_document_ && outcome.error == KM_ERROR_UNKNOWN_ERROR) {
+    throw failure(action_, outcome, DOCUMENT_ADVICE);
+  }
   throw failure(action_, outcome);
 }
 
@@ -143,6 +152,7 @@ void operation_run::feed(byte_view data, const sink& to, const param_set& extra)
   params.append(extra);
   bytes output;
   require(operation_->update(data, &output, params));
+  fed_ += data.size();
   if (!output.empty()) to(output);
 }
 
@@ -156,7 +166,8 @@ void operation_run::feed_file(input_file* input, const std::string& title, const
 }
 
 client::status operation_run::finish(byte_view signature, const sink& to) {
-  client::finish_result end = operation_->finish(signature, token_);
+  const size_t room = puts_out_document_ ? 2 * fed_ : 0;
+  client::finish_result end = operation_->finish(signature, token_, room);
   if (end.ok() && !end.output.empty()) to(end.output);
   return end;
 }

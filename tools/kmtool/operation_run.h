@@ -93,6 +93,8 @@ class operation_run {
   operation_tokens tokens_;
   keymaster::client::param_set begun_;
   std::unique_ptr<keymaster::client::operation> operation_;
+  bool puts_out_document_;  // which holds the whole message, escaped
+  size_t fed_ = 0;          // bytes
   keymaster::client::param_set token_;
 };
 

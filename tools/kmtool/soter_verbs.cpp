@@ -87,6 +87,7 @@ verb_result report_match(const std::string& folder, uint32_t fid) {
 struct document_export_options {
   std::string key;
   document_files files;
+  std::string public_key;  // file for it alone
   application_options application;
 };
 
@@ -110,7 +111,12 @@ verb_result export_document(const std::string& folder, const document_export_opt
                   "device must have ('kmtool soter check-attk'), or an RSA key of 2048 bits at "
                   "most. --trace 1 tells what failed.");
   }
-  verb_result result = deliver(client::parse_signed_document(exported.data), options.files);
+  const client::signed_document made = client::parse_signed_document(exported.data);
+  if (!options.public_key.empty()) {
+    const std::string pem = json::parse(made.text()).at("pub_key");
+    write_file(options.public_key, client::as_bytes(pem + "\n"), access::NORMAL);
+  }
+  verb_result result = deliver(made, options.files);
   result.object["key"] = options.key;
   return result;
 }
@@ -172,6 +178,9 @@ void add_document_verbs(CLI::App* soter, command_line* line) {
   auto exported = std::make_shared<document_export_options>();
   verb->add_option("KEY", exported->key, "File that holds the key blob")->required();
   exported->files.add_to(verb, "File for the document (default: both are printed)");
+  verb->add_option("--public-key", exported->public_key,
+                   "File for the public key alone, in PEM, as the document has it")
+      ->type_name("FILE");
   exported->application.add_to(verb);
   verb->callback(
       [=] { line->action = [=] { return export_document(line->device_folder(), *exported); }; });
