@@ -66,20 +66,6 @@ TEST_F(Session, SendsEachCommandInItsLayout) {
   }
 }
 
-TEST_F(Session, ReadsOutputs) {
-  answer_with({.output = from_hex(std::string("02000000b10b1c000000") + VERSION_HEX)});
-  key_result imported = keymaster.import_key({}, BLOB);
-  EXPECT_TRUE(imported.ok());
-  EXPECT_EQ(imported.blob, BLOB);
-  EXPECT_EQ(imported.characteristics, VERSION);
-
-  answer_with({.b = 0x12345678, .output = from_hex(VERSION_HEX)});
-  begin_result begun = keymaster.begin(2, BLOB, {});
-  EXPECT_TRUE(begun.ok());
-  EXPECT_EQ(begun.handle, 0x12345678u);
-  EXPECT_EQ(begun.params, VERSION);
-}
-
 TEST_F(Session, TellsTheKeymasterErrorFromAnUntouchedSlot) {
   struct {
     answer reply;

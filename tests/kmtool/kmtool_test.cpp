@@ -34,9 +34,9 @@ class Kmtool : public testing::Test {
     EXPECT_NE(result.err.find(message), std::string::npos)
         << testing::PrintToString(arguments) << result.err;
   }
-  json run_json(words arguments) {
+  json run_json(words arguments, const std::string& input = "") {
     arguments.insert(arguments.begin(), "--json");
-    return json::parse(box.run(arguments).out);
+    return json::parse(box.run(arguments, input).out);
   }
   sandbox box;
 };
@@ -135,6 +135,65 @@ TEST_F(Kmtool, RefusalsExitWithOneAndNameTheError) {
   json error = run_json({"show", "b"})["error"];
   EXPECT_EQ(error["exit_code"], REFUSED);
   EXPECT_EQ(error["keymaster_error"]["number"], -33);
+}
+
+TEST_F(Kmtool, EveryAlgorithmsKeysServe) {
+  for (const char* algorithm : {"rsa", "ec"}) {
+    ASSERT_EQ(box.run({"generate", algorithm, "-o", "a", "--force"}).exit_code, DONE) << algorithm;
+    EXPECT_TRUE(box.run({"export", "a"}).out.starts_with("-----BEGIN PUBLIC KEY-----"));
+    ASSERT_EQ(box.run({"sign", "a", "-i", "m", "-o", "s"}).exit_code, DONE);
+    expect({"verify", "a", "-i", "m", "--signature", "s"}, DONE, "");
+    expect({"verify", "a", "-i", "raw", "--signature", "s"}, REFUSED, "(-30)");
+  }
+  for (const char* algorithm : {"rsa", "aes"}) {
+    ASSERT_EQ(box.run({"generate", algorithm, "-o", "a", "--force", "--purpose", "encrypt,decrypt"})
+                  .exit_code,
+              DONE);
+    const std::string sealed = box.run({"encrypt", "a", "-i", "m"}).out;
+    EXPECT_EQ(sealed.find("message"), std::string::npos);
+    EXPECT_EQ(box.run({"decrypt", "a"}, sealed).out, "message") << algorithm;
+    EXPECT_EQ(box.run({"decrypt", "a"}, sealed.substr(0, sealed.size() - 1)).exit_code, REFUSED);
+  }
+  expect({"export", "k"}, REFUSED, "(-17)");
+  expect({"import", "rsa", "m", "-o", "x"}, WRONG_USAGE, "m");
+}
+
+// Files that anyone may have made.
+TEST_F(Kmtool, AttestsAndInspects) {
+  ASSERT_EQ(box.run({"generate", "ec", "-o", "e", "--app-id", "bank"}).exit_code, DONE);
+  ASSERT_EQ(box.run({"attest", "e", "--challenge", "C0ffee", "-o", "chain"}).exit_code, DONE);
+  json chain = run_json({"inspect", "chain"})["certificates"];
+  ASSERT_EQ(chain.size(), 2u);
+  EXPECT_EQ(chain[0]["signed_by_next"], true);
+  json description = chain[0]["key_description"];
+  EXPECT_EQ(description["challenge"], "c0ffee");
+  EXPECT_EQ(description["tee_enforced"]["algorithm"], "ec");
+  EXPECT_EQ(description["tee_enforced"]["root_of_trust"]["device_locked"], true);
+  EXPECT_EQ(description["software_enforced"], json::object());
+
+  const std::string good = box.read("chain");
+  const size_t second = good.find("-----BEGIN", 1);
+  std::string forged = good.substr(0, second) + good.substr(0, second);
+  EXPECT_EQ(run_json({"inspect", "-"}, forged)["certificates"][0]["signed_by_next"], false);
+  struct {
+    std::string file;
+    const char* message;
+  } cases[] = {{"", "bad is empty"},
+               {"message", "the file is not a certificate"},
+               {good.substr(0, 300), "the file is not a certificate"},
+               {good.substr(0, second + 300), "certificate 2 of the file is damaged"},
+               {std::string("\x30\x80\0\0", 4), "the file is not a certificate"},
+               {std::string(5'000'000, 'a'), "bad is longer than"}};
+  for (const auto& c : cases) {
+    box.write("bad", c.file);
+    expect({"inspect", "bad"}, WRONG_USAGE, c.message);
+  }
+  expect({"inspect", "nowhere"}, WRONG_USAGE, "nowhere");
+  expect({"attest", "e", "--challenge", "c0f"}, WRONG_USAGE, "cannot read the challenge");
+  expect({"attest", "e"}, WRONG_USAGE, "--challenge");
+  expect({"attest", "e", "--challenge", std::string(258, 'a')}, REFUSED, "(-21)");
+  expect({"attest", "k", "--challenge", "00"}, REFUSED, "(-4)");
+  expect({"attest", "m", "--challenge", "00"}, REFUSED, "(-62)");
 }
 
 TEST_F(Kmtool, TeeFailuresExitWithThree) {

@@ -192,17 +192,20 @@ TEST(Attestation, Refusals) {
   EXPECT_TRUE(failed_with(ta.send(no_set), TEEC_ERROR_BAD_PARAMETERS));
 }
 
-// A description beyond 2048 bytes; the application is attested without being asked for.
+// Descriptions beyond the first buffer and beyond its double. The application is attested without
+// being asked for.
 TEST(Attestation, OfLongDescriptions) {
   ta_under_test ta;
-  const bytes application(2500, 'x');
-  const bytes blob = ta.generate(ec_description().add_bytes(KM_TAG_APPLICATION_ID, application));
-  const reply answer = ta.send(attest_request(blob));
-  ASSERT_TRUE(succeeded(answer)) << ta.trace().errors();
-  const std::vector<certificate> chain = parse_chain(answer.output());
-  const bytes description = extension_value(chain.at(0), KEY_DESCRIPTION);
-  EXPECT_NE(std::ranges::search(description, application).begin(), description.end());
-  EXPECT_EQ(X509_verify(chain[0].get(), X509_get0_pubkey(chain.at(1).get())), 1);
+  for (const size_t size : {1100u, 2500u}) {
+    const bytes application(size, 'x');
+    const bytes blob = ta.generate(ec_description().add_bytes(KM_TAG_APPLICATION_ID, application));
+    const reply answer = ta.send(attest_request(blob));
+    ASSERT_TRUE(succeeded(answer)) << ta.trace().errors();
+    const std::vector<certificate> chain = parse_chain(answer.output());
+    const bytes description = extension_value(chain.at(0), KEY_DESCRIPTION);
+    EXPECT_NE(std::ranges::search(description, application).begin(), description.end());
+    EXPECT_EQ(X509_verify(chain[0].get(), X509_get0_pubkey(chain.at(1).get())), 1);
+  }
 }
 
 }  // namespace

@@ -13,8 +13,8 @@ using client::to_hex;
 
 constexpr uint32_t SIGN = KM_PURPOSE_SIGN;
 
-// RFC 2202 (SHA-1) and RFC 4231 (SHA-2) with keys of one repeated byte. The last five, at the edges
-// of the block size, were computed with the openssl command.
+// RFC 2202 (SHA-1) and RFC 4231 (SHA-2) with keys of one repeated byte. The last was
+// computed with the openssl command.
 const struct {
   uint8_t key_byte;
   size_t key_size;
@@ -34,15 +34,7 @@ const struct {
      "87aa7cdea5ef619d4ff0b4241a1d6cb02379f4e2ce4ec2787ad0b30545e17cdedaa833b7d6b8a702038b274eae"
      "a3f4e4be9d914eeb61f1702e696c203a126854"},
     {0x0c, 20, "Test With Truncation", 4, "a3b6167473100ee06e0c796c2955552b"},
-    {0xaa, 64, "Hi There", 4, "ebef34e13d0a0fe04593d043bc7a865106db0604211d404c18206d862e5d7852"},
-    {0xaa, 65, "Hi There", 4, "00af6c42340b99e2e1d9a1cdf1547be431fe2e9bab3215c68d013ba858891927"},
     {0xaa, 100, "Hi There", 4, "4e9638590f2780370491dacfd8e20c85600da0ded385d8b4f68b00425d4518f2"},
-    {0xaa, 128, "Hi There", 5,
-     "5617c36d768eff4cdb4b48c3a320023adfa5deed39a88d75a739918c36338d6afe214107be6e51595c2f29d647"
-     "bde45f"},
-    {0xaa, 128, "Hi There", 6,
-     "17eb09b3d3c0f3ac497c608347e1d5b5df5e4b062bfd56c191c8499f24a3a9d1c3dfb449d01f4c9ca316b6b8d6"
-     "a6299bad883d0bffe11c88c60d7daed6feeb48"},
 };
 
 TEST(Hmac, ComputesPublishedMacsAndForgetsTheKeys) {

@@ -4,12 +4,9 @@
 
 #include <cstring>
 #include <gtest/gtest.h>
-#include <openssl/hmac.h>
 #include <thread>
 #include <unistd.h>
 
-#include "product/uuids.h"
-#include "tee/device/clock.h"
 #include "tests/tee/client.h"
 #include "tests/tee/ta_echo/echo_ta.h"
 
@@ -182,40 +179,6 @@ TEST_F(sessions, callers_that_wait_for_each_other_are_told_and_never_hang) {
     ASSERT_TRUE(host::counts_of(ta, &counts));
     EXPECT_EQ(counts, host::live_counts{});
   }
-}
-
-TEST_F(sessions, the_authenticator_issues_tokens_for_the_boot) {
-  constexpr TEE_UUID AUTHENTICATOR = AUTHENTICATOR_TA_UUID;
-  client user(made.path(), AUTHENTICATOR);
-  std::string request = "CHALLENGUSER__IDAUTH__ID\x02\x01";
-  request.resize(28);  // the rest of the type is zero
-  std::string token(70, '#');
-  struct {
-    size_t in, out;
-    TEEC_Result result;
-    size_t size;
-  } cases[] = {{27, 69, TEEC_ERROR_BAD_PARAMETERS, 69},
-               {28, 0, TEEC_ERROR_SHORT_BUFFER, 69},
-               {28, 68, TEEC_ERROR_SHORT_BUFFER, 69},
-               {28, 70, TEEC_SUCCESS, 69}};
-  host::set_clocks(1, 0x0102030405);
-  for (const auto& row : cases) {
-    TEEC_Operation operation{};
-    operation.paramTypes = TEEC_PARAM_TYPES(TEEC_MEMREF_TEMP_INPUT, TEEC_MEMREF_TEMP_OUTPUT, 0, 0);
-    operation.params[0].tmpref = {request.data(), row.in};
-    operation.params[1].tmpref = {token.data(), row.out};
-    EXPECT_EQ(user.invoke(1, &operation), row.result);
-    EXPECT_EQ(operation.params[1].tmpref.size, row.size);
-  }
-  host::use_real_clocks();
-  EXPECT_EQ(token.substr(0, 37),
-            std::string("\0CHALLENGUSER__IDAUTH__ID\0\0\1\2\0\0\0\1\2\3\4\5", 37));
-  user.close_context();
-  auto dev = made.open();
-  std::string mac(32, '\0');
-  HMAC(EVP_sha256(), dev->boot_seed().data(), 32, reinterpret_cast<const uint8_t*>(token.data()),
-       37, reinterpret_cast<uint8_t*>(mac.data()), nullptr);
-  EXPECT_EQ(token.substr(37), mac + "#");
 }
 
 }  // namespace

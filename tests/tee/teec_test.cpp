@@ -21,38 +21,6 @@ class teec : public ::testing::Test {
 constexpr uint32_t MIRROR_TYPES = TEEC_PARAM_TYPES(TEEC_VALUE_INOUT, TEEC_MEMREF_TEMP_INPUT,
                                                    TEEC_MEMREF_TEMP_OUTPUT, TEEC_VALUE_OUTPUT);
 
-TEST_F(teec, values_and_temporary_memory) {
-  struct {
-    std::string in;
-    size_t room;
-    TEEC_Result result;
-  } cases[] = {{"hello", 5, TEEC_SUCCESS},
-               {"hello", 9, TEEC_SUCCESS},
-               {"hello", 4, TEEC_ERROR_SHORT_BUFFER},
-               {"", 0, TEEC_SUCCESS}};
-  for (const auto& row : cases) {
-    std::string in = row.in;
-    std::string out(row.room, '#');
-    TEEC_Operation operation{};
-    operation.paramTypes = MIRROR_TYPES;
-    operation.params[0].value = {1, 2};
-    operation.params[1].tmpref = {in.empty() ? nullptr : in.data(), in.size()};
-    operation.params[2].tmpref = {out.empty() ? nullptr : out.data(), out.size()};
-    operation.params[3].value = {77, 88};
-    EXPECT_EQ(user.invoke(echo::MIRROR, &operation), row.result);
-    EXPECT_EQ(user.origin, TEEC_ORIGIN_TRUSTED_APP);
-    EXPECT_EQ(operation.params[0].value.a, 2u);
-    EXPECT_EQ(operation.params[0].value.b, 1u);
-    EXPECT_EQ(operation.params[1].tmpref.size, in.size());
-    EXPECT_EQ(operation.params[2].tmpref.size, in.size());
-    EXPECT_EQ(operation.params[3].value.a, 1u);  // it came in as zero
-    EXPECT_EQ(operation.params[3].value.b, 0u);
-    if (row.result == TEEC_SUCCESS) {
-      EXPECT_EQ(out.substr(0, in.size()), in);
-    }
-  }
-}
-
 TEST_F(teec, registered_and_allocated_memory) {
   std::string bytes = "0123456789";
   TEEC_SharedMemory in{bytes.data(), bytes.size(), TEEC_MEM_INPUT, nullptr};
