@@ -121,4 +121,18 @@ byte=$(od -An -tu1 -j 200 -N 1 damaged.key)
 printf "\\x$(printf %x $((byte ^ 1)))" | dd of=damaged.key bs=1 seek=200 conv=notrunc status=none
 refused kmtool sign damaged.key -i README.md
 
+say "11. SOTER: the device's own key vouches for a key that signs documents"
+run kmtool soter export-attk -o attk.pem
+run kmtool generate rsa -o soter.key --soter --uid 1000 --padding pkcs1-sign
+run kmtool soter export soter.key -o key.json --public-key soter.pem
+run openssl dgst -sha256 -verify attk.pem -signature key.json.sig key.json
+
+say "12. A finger, a message, a signed document; the counter rises from run to run"
+printf 'pay 10.00 to Ann' >payment
+run kmtool sign soter.key -i payment --fingerprint 7 -o first.json
+run openssl dgst -sha256 -verify soter.pem -signature first.json.sig first.json
+run kmtool soter verify first.json first.json.sig --key soter.pem
+run kmtool sign soter.key -i payment -o second.json
+run kmtool soter verify second.json second.json.sig --key soter.pem
+
 say "That was a device. Make one of your own: kmtool device create (in $build/bin)"

@@ -1,15 +1,14 @@
-// kmtool demo: what a Keymaster does, told in eight short steps on a real device.
+// kmtool demo: what a Keymaster does, told in short steps on a real device.
+#include "demo.h"
+
 #include <cstdlib>
 #include <filesystem>
-#include <iostream>
 #include <unistd.h>
 
 #include "client/operation.h"
 #include "files.h"
-#include "keymaster_device.h"
 #include "listing.h"
 #include "tee/device/uuid.h"
-#include "tool.h"
 
 namespace kmtool {
 
@@ -18,53 +17,10 @@ using client::param_set;
 
 namespace {
 
-constexpr uint32_t OLD_VERSION = 130000;
 constexpr uint32_t NEW_VERSION = 140000;
-constexpr uint32_t OLD_PATCHLEVEL = 202601;
 constexpr uint32_t NEW_PATCHLEVEL = 202607;
 constexpr char KNOWN_KEY[] = "000102030405060708090a0b0c0d0e0f101112131415161718191a1b1c1d1e1f";
 constexpr char OWN_TEXT[] = "Keys that never leave their device";
-
-// Tells the story: on the terminal as it happens, or as one JSON object at its end.
-class narrator {
- public:
-  explicit narrator(bool as_json)
-      : as_json_(as_json), colours_(!as_json && isatty(STDOUT_FILENO) == 1) {}
-
-  void section(const std::string& title) {
-    sections_.push_back({{"title", title}, {"lines", json::array()}});
-    std::string number = std::to_string(sections_.size());
-    print("\n" + coloured("1;36", number + "  " + title) + "\n");
-  }
-  void say(const std::string& line) { add(line, line); }
-  void show(const table& lines) {
-    for (std::istringstream in(lines.text("")); in.good();) {
-      std::string line;
-      if (std::getline(in, line)) add(line, line);
-    }
-  }
-  void good(const std::string& line) { add(line, coloured("32", line)); }
-  void refused(const client::status& outcome) {
-    add(outcome.text(), coloured("33", outcome.text()));
-  }
-  const json& sections() const { return sections_; }
-
- private:
-  void add(const std::string& plain, const std::string& shown) {
-    sections_.back()["lines"].push_back(plain);
-    print("   " + shown + "\n");
-  }
-  std::string coloured(const std::string& colour, const std::string& text) const {
-    return colours_ ? "\033[" + colour + "m" + text + "\033[0m" : text;
-  }
-  void print(const std::string& text) const {
-    if (!as_json_) std::cout << text << std::flush;
-  }
-
-  bool as_json_;
-  bool colours_;
-  json sections_ = json::array();
-};
 
 class temporary_folder {
  public:
@@ -98,53 +54,6 @@ sample find_sample() try {
   return {"a text", client::copy_of(client::as_bytes(OWN_TEXT)),
           "printf '" + std::string(OWN_TEXT) + "' | ", ""};
 }
-
-// The device of the demonstration. One that was there already gets its settings back at the end.
-class demo_device {
- public:
-  explicit demo_device(const std::string& folder) : folder_(folder) {
-    try {
-      original_ = tee::device::read_settings(folder_);
-    } catch (const tee::device_error& error) {
-      if (error.reason() != tee::device_error::kind::NOT_FOUND) throw;
-      tee::device_settings fresh;
-      fresh.id = tee::new_uuid();
-      tee::device::create(folder_, fresh);
-    }
-    set_version(OLD_VERSION, OLD_PATCHLEVEL);
-  }
-  demo_device(const demo_device&) = delete;
-  demo_device& operator=(const demo_device&) = delete;
-  ~demo_device() {
-    keymaster_.reset();
-    if (!original_) return;
-    try {
-      tee::device::write_settings(folder_, *original_);
-    } catch (const tee::device_error& error) {
-      std::cerr << "kmtool: the device keeps the demo's OS version: " << error.what() << "\n";
-    }
-  }
-
-  // start: a fresh instance of the trusted application.
-  client::session* start() {
-    keymaster_.reset();
-    return keymaster_.emplace(folder_).session();
-  }
-  client::session* session() { return keymaster_->session(); }
-
-  void set_version(uint32_t os_version, uint32_t os_patchlevel) {
-    keymaster_.reset();
-    tee::device_settings settings = tee::device::read_settings(folder_);
-    settings.os_version = os_version;
-    settings.os_patchlevel = os_patchlevel;
-    tee::device::write_settings(folder_, settings);
-  }
-
- private:
-  std::string folder_;
-  std::optional<tee::device_settings> original_;
-  std::optional<keymaster_device> keymaster_;
-};
 
 param_set hmac_description() {
   param_set description;
@@ -197,7 +106,7 @@ void show_known_key(narrator* story, demo_device* device, const sample& text) {
   story->say("    -macopt hexkey:" + std::string(KNOWN_KEY) + " HMAC");
 
   story->section("What the key may do");
-  story->show(list_params(imported.characteristics));
+  story->show(list_params(imported.characteristics).text(""));
 }
 
 void show_refusal(narrator* story, demo_device* device) {
@@ -209,7 +118,7 @@ void show_refusal(narrator* story, demo_device* device) {
   bytes blob = generate(device->session(), description);
   story->say("A key bound to the application 'bank', asked for by 'game':");
   client::status outcome = device->session()->get_key_characteristics(blob, stranger);
-  story->refused(outcome);
+  story->refused(outcome.text());
   story->say("and by 'bank':");
   require(device->session()->get_key_characteristics(blob, owner), "cannot open the key");
   story->good("opened");
@@ -218,11 +127,12 @@ void show_refusal(narrator* story, demo_device* device) {
 void show_upgrade(narrator* story, demo_device* device, const sample& text, bytes* blob) {
   story->section("A system update");
   std::string before = mac_of(device->session(), *blob, text.content);
+  const uint32_t old_version = tee::device::read_settings(device->folder()).os_version;
   device->set_version(NEW_VERSION, NEW_PATCHLEVEL);
-  client::session* keymaster = device->start();
-  story->say("The system goes from " + std::to_string(OLD_VERSION) + " to " +
+  client::session* keymaster = device->start()->session();
+  story->say("The system goes from " + std::to_string(old_version) + " to " +
              std::to_string(NEW_VERSION) + "; the first key is now refused:");
-  story->refused(keymaster->get_key_characteristics(*blob));
+  story->refused(keymaster->get_key_characteristics(*blob).text());
   auto upgraded = keymaster->upgrade_key(*blob);
   require(upgraded, "cannot upgrade the key");
   *blob = upgraded.blob;
@@ -234,7 +144,7 @@ void show_upgrade(narrator* story, demo_device* device, const sample& text, byte
 void show_restart(narrator* story, demo_device* device, const sample& text, const bytes& blob) {
   story->section("A restart");
   std::string before = mac_of(device->session(), blob, text.content);
-  client::session* keymaster = device->start();
+  client::session* keymaster = device->start()->session();
   if (mac_of(keymaster, blob, text.content) != before) {
     throw failure(TEE_FAILED, "after a restart the key gives another MAC");
   }
@@ -264,6 +174,7 @@ verb_result demonstrate(const command_line& line) {
   show_refusal(&story, &device);
   show_upgrade(&story, &device, text, &blob);
   show_restart(&story, &device, text, blob);
+  show_soter(&story, &device, scratch.path());
   verb_result result;
   result.object = {{"sections", story.sections()}};
   return result;
