@@ -157,8 +157,8 @@ void show_payment(narrator* story, keymaster_device* keymaster, byte_view blob,
 uint64_t counter_of_run(const demo_device& device, const std::string& scratch) {
   const std::string program = std::filesystem::read_symlink("/proc/self/exe");
   const program_result done =
-      run_program(scratch, {program, "--device", std::filesystem::absolute(device.folder()),
-                            "--json", "sign", "soter.key", "-i", "payment"});
+      run_program(".", {program, "--device", device.folder(), "--json", "sign",
+                        scratch + "/soter.key", "-i", scratch + "/payment"});
   if (done.exit_code != 0) throw failure(TEE_FAILED, "a second kmtool failed: " + done.output);
   const std::string document = json::parse(done.output).at("document");
   return json::parse(document).at("counter");

@@ -13,16 +13,6 @@ namespace {
 constexpr char PROVISION_ADVICE[] =
     "'kmtool device provision' gives a device its key and properties.";
 
-// What the factory stores is often read where it must be there.
-client::soter_result require_data(client::soter_result result, const std::string& action) {
-  if (result.unavailable) {
-    throw failure(REFUSED, action + ": the device's SOTER data cannot be loaded (-1)",
-                  PROVISION_ADVICE);
-  }
-  require(result, action);
-  return result;
-}
-
 std::string as_text(byte_view data) {
   return {data.begin(), data.end()};
 }
@@ -46,8 +36,11 @@ verb_result check_attk(const std::string& folder) {
 
 verb_result export_attk(const std::string& folder, const std::string& output) {
   keymaster_device keymaster(folder);
-  const client::soter_result exported =
-      require_data(client::soter(keymaster.session()).export_attk(), "cannot export the ATTK");
+  const client::soter_result exported = client::soter(keymaster.session()).export_attk();
+  if (exported.unavailable) {
+    throw failure(REFUSED, "the device's SOTER data cannot be loaded (-1)", PROVISION_ADVICE);
+  }
+  require(exported, "cannot export the ATTK");
   const std::string pem = as_text(exported.data) + "\n";
   verb_result result;
   result.object = {{"public_key", pem}};
@@ -63,7 +56,7 @@ verb_result export_attk(const std::string& folder, const std::string& output) {
 
 verb_result device_id(const std::string& folder) {
   keymaster_device keymaster(folder);
-  client::soter_result id = client::soter(keymaster.session()).device_id();
+  const client::soter_result id = client::soter(keymaster.session()).device_id();
   if (id.error == KM_ERROR_UNKNOWN_ERROR) {
     throw failure("cannot read the device's identifier", id, PROVISION_ADVICE);
   }
