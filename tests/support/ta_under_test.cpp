@@ -156,6 +156,7 @@ void ta_under_test::account(const request& what, const reply& answer, const live
     live->second = sum(live->second, difference(after, before));
     return;
   }
+  if (std::exchange(loads_, false)) return;
   if (on_live) {
     expected = difference(before, live->second);
     live_.erase(live);

@@ -157,6 +157,9 @@ class ta_under_test {
   // The device's folder, for tests that change what is stored there while it is stopped.
   const std::string& path() const { return path_; }
 
+  // expect_loading: the next command may take memory that it keeps until the instance ends.
+  void expect_loading() { loads_ = true; }
+
   // watch_secret: from now on no block of TA memory may be freed with these bytes in it.
   void watch_secret(byte_view secret) { secrets_.emplace_back(secret.begin(), secret.end()); }
 
@@ -174,6 +177,7 @@ class ta_under_test {
   std::vector<bytes> secrets_;
   std::optional<client::context> context_;
   std::unique_ptr<client::connection> session_;
+  bool loads_ = false;
   std::map<uint32_t, tee::host::live_counts> live_;  // what each live operation holds
 };
 
