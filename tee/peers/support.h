@@ -42,20 +42,20 @@ class block {
   }
 
   // Zero-filled; once. TEE_ERROR_OUT_OF_MEMORY. A block of 0 bytes is legal.
-  TEE_Result allocate(size_t size) {
+  [[nodiscard]] TEE_Result allocate(size_t size) {
     data_ = static_cast<uint8_t*>(TEE_Malloc(size == 0 ? 1 : size, TEE_MALLOC_FILL_ZERO));
     if (data_ == nullptr) return TEE_ERROR_OUT_OF_MEMORY;
     size_ = size;
     return TEE_SUCCESS;
   }
   // A copy of a client's buffer, which the client may still be writing to.
-  TEE_Result copy_of(const void* bytes, size_t size) {
+  [[nodiscard]] TEE_Result copy_of(const void* bytes, size_t size) {
     if (TEE_Result res = allocate(size)) return res;
     if (size != 0) memcpy(data_, bytes, size);
     return TEE_SUCCESS;
   }
   // The whole data of an open object.
-  TEE_Result read_object(TEE_ObjectHandle object) {
+  [[nodiscard]] TEE_Result read_object(TEE_ObjectHandle object) {
     TEE_ObjectInfo info;
     if (TEE_Result res = TEE_GetObjectInfo1(object, &info)) return res;
     if (TEE_Result res = allocate(info.dataSize)) return res;
@@ -74,7 +74,7 @@ class block {
 
 // require_keymaster: TEE_SUCCESS when the client of this call is the Keymaster TA, else
 // TEE_ERROR_ACCESS_DENIED. Keys and secrets go to nobody else.
-inline TEE_Result require_keymaster() {
+[[nodiscard]] inline TEE_Result require_keymaster() {
   constexpr TEE_UUID KEYMASTER = KEYMASTER_TA_UUID;
   TEE_Identity client;
   TEE_Result res =
