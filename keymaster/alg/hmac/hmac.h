@@ -14,7 +14,6 @@ struct hmac_hash_t {
   uint32_t digest;       // KM_DIGEST_*
   uint32_t object_type;  // TEE_TYPE_HMAC_*
   uint32_t mac_algorithm;
-  uint32_t digest_algorithm;
   uint32_t mac_bits;  // full length; the largest minimum that a key may ask for
   uint32_t block_bits;
 };

@@ -4,6 +4,7 @@
 #include "keymaster/alg/hmac/hmac.h"
 #include "keymaster/alg/key_size.h"
 #include "keymaster/alg/mac_length.h"
+#include "keymaster/alg/message.h"
 #include "keymaster/alg/provenance.h"
 
 namespace keymaster {
@@ -14,11 +15,11 @@ constexpr uint32_t MIN_MIN_MAC_BITS = 64;
 constexpr size_t HEADER_SIZE = 2 * sizeof(uint32_t);
 
 constexpr hmac_hash_t HASHES[] = {
-    {KM_DIGEST_SHA1, TEE_TYPE_HMAC_SHA1, TEE_ALG_HMAC_SHA1, TEE_ALG_SHA1, 160, 512},
-    {KM_DIGEST_SHA_2_224, TEE_TYPE_HMAC_SHA224, TEE_ALG_HMAC_SHA224, TEE_ALG_SHA224, 224, 512},
-    {KM_DIGEST_SHA_2_256, TEE_TYPE_HMAC_SHA256, TEE_ALG_HMAC_SHA256, TEE_ALG_SHA256, 256, 512},
-    {KM_DIGEST_SHA_2_384, TEE_TYPE_HMAC_SHA384, TEE_ALG_HMAC_SHA384, TEE_ALG_SHA384, 384, 1024},
-    {KM_DIGEST_SHA_2_512, TEE_TYPE_HMAC_SHA512, TEE_ALG_HMAC_SHA512, TEE_ALG_SHA512, 512, 1024},
+    {KM_DIGEST_SHA1, TEE_TYPE_HMAC_SHA1, TEE_ALG_HMAC_SHA1, 160, 512},
+    {KM_DIGEST_SHA_2_224, TEE_TYPE_HMAC_SHA224, TEE_ALG_HMAC_SHA224, 224, 512},
+    {KM_DIGEST_SHA_2_256, TEE_TYPE_HMAC_SHA256, TEE_ALG_HMAC_SHA256, 256, 512},
+    {KM_DIGEST_SHA_2_384, TEE_TYPE_HMAC_SHA384, TEE_ALG_HMAC_SHA384, 384, 1024},
+    {KM_DIGEST_SHA_2_512, TEE_TYPE_HMAC_SHA512, TEE_ALG_HMAC_SHA512, 512, 1024},
 };
 
 keymaster_error_t check_key_size(uint32_t key_bits, trace_site at) {
@@ -87,7 +88,8 @@ TEE_Result normalise(byte_view key, const hmac_hash_t& hash, byte_span block) {
   const trace_site at{"hash", __LINE__};
   tee_operation digest;
   size_t length = 0;
-  if (TEE_Result res = digest.allocate(hash.digest_algorithm, TEE_MODE_DIGEST, 0, at)) return res;
+  const uint32_t algorithm = find_digest(hash.digest)->algorithm;
+  if (TEE_Result res = digest.allocate(algorithm, TEE_MODE_DIGEST, 0, at)) return res;
   return digest.digest_final(key, block, &length, at);
 }
 
