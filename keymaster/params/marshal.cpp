@@ -87,6 +87,7 @@ TEE_Result unmarshal(byte_view input, keymaster_key_param_set_t* set) {
   input_cursor in(input);
   uint32_t count = 0;
   if (!in.read_u32(&count)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
+  if (count == 0) return TEE_SUCCESS;  // most commands carry no parameters
   if (count > UINT32_MAX / ENTRY_SIZE) return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   // Never room for more records than the input can hold: a count is four bytes, an array is not.
   const size_t capacity = count < in.left() / ENTRY_SIZE ? count : in.left() / ENTRY_SIZE;

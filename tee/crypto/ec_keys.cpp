@@ -28,6 +28,27 @@ secret_bytes encode_point(const attribute& x, const attribute& y) {
   return point;
 }
 
+// The attributes of a key pair. All its numbers are asked for at once, and the point as a whole:
+// libcrypto computes the coordinates anew for every question about one of them.
+std::vector<attribute> numbers_of(const EVP_PKEY* pkey, const curve& on) {
+  secret_bytes point(1 + 2 * on.length());
+  secret_bytes native(on.length());
+  OSSL_PARAM params[] = {
+      OSSL_PARAM_construct_octet_string(OSSL_PKEY_PARAM_PUB_KEY, point.data(), point.size()),
+      OSSL_PARAM_construct_BN(OSSL_PKEY_PARAM_PRIV_KEY, native.data(), native.size()),
+      OSSL_PARAM_construct_end()};
+  must(EVP_PKEY_get_params(pkey, params) == 1 && params[0].return_size == point.size() &&
+           params[1].return_size == native.size() && point.front() == UNCOMPRESSED_POINT,
+       "EVP_PKEY_get_params");
+  auto y = point.end() - static_cast<std::ptrdiff_t>(on.length());
+  std::vector<attribute> attributes;
+  attributes.push_back({TEE_ATTR_ECC_CURVE, {}, on.id, 0});
+  attributes.push_back({TEE_ATTR_ECC_PUBLIC_VALUE_X, secret_bytes(point.begin() + 1, y)});
+  attributes.push_back({TEE_ATTR_ECC_PUBLIC_VALUE_Y, secret_bytes(y, point.end())});
+  attributes.push_back({TEE_ATTR_ECC_PRIVATE_VALUE, from_native(native)});
+  return attributes;
+}
+
 bool private_half_matches(EVP_PKEY* pkey) {
   pkey_ctx_ptr context(EVP_PKEY_CTX_new_from_pkey(nullptr, pkey, nullptr));
   must(context != nullptr, "EVP_PKEY_CTX_new_from_pkey");
@@ -64,16 +85,8 @@ TEE_Result generate_ec_key(uint32_t bits, std::span<const attribute> parameters,
   if (!on || on->bits != bits) return TEE_ERROR_BAD_PARAMETERS;
   pkey_ptr pkey(EVP_EC_gen(on->name));
   must(pkey != nullptr, "EVP_EC_gen");
-  auto number = [&](uint32_t id, const char* param) {
-    return attribute{id, to_bytes(number_of(pkey.get(), param).get(), on->length())};
-  };
-  std::vector<attribute> attributes;
-  attributes.push_back({TEE_ATTR_ECC_CURVE, {}, on->id, 0});
-  attributes.push_back(number(TEE_ATTR_ECC_PUBLIC_VALUE_X, OSSL_PKEY_PARAM_EC_PUB_X));
-  attributes.push_back(number(TEE_ATTR_ECC_PUBLIC_VALUE_Y, OSSL_PKEY_PARAM_EC_PUB_Y));
-  attributes.push_back(number(TEE_ATTR_ECC_PRIVATE_VALUE, OSSL_PKEY_PARAM_PRIV_KEY));
-  *result =
-      std::make_shared<key>(TEE_TYPE_ECDSA_KEYPAIR, bits, std::move(attributes), std::move(pkey));
+  *result = std::make_shared<key>(TEE_TYPE_ECDSA_KEYPAIR, bits, numbers_of(pkey.get(), *on),
+                                  std::move(pkey));
   return TEE_SUCCESS;
 }
 

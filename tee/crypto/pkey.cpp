@@ -51,6 +51,10 @@ secret_bytes to_bytes(const BIGNUM* number, size_t length) {
   return bytes;
 }
 
+secret_bytes from_native(std::span<const uint8_t> native) {
+  return {native.rbegin(), native.rend()};
+}
+
 bignum_ptr number_of(const EVP_PKEY* pkey, const char* name) {
   BIGNUM* number = nullptr;
   must(EVP_PKEY_get_bn_param(pkey, name, &number) == 1, name);

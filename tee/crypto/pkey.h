@@ -36,6 +36,9 @@ inline secret_bytes to_bytes(const BIGNUM* number) {
   return to_bytes(number, static_cast<size_t>(BN_num_bytes(number)));
 }
 
+// from_native: a number that libcrypto wrote into a parameter, as big-endian bytes of that length.
+secret_bytes from_native(std::span<const uint8_t> native);
+
 // number_of: a number of the key by libcrypto's name.
 bignum_ptr number_of(const EVP_PKEY* pkey, const char* name);
 

@@ -162,6 +162,7 @@ TEE_Result generate_rsa_key(uint32_t bits, std::span<const attribute> parameters
   pkey_ptr pkey = generate_pkey(bits, wanted.get());
   if (!pkey) return TEE_ERROR_BAD_PARAMETERS;
   std::vector<attribute> attributes;
+  attributes.reserve(NUMBERS.size());
   for (const number_name& name : NUMBERS) {
     attributes.push_back({name.attribute, to_bytes(number_of(pkey.get(), name.param).get())});
   }

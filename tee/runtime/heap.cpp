@@ -59,7 +59,7 @@ void* heap::allocate(size_t size, bool zero) {
 
 void* heap::resize(void* block, size_t size) {
   if (!block) return allocate(size, true);
-  const size_t old_size = live("TEE_Realloc", block).size;
+  const size_t old_size = table_[live_slot("TEE_Realloc", block)].size;
   void* moved = allocate(size, true);
   if (!moved) return nullptr;
   if (size_t kept = std::min(old_size, size); kept > 0) std::memcpy(moved, block, kept);
@@ -69,8 +69,9 @@ void* heap::resize(void* block, size_t size) {
 
 void heap::release(void* block) {
   if (!block) return;
-  size_t size = live("TEE_Free", block).size;
-  erase(slot_of(block));
+  const size_t slot = live_slot("TEE_Free", block);
+  const size_t size = table_[slot].size;
+  erase(slot);
   wipe_and_free(block, size);
 }
 
@@ -89,11 +90,12 @@ size_t heap::slot_of(const void* block) const {
   return slot;
 }
 
-const heap::entry& heap::live(const char* call, const void* block) const {
-  if (table_.empty() || !table_[slot_of(block)].block) {
+size_t heap::live_slot(const char* call, const void* block) const {
+  const size_t slot = table_.empty() ? 0 : slot_of(block);
+  if (table_.empty() || !table_[slot].block) {
     panic(call, "%p is not a live block of this heap", block);
   }
-  return table_[slot_of(block)];
+  return slot;
 }
 
 void heap::insert(void* block, size_t size) {

@@ -45,7 +45,7 @@ class heap {
   void insert(void* block, size_t size);
   void erase(size_t slot);
   void grow();
-  const entry& live(const char* call, const void* block) const;
+  size_t live_slot(const char* call, const void* block) const;  // panics when it is not there
 
   size_t limit_;
   size_t bytes_ = 0;
