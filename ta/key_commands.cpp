@@ -1,6 +1,7 @@
 // The commands that describe, export and delete keys, and configure.
 #include "keymaster/alg/algorithm.h"
 #include "keymaster/params/marshal.h"
+#include "soter/export.h"
 #include "ta/command.h"
 #include "ta/configured.h"
 #include "ta/opened_key.h"
@@ -78,6 +79,10 @@ TEE_Result export_key(command_io* io, keymaster_error_t* km_error) {
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   if (contains_tag(key.characteristics, KM_TAG_SOTER_KEY)) {
     TRACE_DEBUG("soter export_key\n");
+    if (soter_enhance_export_key(key.characteristics, key.material.view(), io->output,
+                                 &io->output_size) != TEE_SUCCESS) {
+      TRACE_ERROR("Export key failed");
+    }
     return TEE_SUCCESS;  // whatever that export did: intended, clients look at the output alone
   }
   TRACE_DEBUG("normal export_key\n");
