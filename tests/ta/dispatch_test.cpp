@@ -126,10 +126,11 @@ TEST(EntryPoints, CreateForgetsTheInstanceBefore) {
     params[1].memref = {memory, 4};
     EXPECT_EQ(invoke(nullptr, 25, 0x53, params), TEE_SUCCESS);
     for (const auto& [a, b] : {std::pair{0u, 0u}, {0u, 5u}, {5u, 0u}}) {
-      params[0].value = {a, b};
-      params[2].memref = {memory, sizeof(memory)};
-      EXPECT_EQ(invoke(nullptr, 0xFF02, 0x602, params) == BAD_PARAMETERS, a + b != 0);
-      EXPECT_EQ(invoke(nullptr, 0xFF03, 0x602, params) == BAD_PARAMETERS, a + b != 0);
+      for (const uint32_t id : {0xFF02, 0xFF03}) {
+        params[0].value = {a, b};
+        params[2].memref = {memory, sizeof(memory)};
+        EXPECT_EQ(invoke(nullptr, id, 0x602, params) == BAD_PARAMETERS, a + b != 0);
+      }
     }
     destroy();
     EXPECT_EQ(instance.counts().heap_blocks, 0u);
