@@ -36,7 +36,8 @@ bool same_key(const key& held, const key_type& type, const std::vector<attribute
 TEE_Result key_cache::load(uint32_t type, uint32_t max_bits, std::vector<attribute> attributes,
                            key_ptr* result) {
   const key_type& row = *find_key_type(type);
-  std::vector<attribute> ordered = in_table_order(type, std::move(attributes));
+  std::vector<attribute> ordered =
+      row.symmetric() ? std::move(attributes) : in_table_order(type, std::move(attributes));
   auto found = std::find_if(held_.begin(), held_.end(),
                             [&](const key_ptr& held) { return same_key(*held, row, ordered); });
   if (found != held_.end()) {

@@ -18,7 +18,7 @@ template <typename Engine>
 TEE_Result finish(Engine& engine, std::span<const uint8_t> last, tee::output_buffer output) {
   if (TEE_Result fault = fault_point()) return fault;
   if (TEE_Result res = output.reserve(engine.length())) return res;
-  engine.update(last);
+  if (!last.empty()) engine.update(last);
   engine.finish(output.data());
   output.set_length(engine.length());
   return TEE_SUCCESS;

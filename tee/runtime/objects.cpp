@@ -30,6 +30,7 @@ std::vector<attribute> copy_attributes(const char* call, const TEE_Attribute* at
                                        uint32_t count) {
   if (!attributes && count > 0) panic(call, "attributes are null with count %u", count);
   std::vector<attribute> copies;
+  copies.reserve(count);
   for (uint32_t i = 0; i < count; ++i) {
     const TEE_Attribute& given = attributes[i];
     attribute& copy = copies.emplace_back(attribute{given.attributeID, {}});
