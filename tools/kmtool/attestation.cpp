@@ -107,8 +107,8 @@ std::optional<keymaster_tag_t> tag_of(uint32_t number) {
   return std::nullopt;
 }
 
-void add_number(keymaster_tag_t tag, uint64_t number, const std::string& name,
-                client::param_set* params) try {
+void add_param(keymaster_tag_t tag, uint64_t number, const std::string& name,
+               client::param_set* params) try {
   params->add(tag, number);
 } catch (const std::invalid_argument&) {
   throw attestation_error("number out of range: " + name);
@@ -123,7 +123,7 @@ void add_field(keymaster_tag_t tag, byte_view wrapped, client::param_set* params
     case KM_ULONG_REP: {
       der_reader elements(value.next(name.c_str(), V_ASN1_SET));
       while (!elements.done())
-        add_number(tag, elements.next_number(name.c_str()), name, params);
+        add_param(tag, elements.next_number(name.c_str()), name, params);
       return;
     }
     case KM_BOOL:
@@ -135,7 +135,7 @@ void add_field(keymaster_tag_t tag, byte_view wrapped, client::param_set* params
       params->add_bytes(tag, value.next(name.c_str(), V_ASN1_OCTET_STRING));
       return;
     default:
-      add_number(tag, value.next_number(name.c_str()), name, params);
+      add_param(tag, value.next_number(name.c_str()), name, params);
   }
 }
 
