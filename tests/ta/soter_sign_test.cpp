@@ -1,14 +1,9 @@
-// The documents of SOTER keys, byte by byte, on a device that the factory has
-// provisioned: what a sign operation makes of a message, and what the export of
-// a key is. libcrypto verifies.
+// The documents of SOTER keys, byte by byte, on a device that the factory has provisioned: what a
+// sign operation makes of a message, and what the export of a key is. libcrypto verifies.
 #include <algorithm>
 #include <openssl/evp.h>
 
-#include "client/soter.h"
-#include "client/vault.h"
-#include "support/sets.h"
-#include "support/ta_under_test.h"
-#include "ta/pkey.h"
+#include "ta/soter_device.h"
 
 namespace keymaster::test {
 namespace {
@@ -19,24 +14,19 @@ using client::as_bytes;
 constexpr scheme PKCS1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA_2_256};
 constexpr scheme UNDIGESTED = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_NONE};
 
-const pkey &key_1024() {
+const pkey& key_1024() {
   static const pkey key = pkey::rsa(1024);
-  return key;
-}
-const pkey &attk() {
-  static const pkey key = pkey::rsa(2048);
   return key;
 }
 
 // The last member of an export document and the end of the document.
 std::string public_key_member(byte_view spki) {
   std::string text = R"("pub_key":"-----BEGIN PUBLIC KEY-----\n)";
-  for (; !spki.empty();
-       spki = spki.subspan(std::min<size_t>(48, spki.size()))) {
+  for (; !spki.empty(); spki = spki.subspan(std::min<size_t>(48, spki.size()))) {
     char line[65] = {};
-    EVP_EncodeBlock(reinterpret_cast<unsigned char *>(line), spki.data(),
+    EVP_EncodeBlock(reinterpret_cast<unsigned char*>(line), spki.data(),
                     static_cast<int>(std::min<size_t>(48, spki.size())));
-    for (const char *c = line; *c != '\0'; c++)
+    for (const char* c = line; *c != '\0'; c++)
       text += *c == '/' ? "\\/" : std::string(1, *c);
     text += "\\n";
   }
@@ -45,90 +35,39 @@ std::string public_key_member(byte_view spki) {
 
 // The end of every signed document of the device.
 constexpr char DEVICE[] =
-    R"("tee_n":"Keymaster","tee_v":"0.1.0","fp_n":"sensor\/1","fp_v":"v2","cpu_id":"cpu"})";
+    R"("tee_n":"Keymaster","tee_v":"0.1.0","fp_n":"s","fp_v":"2","cpu_id":"c"})";
 
-param_set soter_key() {
-  param_set key = one(KM_TAG_ALGORITHM, KM_ALGORITHM_RSA)
-                      .add_flag(KM_TAG_NO_AUTH_REQUIRED)
-                      .add_flag(KM_TAG_SOTER_KEY)
-                      .add(KM_TAG_PURPOSE, KM_PURPOSE_SIGN)
-                      .add(KM_TAG_PADDING, KM_PAD_RSA_PKCS1_1_5_SIGN)
-                      .add(KM_TAG_PADDING, KM_PAD_RSA_PSS);
-  for (uint32_t digest = KM_DIGEST_NONE; digest <= KM_DIGEST_SHA_2_512;
-       digest++)
-    key.add(KM_TAG_DIGEST, digest);
-  return key;
-}
+class SoterDocument : public soter_device {
+ protected:
+  SoterDocument() { load(); }
 
-param_set use(scheme how) {
-  return one(KM_TAG_PADDING, how.padding).add(KM_TAG_DIGEST, how.digest);
-}
-
-class SoterDocument : public testing::Test {
-protected:
-  SoterDocument() {
-    client::factory_data factory;
-    factory.attk = client::read_rsa_numbers(attk().import_data());
-    factory.fingerprint_name = "sensor/1";
-    factory.fingerprint_version = "v2";
-    factory.cpu_id = "cpu";
-    EXPECT_TRUE(
-        client::vault(client::context(ta.path())).provision(factory).ok());
-    load();
-  }
-
-  // Has the instance load the device's data, which stays, in a session that
-  // nobody takes count of.
-  void load() {
-    client::connection keymaster(client::context(ta.path()),
-                                 client::KEYMASTER_UUID);
-    client::parameter_slots slots{};
-    keymaster.invoke(0xFF00, TEEC_PARAM_TYPES(TEEC_VALUE_INOUT, 0, 0, 0),
-                     &slots);
-    EXPECT_EQ(slots[0].value.a, 0u);
-  }
-
-  void match(uint32_t fid) {
-    client::fingerprint_sensor sensor{client::context(ta.path())};
-    EXPECT_TRUE(sensor.report_match(fid).ok());
-  }
-
-  // What finish answers to a message, and what it puts out when it must
-  // succeed.
-  reply sign(byte_view blob, scheme how, std::string_view message,
-             const param_set &last = {}) {
-    const uint32_t handle = ta.begun(KM_PURPOSE_SIGN, blob, use(how));
+  // What finish answers to a message, and what it puts out when it must succeed.
+  reply sign(byte_view blob, scheme how, std::string_view message, const param_set& last = {}) {
+    const uint32_t handle = ta.begun(KM_PURPOSE_SIGN, blob, soter_use(how));
     EXPECT_TRUE(succeeded(ta.update(handle, as_bytes(message))));
-    return ta.send(step_request(command::FINISH, handle, {}, last,
-                                message.size() + AMPLE));
+    return ta.send(step_request(command::FINISH, handle, {}, last, message.size() + AMPLE));
   }
-  client::signed_document signed_by(byte_view blob, scheme how,
-                                    std::string_view message) {
+  client::signed_document signed_by(byte_view blob, scheme how, std::string_view message) {
     const reply answer = sign(blob, how, message);
     EXPECT_TRUE(succeeded(answer)) << ta.trace().errors();
     return parsed(answer);
   }
-  static client::signed_document parsed(const reply &finished) {
-    return client::parse_signed_document(
-        client::field_reader(finished.output()).field());
+  static client::signed_document parsed(const reply& finished) {
+    return client::parse_signed_document(client::field_reader(finished.output()).field());
   }
 
-  // The document of the key's export when there is one; export itself always
-  // succeeds.
+  // The document of the key's export when there is one; export itself always succeeds.
   std::optional<client::signed_document> exported(byte_view blob) {
     const reply answer = ta.send(key_request(command::EXPORT_KEY, blob));
     EXPECT_TRUE(succeeded(answer));
-    if (answer.output_size == 0)
-      return std::nullopt;
+    if (answer.output_size == 0) return std::nullopt;
     return client::parse_signed_document(answer.output());
   }
-
-  ta_under_test ta{options{.trace_level = TEE_TRACE_DEBUG}};
 };
 
 TEST_F(SoterDocument, HoldsWhatTheDeviceKnows) {
   const bytes blob = ta.import(soter_key(), key_1024().import_data());
-  match(4294967295);
+  report_finger(4294967295);
   const auto first = signed_by(blob, PKCS1, "a/b \"\xc3\xa9\"\n\x01");
   EXPECT_EQ(first.text(), R"({"raw":"a\/b \")"
                           "\xc3\xa9"
@@ -139,28 +78,24 @@ TEST_F(SoterDocument, HoldsWhatTheDeviceKnows) {
   // The zero byte is signed.
   EXPECT_EQ(first.document.back(), 0);
   EXPECT_TRUE(key_1024().verify(PKCS1, first.document, first.signature));
-  EXPECT_FALSE(
-      key_1024().verify(PKCS1, as_bytes(first.text()), first.signature));
+  EXPECT_FALSE(key_1024().verify(PKCS1, as_bytes(first.text()), first.signature));
 
   ta_under_test::advance(3000);
   EXPECT_EQ(signed_by(blob, PKCS1, "").text(),
-            R"({"raw":"","fid":4294967295,"counter":2,"uid":0,)" +
-                std::string(DEVICE));
+            R"({"raw":"","fid":4294967295,"counter":2,"uid":0,)" + std::string(DEVICE));
   ta_under_test::advance(1);
   EXPECT_EQ(signed_by(blob, PKCS1, "x").text(),
             R"({"raw":"x","counter":3,"uid":0,)" + std::string(DEVICE));
-  EXPECT_TRUE(ta.trace().has(
-      "produce_soter_sign_json: get finger id error ffff3001, continue "
-      "without fid"));
+  EXPECT_TRUE(
+      ta.trace().has("produce_soter_sign_json: get finger id error ffff3001, continue "
+                     "without fid"));
 
   // The user is the key's; what finish is given does not matter.
-  match(7);
+  report_finger(7);
   const param_set user = one(KM_TAG_SOTER_UID, 4000000000);
-  const bytes of_user =
-      ta.import(soter_key().append(user), key_1024().import_data());
+  const bytes of_user = ta.import(soter_key(user), key_1024().import_data());
   EXPECT_EQ(signed_by(of_user, PKCS1, "x").text(),
-            R"({"raw":"x","fid":7,"counter":4,"uid":4000000000,)" +
-                std::string(DEVICE));
+            R"({"raw":"x","fid":7,"counter":4,"uid":4000000000,)" + std::string(DEVICE));
   EXPECT_EQ(parsed(sign(blob, PKCS1, "x", user)).text(),
             R"({"raw":"x","fid":7,"counter":5,"uid":0,)" + std::string(DEVICE));
 
@@ -173,26 +108,22 @@ TEST_F(SoterDocument, HoldsWhatTheDeviceKnows) {
 
 TEST_F(SoterDocument, IsSignedWithEverySchemeOfTheKey) {
   constexpr int DIGEST_SIZES[] = {0, 16, 20, 28, 32, 48, 64};
-  for (const pkey *key : {&key_1024(), &attk()}) {
-    const bytes blob = ta.import(soter_key(), key->import_data());
-    for (uint32_t digest = KM_DIGEST_MD5; digest <= KM_DIGEST_SHA_2_512;
-         digest++) {
+  for (const pkey* key : {&key_1024(), &attk()}) {
+    const auto signed_with = [&](scheme how) {
+      return signed_by(ta.import(soter_key({}, how), key->import_data()), how, "message");
+    };
+    for (uint32_t digest = KM_DIGEST_MD5; digest <= KM_DIGEST_SHA_2_512; digest++) {
       const scheme pkcs1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, digest};
-      const auto made = signed_by(blob, pkcs1, "message");
+      const auto made = signed_with(pkcs1);
       EXPECT_EQ(made.signature.size(), key->size());
       EXPECT_TRUE(key->verify(pkcs1, made.document, made.signature)) << digest;
-      if (digest == KM_DIGEST_MD5)
-        continue;
-      // The salt is the longest, also where other keys' is as long as the
-      // digest.
+      if (digest == KM_DIGEST_MD5) continue;
+      // The salt is the longest, also where other keys' is as long as the digest.
       const scheme pss = {KM_PAD_RSA_PSS, digest};
-      const int longest =
-          static_cast<int>(key->size()) - DIGEST_SIZES[digest] - 2;
-      const auto salted = signed_by(blob, pss, "message");
-      EXPECT_TRUE(key->verify(pss, salted.document, salted.signature, longest))
-          << digest;
-      EXPECT_FALSE(key->verify(pss, salted.document, salted.signature,
-                               DIGEST_SIZES[digest]));
+      const int longest = static_cast<int>(key->size()) - DIGEST_SIZES[digest] - 2;
+      const auto salted = signed_with(pss);
+      EXPECT_TRUE(key->verify(pss, salted.document, salted.signature, longest)) << digest;
+      EXPECT_FALSE(key->verify(pss, salted.document, salted.signature, DIGEST_SIZES[digest]));
     }
   }
 }
@@ -202,44 +133,39 @@ TEST_F(SoterDocument, IsRefused) {
   const struct {
     scheme how;
     std::string message;
-    bool counted; // whether the counter moves
-    const char *trace;
+    bool counted;  // whether the counter moves
+    const char* trace;
   } rows[] = {
       {PKCS1, "abc\0"s, false,
-       "produce_soter_sign_json: Not a valid utf8 string, strlen(raw) 3 length "
-       "4"},
+       "produce_soter_sign_json: Not a valid utf8 string, strlen(raw) 3 length 4"},
       {PKCS1, "\0abc"s, false,
-       "produce_soter_sign_json: Not a valid utf8 string, strlen(raw) 0 length "
-       "4"},
+       "produce_soter_sign_json: Not a valid utf8 string, strlen(raw) 0 length 4"},
       {PKCS1, "a\xed\xa0\x80", false,
-       "produce_soter_sign_json: Not a valid utf8 string, strlen(raw) 4 length "
-       "4"},
-      {PKCS1, "\xc3", false,
-       "soter_enhance_sign_finish: produce json string error"},
-      // No signature fits a key's operation without a digest, however long the
-      // document.
+       "produce_soter_sign_json: Not a valid utf8 string, strlen(raw) 4 length 4"},
+      {PKCS1, "\xc3", false, "soter_enhance_sign_finish: produce json string error"},
+      // Without a digest there is no signature for a document, however short it is.
       {UNDIGESTED, "", true, "rsa_sign_finish: soter enhance error ffff0007"},
-      {UNDIGESTED, std::string(128, 'x'), true,
-       "rsa_sign_finish: soter enhance error ffff000c"},
+      {UNDIGESTED, std::string(128, 'x'), true, "rsa_sign_finish: soter enhance error ffff000c"},
   };
   int counter = 0;
-  for (const auto &row : rows) {
-    EXPECT_TRUE(
-        refused(sign(blob, row.how, row.message), KM_ERROR_UNKNOWN_ERROR));
+  for (const auto& row : rows) {
+    EXPECT_TRUE(refused(
+        sign(ta.import(soter_key({}, row.how), key_1024().import_data()), row.how, row.message),
+        KM_ERROR_UNKNOWN_ERROR));
     EXPECT_TRUE(ta.trace().has(row.trace)) << ta.trace().errors();
     counter += row.counted ? 2 : 1;
-    EXPECT_EQ(signed_by(blob, PKCS1, "").text(), R"({"raw":"","counter":)" +
-                                                     std::to_string(counter) +
-                                                     R"(,"uid":0,)" + DEVICE);
+    EXPECT_EQ(signed_by(blob, PKCS1, "").text(),
+              R"({"raw":"","counter":)" + std::to_string(counter) + R"(,"uid":0,)" + DEVICE);
   }
 }
 
 TEST_F(SoterDocument, HoldsMessagesOfAnyLength) {
+  const trace_capture lines(TEE_TRACE_DEBUG);
   const bytes blob = ta.import(soter_key(), key_1024().import_data());
-  const uint32_t handle = ta.begun(KM_PURPOSE_SIGN, blob, use(PKCS1));
+  const uint32_t handle = ta.begun(KM_PURPOSE_SIGN, blob, soter_use(PKCS1));
   const struct {
     size_t size;
-    const char *trace; // of an expansion
+    const char* trace;  // of an expansion
   } parts[] = {
       {4096, nullptr},
       {0, nullptr},
@@ -248,24 +174,20 @@ TEST_F(SoterDocument, HoldsMessagesOfAnyLength) {
       {20000, "rsa_sign_update: expand soter buf 8192 -> 28192"},
   };
   std::string message;
-  for (const auto &part : parts) {
+  for (const auto& part : parts) {
     std::string text(part.size, 'a');
-    std::ranges::generate(text, [n = message.size()]() mutable {
-      return "0123456789abc"[n++ % 13];
-    });
+    std::ranges::generate(text,
+                          [n = message.size()]() mutable { return "0123456789abc"[n++ % 13]; });
     const reply answer = ta.update(handle, as_bytes(text));
     EXPECT_TRUE(succeeded(answer));
     EXPECT_EQ(answer.b, part.size);
-    EXPECT_EQ(part.trace != nullptr,
-              ta.trace().has(part.trace == nullptr ? "" : part.trace));
+    EXPECT_TRUE(part.trace == nullptr || lines.has(part.trace));
     message += text;
   }
-  const reply answer =
-      ta.send(step_request(command::FINISH, handle, {}, {}, 40000));
+  const reply answer = ta.send(step_request(command::FINISH, handle, {}, {}, 40000));
   ASSERT_TRUE(succeeded(answer)) << ta.trace().errors();
   const auto made = parsed(answer);
-  EXPECT_EQ(made.text(),
-            R"({"raw":")" + message + R"(","counter":1,"uid":0,)" + DEVICE);
+  EXPECT_EQ(made.text(), R"({"raw":")" + message + R"(","counter":1,"uid":0,)" + DEVICE);
   EXPECT_TRUE(key_1024().verify(PKCS1, made.document, made.signature));
 }
 
@@ -273,12 +195,12 @@ TEST_F(SoterDocument, HoldsMessagesOfAnyLength) {
 // document then goes without. The counter never comes twice.
 TEST_F(SoterDocument, FaultsOfSigning) {
   const bytes blob = ta.import(soter_key(), key_1024().import_data());
-  signed_by(blob, PKCS1, "x"); // makes the counter
+  signed_by(blob, PKCS1, "x");  // makes the counter
   uint64_t last = 1;
   int without_version = 0;
   bool fired = true;
   for (uint64_t n = 1; fired; n++) {
-    const uint32_t handle = ta.begun(KM_PURPOSE_SIGN, blob, use(PKCS1));
+    const uint32_t handle = ta.begun(KM_PURPOSE_SIGN, blob, soter_use(PKCS1));
     ta.update(handle, as_bytes("x"));
     const request what = step_request(command::FINISH, handle);
     tee::host::fail_nth_call(n, TEE_ERROR_OUT_OF_MEMORY);
@@ -292,9 +214,7 @@ TEST_F(SoterDocument, FaultsOfSigning) {
     }
     const std::string text(parsed(answer).text());
     without_version += fired ? 1 : 0;
-    EXPECT_EQ(fired,
-              text.find("tee_v") == text.npos || text.find("fp_v") == text.npos)
-        << text;
+    EXPECT_EQ(fired, text.find("tee_v") == text.npos || text.find("fp_v") == text.npos) << text;
     const uint64_t counter = std::stoull(text.substr(text.find("counter") + 9));
     EXPECT_GT(counter, last);
     last = counter;
@@ -304,9 +224,9 @@ TEST_F(SoterDocument, FaultsOfSigning) {
 }
 
 class SoterExport : public SoterDocument {
-protected:
-  bytes made(const param_set &extra) {
-    return ta.import(soter_key().append(extra), key_1024().import_data());
+ protected:
+  bytes made(const param_set& extra) {
+    return ta.import(soter_key(extra), key_1024().import_data());
   }
   static param_set blob_tag(keymaster_tag_t tag, byte_view blob) {
     return param_set().add_flag(KM_TAG_SOTER_KEY_SIGNS).add_bytes(tag, blob);
@@ -315,93 +235,75 @@ protected:
   const param_set by_attk = param_set().add_flag(KM_TAG_SOTER_ATTK_SIGNS);
   const bytes signer = ta.import(soter_key(), attk().import_data());
   const bytes small_signer = ta.import(soter_key(), key_1024().import_data());
-  const bytes plain_key = ta.import(without(soter_key(), KM_TAG_SOTER_KEY),
-                                    key_1024().import_data());
+  const bytes plain_key =
+      ta.import(without(soter_key(), KM_TAG_SOTER_KEY), key_1024().import_data());
 };
 
 TEST_F(SoterExport, IsSignedByWhomTheKeySays) {
   const bytes no_rsa = ta.generate(hmac_key(256));
-  const std::string public_key = public_key_member(
-      ta.send(key_request(command::EXPORT_KEY, plain_key)).output());
+  const std::string public_key =
+      public_key_member(ta.send(key_request(command::EXPORT_KEY, plain_key)).output());
   const struct {
-    const char *name;
+    const char* name;
     param_set extra;
-    const pkey *signed_by; // null: there is no document
-    std::string members;
-    const char *trace;
+    const pkey* signed_by;  // null: there is no document
+    std::string members = {};
+    const char* failure = nullptr;
   } rows[] = {
-      {"attk", by_attk, &attk(), "", "soter use attkey sign"},
-      {"blob", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, signer), &attk(), "",
-       "use key blob argument to retrieve sign key"},
-      {"name", blob_tag(KM_TAG_SOTER_SIGN_KEY_NAME, small_signer), &key_1024(),
-       "", "use key name argument as key blob to retrieve sign key"},
+      {"attk", by_attk, &attk()},
+      {"blob", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, signer), &attk()},
+      {"name", blob_tag(KM_TAG_SOTER_SIGN_KEY_NAME, small_signer), &key_1024()},
       {"blob before name",
        blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, small_signer)
            .append(blob_tag(KM_TAG_SOTER_SIGN_KEY_NAME, signer)),
-       &key_1024(), "", "use key blob argument to retrieve sign key"},
-      {"attk before blob",
-       blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, small_signer).append(by_attk),
-       &attk(), "", "soter use attkey sign"},
-      {"counter", param_set(by_attk).add_flag(KM_TAG_SOTER_COUNTER), &attk(),
-       R"("counter":1,)", "This key need increase the counter"},
-      {"uid", param_set(by_attk).add(KM_TAG_SOTER_UID, 5), &attk(),
-       R"("uid":5,)", "soter key has uid"},
+       &key_1024()},
+      {"attk before blob", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, small_signer).append(by_attk),
+       &attk()},
+      {"counter", param_set(by_attk).add_flag(KM_TAG_SOTER_COUNTER), &attk(), R"("counter":1,)"},
+      {"uid", param_set(by_attk).add(KM_TAG_SOTER_UID, 5), &attk(), R"("uid":5,)"},
       {"counter and uid",
-       param_set(by_attk)
-           .add(KM_TAG_SOTER_UID, 0)
-           .add_flag(KM_TAG_SOTER_COUNTER),
-       &attk(), R"("counter":2,"uid":0,)", "soter key has uid"},
-      {"nobody", {}, nullptr, "", nullptr},
-      {"blob without its flag",
-       param_set().add_bytes(KM_TAG_SOTER_SIGN_KEY_BLOB, signer), nullptr, "",
-       nullptr},
-      {"flag without a blob", param_set().add_flag(KM_TAG_SOTER_KEY_SIGNS),
-       nullptr, "", "no sign key with key blob"},
-      {"no blob at all", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, bytes(200, 1)),
-       nullptr, "", "Sign key is null"},
-      {"no RSA key", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, no_rsa), nullptr, "",
+       param_set(by_attk).add(KM_TAG_SOTER_UID, 0).add_flag(KM_TAG_SOTER_COUNTER), &attk(),
+       R"("counter":2,"uid":0,)"},
+      {"nobody", {}, nullptr},
+      {"blob without its flag", param_set().add_bytes(KM_TAG_SOTER_SIGN_KEY_BLOB, signer), nullptr},
+      {"flag without a blob", param_set().add_flag(KM_TAG_SOTER_KEY_SIGNS), nullptr, "",
+       "no sign key with key blob"},
+      {"no blob at all", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, bytes(200, 1)), nullptr, "",
        "Sign key is null"},
+      {"no RSA key", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, no_rsa), nullptr, "", "Sign key is null"},
   };
-  for (const auto &row : rows) {
+  for (const auto& row : rows) {
     SCOPED_TRACE(row.name);
     const bytes blob = made(row.extra);
     const auto document = exported(blob);
-    EXPECT_TRUE(row.trace == nullptr ||
-                ta.trace().has("soter_enhance_export_key: "s + row.trace));
+    EXPECT_TRUE(row.failure == nullptr ||
+                ta.trace().has("soter_enhance_export_key: "s + row.failure));
     ASSERT_EQ(document.has_value(), row.signed_by != nullptr);
-    if (!document)
-      continue;
+    if (!document) continue;
     EXPECT_EQ(document->text(), "{" + row.members + public_key);
     EXPECT_EQ(document->signature.size(), row.signed_by->size());
-    EXPECT_TRUE(
-        row.signed_by->verify(PKCS1, document->document, document->signature));
+    EXPECT_TRUE(row.signed_by->verify(PKCS1, document->document, document->signature));
   }
   // A key of another algorithm that says it is SOTER's.
-  EXPECT_FALSE(exported(
-      ta.generate(hmac_key(256).add_flag(KM_TAG_SOTER_KEY).append(by_attk))));
+  EXPECT_FALSE(exported(ta.generate(hmac_key(256).add_flag(KM_TAG_SOTER_KEY).append(by_attk))));
 }
 
 TEST_F(SoterExport, RespectsTheOutput) {
   const bytes blob = made(by_attk);
-  const size_t needed =
-      ta.send(key_request(command::EXPORT_KEY, blob)).output_size;
-  for (const size_t capacity :
-       {size_t{0}, size_t{4}, needed - 1, needed, needed + 1}) {
-    const reply answer =
-        ta.send(key_request(command::EXPORT_KEY, blob, {}, capacity));
+  const size_t needed = ta.send(key_request(command::EXPORT_KEY, blob)).output_size;
+  for (const size_t capacity : {size_t{0}, size_t{4}, needed - 1, needed, needed + 1}) {
+    const reply answer = ta.send(key_request(command::EXPORT_KEY, blob, {}, capacity));
     EXPECT_TRUE(succeeded(answer));
     EXPECT_EQ(answer.output_size, capacity < needed ? 0 : needed);
-    EXPECT_TRUE(capacity >= needed ||
-                answer.buffer == bytes(capacity, UNTOUCHED));
+    EXPECT_TRUE(capacity >= needed || answer.buffer == bytes(capacity, UNTOUCHED));
   }
 }
 
 TEST_F(SoterExport, FaultsLeaveNoDocument) {
-  const param_set extras[] = {param_set(by_attk)
-                                  .add_flag(KM_TAG_SOTER_COUNTER)
-                                  .add(KM_TAG_SOTER_UID, 1),
-                              blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, signer)};
-  for (const param_set &extra : extras) {
+  const param_set extras[] = {
+      param_set(by_attk).add_flag(KM_TAG_SOTER_COUNTER).add(KM_TAG_SOTER_UID, 1),
+      blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, signer)};
+  for (const param_set& extra : extras) {
     const bytes blob = made(extra);
     exported(blob);
     bool fired = true;
@@ -417,17 +319,13 @@ TEST_F(SoterExport, FaultsLeaveNoDocument) {
   }
 }
 
-// Without the factory's data no operation begins, and no document is signed
-// with the ATTK.
+// Without the factory's data no operation begins, and no document is signed with the ATTK.
 TEST(SoterUnprovisioned, HasNoDocuments) {
   ta_under_test ta;
   const param_set by_attk = param_set().add_flag(KM_TAG_SOTER_ATTK_SIGNS);
-  const bytes blob =
-      ta.import(soter_key().append(by_attk), key_1024().import_data());
-  EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, use(PKCS1)),
-                      KM_ERROR_UNKNOWN_ERROR));
-  EXPECT_TRUE(ta.trace().has(
-      "create_rsa_sign: soter resources is not ready, error 0xffff0008"))
+  const bytes blob = ta.import(soter_key(by_attk), key_1024().import_data());
+  EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, soter_use(PKCS1)), KM_ERROR_UNKNOWN_ERROR));
+  EXPECT_TRUE(ta.trace().has("create_rsa_sign: soter resources is not ready, error 0xffff0008"))
       << ta.trace().errors();
   const reply answer = ta.send(key_request(command::EXPORT_KEY, blob));
   EXPECT_TRUE(succeeded(answer));
@@ -435,5 +333,5 @@ TEST(SoterUnprovisioned, HasNoDocuments) {
   EXPECT_TRUE(ta.trace().has("soter_enhance_export_key: soter is not ready"));
 }
 
-} // namespace
-} // namespace keymaster::test
+}  // namespace
+}  // namespace keymaster::test
