@@ -98,8 +98,8 @@ write_certificate() {
 
 # A C array named $1 of $2 bytes from the hex in $3.
 array() {
-  printf 'const uint8_t %s[%d] = {\n' "$1" "$2"
-  printf '%s' "$3" | sed 's/../0x&, /g' | fold -s -w 96 | sed 's/^/    /; s/ *$//'
+  printf 'constexpr uint8_t %s[] = {\n' "$1"
+  printf '%s' "$2" | sed 's/../0x&, /g' | fold -s -w 96 | sed 's/^/    /; s/ *$//'
   printf '\n};\n'
 }
 
@@ -124,23 +124,25 @@ cd "$OLDPWD"
 #include "keymaster/attest/product.h"
 
 namespace keymaster {
+namespace {
 
 // clang-format off
 END
   cd "$work"
-  array ATTESTATION_MODULUS 257 "$(number 2 514)"
+  array MODULUS "$(number 2 514)"
   printf '\n'
-  array ATTESTATION_PUBLIC_EXPONENT 3 010001
+  array PUBLIC_EXPONENT 010001
   printf '\n'
-  array ATTESTATION_PRIVATE_EXPONENT 256 "$(number 4 512)"
+  array PRIVATE_EXPONENT "$(number 4 512)"
   printf '\n'
-  array ATTESTATION_CERTIFICATE "$certificate_size" \
-    "$(od -An -v -tx1 certificate.der | tr -d ' \n')"
+  array CERTIFICATE "$(od -An -v -tx1 certificate.der | tr -d ' \n')"
   cd "$OLDPWD"
   cat <<'END'
 // clang-format on
 
-static_assert(sizeof(ATTESTATION_CERTIFICATE) == 783);
+}  // namespace
+
+PROVISION_ATTESTATION_KEY(MODULUS, PUBLIC_EXPONENT, PRIVATE_EXPONENT, CERTIFICATE);
 
 }  // namespace keymaster
 END

@@ -156,7 +156,7 @@ keymaster_error_t sign_certificate(const keymaster_key_param_set_t& attest_param
 TEE_Result write_chain(byte_view certificate, byte_span output, size_t* produced, uint32_t* count,
                        trace_site at) {
   output_cursor out(output);
-  for (const byte_view link : {certificate, byte_view(ATTESTATION_CERTIFICATE)}) {
+  for (const byte_view link : {certificate, byte_view(ATTESTATION_KEY.certificate)}) {
     if (!out.write_field(link)) {
       trace(TEE_TRACE_ERROR, at, "Too short buffer");
       return TEE_ERROR_GENERIC;

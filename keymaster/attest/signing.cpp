@@ -91,9 +91,9 @@ int32_t sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
 
 TEE_Result get_attest_key(uint32_t, tee_object* key, keymaster_error_t* km_error) {
   const TEE_Attribute attributes[] = {
-      ref_attribute(TEE_ATTR_RSA_MODULUS, ATTESTATION_MODULUS),
-      ref_attribute(TEE_ATTR_RSA_PUBLIC_EXPONENT, ATTESTATION_PUBLIC_EXPONENT),
-      ref_attribute(TEE_ATTR_RSA_PRIVATE_EXPONENT, ATTESTATION_PRIVATE_EXPONENT),
+      ref_attribute(TEE_ATTR_RSA_MODULUS, ATTESTATION_KEY.modulus),
+      ref_attribute(TEE_ATTR_RSA_PUBLIC_EXPONENT, ATTESTATION_KEY.public_exponent),
+      ref_attribute(TEE_ATTR_RSA_PRIVATE_EXPONENT, ATTESTATION_KEY.private_exponent),
   };
   tee_object loaded;
   TEE_Result res = loaded.allocate(TEE_TYPE_RSA_KEYPAIR, ATTEST_KEY_BITS);
