@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <openssl/evp.h>
 
+#include "support/blob_forge.h"
 #include "ta/soter_device.h"
 
 namespace keymaster::test {
@@ -197,7 +198,8 @@ TEST_F(SoterDocument, FaultsOfSigning) {
   const bytes blob = ta.import(soter_key(), key_1024().import_data());
   signed_by(blob, PKCS1, "x");  // makes the counter
   uint64_t last = 1;
-  int without_version = 0;
+  int without_tee_version = 0;
+  int without_sensor_version = 0;
   bool fired = true;
   for (uint64_t n = 1; fired; n++) {
     const uint32_t handle = ta.begun(KM_PURPOSE_SIGN, blob, soter_use(PKCS1));
@@ -213,14 +215,17 @@ TEST_F(SoterDocument, FaultsOfSigning) {
       continue;
     }
     const std::string text(parsed(answer).text());
-    without_version += fired ? 1 : 0;
-    EXPECT_EQ(fired, text.find("tee_v") == text.npos || text.find("fp_v") == text.npos) << text;
+    const bool no_tee_version = text.find("tee_v") == text.npos;
+    const bool no_sensor_version = text.find("fp_v") == text.npos;
+    EXPECT_EQ(no_tee_version + no_sensor_version, fired ? 1 : 0) << text;
+    without_tee_version += no_tee_version ? 1 : 0;
+    without_sensor_version += no_sensor_version ? 1 : 0;
     const uint64_t counter = std::stoull(text.substr(text.find("counter") + 9));
     EXPECT_GT(counter, last);
     last = counter;
   }
-  EXPECT_GE(without_version, 2);
-  EXPECT_LT(without_version, 10);
+  EXPECT_GT(without_tee_version, 0);
+  EXPECT_GT(without_sensor_version, 0);
 }
 
 class SoterExport : public SoterDocument {
@@ -241,6 +246,7 @@ class SoterExport : public SoterDocument {
 
 TEST_F(SoterExport, IsSignedByWhomTheKeySays) {
   const bytes no_rsa = ta.generate(hmac_key(256));
+  const bytes rsa_record = client::field_writer().u32(2048).raw(attk().import_data()).take();
   const std::string public_key =
       public_key_member(ta.send(key_request(command::EXPORT_KEY, plain_key)).output());
   const struct {
@@ -271,6 +277,9 @@ TEST_F(SoterExport, IsSignedByWhomTheKeySays) {
       {"no blob at all", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, bytes(200, 1)), nullptr, "",
        "Sign key is null"},
       {"no RSA key", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, no_rsa), nullptr, "", "Sign key is null"},
+      {"not by its algorithm",
+       blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, seal(blob_plaintext(rsa_record, hmac_key()))), nullptr,
+       "", "Sign key is null"},
   };
   for (const auto& row : rows) {
     SCOPED_TRACE(row.name);
