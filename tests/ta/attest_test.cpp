@@ -175,6 +175,13 @@ TEST(Attestation, Capacities) {
     EXPECT_EQ(answer.b, row.b) << row.capacity;
     EXPECT_EQ(answer.output_size, answer.ok() ? whole.output_size : 0u);
   }
+  // Where not even a length fits, nothing is signed.
+  const auto calls = [&](size_t capacity) {
+    const uint64_t before = tee::host::fallible_calls();
+    ta.send(attest_request(blob, {}, capacity));
+    return tee::host::fallible_calls() - before;
+  };
+  EXPECT_LT(calls(3), calls(4));
 }
 
 TEST(Attestation, Refusals) {

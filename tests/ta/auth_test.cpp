@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 #include <set>
 
+#include "support/sets.h"
 #include "support/ta_under_test.h"
 
 namespace keymaster::test {
@@ -13,14 +14,9 @@ constexpr uint32_t ENCRYPT = KM_PURPOSE_ENCRYPT;
 constexpr uint64_t USER = 42;
 constexpr uint64_t NOW = START_REE_MS;
 
-param_set one(keymaster_tag_t tag, uint64_t number) {
-  return param_set().add(tag, number);
-}
-
 // The key and the request that every case changes: an HMAC key that allows all it is asked for.
-param_set hmac_key(const param_set& more = {}) {
-  return param_set()
-      .add(KM_TAG_ALGORITHM, KM_ALGORITHM_HMAC)
+param_set verify_key(const param_set& more = {}) {
+  return one(KM_TAG_ALGORITHM, KM_ALGORITHM_HMAC)
       .add(KM_TAG_KEY_SIZE, 256)
       .add(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256)
       .add(KM_TAG_MIN_MAC_LENGTH, 128)
@@ -29,7 +25,7 @@ param_set hmac_key(const param_set& more = {}) {
 }
 
 param_set sign_key(const param_set& more = {}) {
-  return hmac_key(one(KM_TAG_PURPOSE, SIGN).append(more));
+  return verify_key(one(KM_TAG_PURPOSE, SIGN).append(more));
 }
 
 param_set signer(keymaster_tag_t tag, uint64_t number) {
@@ -94,68 +90,68 @@ class auth : public testing::Test {
 };
 
 struct begin_case {
-  const char* name;
-  int32_t error;  // 0: granted
-  std::string reason;
+  int32_t error;       // 0: granted
+  std::string reason;  // of authorize_begin, unless it names another function
   param_set key;
   param_set request = sign_request();
   uint32_t purpose = SIGN;
 };
 
+constexpr char BAD_NONCE[] = "Caller nonce prohibited";
+constexpr uint32_t VERIFY = KM_PURPOSE_VERIFY;
+constexpr keymaster_tag_t ACTIVE = KM_TAG_ACTIVE_DATETIME;
+constexpr keymaster_tag_t ORIGINATION = KM_TAG_ORIGINATION_EXPIRE_DATETIME;
+constexpr keymaster_tag_t USAGE = KM_TAG_USAGE_EXPIRE_DATETIME;
+const param_set SHA_256 = one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256);
+
 const begin_case BEGINS[] = {
-    {"purpose", -3, "authorize_begin: No such purpose in key_params", hmac_key()},
-    {"digest", -13, "authorize_begin: No such digest in key_params", sign_key(),
-     one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_512).add(KM_TAG_MAC_LENGTH, 128)},
-    {"no digest", 0, "", sign_key(), one(KM_TAG_MAC_LENGTH, 128)},
-    {"padding", -11, "authorize_begin: No such padding in key_params", aes_key(KM_MODE_CBC),
+    {-3, "No such purpose in key_params", verify_key()},
+    {-13, "No such digest in key_params", sign_key(), mac_use(128, KM_DIGEST_SHA_2_512)},
+    {0, "", sign_key(), one(KM_TAG_MAC_LENGTH, 128)},
+    {-11, "No such padding in key_params", aes_key(KM_MODE_CBC),
      aes_request(KM_MODE_CBC, one(KM_TAG_PADDING, KM_PAD_PKCS7)), ENCRYPT},
-    {"block mode", -8, "authorize_begin: No such block mode in key_params", aes_key(KM_MODE_ECB),
-     aes_request(KM_MODE_CBC), ENCRYPT},
-    {"nonce", -55, "authorize_begin: Caller nonce prohibited", aes_key(KM_MODE_CBC), OWN_NONCE,
+    {-8, "No such block mode in key_params", aes_key(KM_MODE_ECB), aes_request(KM_MODE_CBC),
      ENCRYPT},
-    {"nonce allowed", 0, "", aes_key(KM_MODE_CBC, one(KM_TAG_CALLER_NONCE, 1)), OWN_NONCE, ENCRYPT},
-    {"no methods", -2, "begin: Algorithm HMAC purpose 0 not implemented",
-     signer(KM_TAG_PURPOSE, ENCRYPT), sign_request(), ENCRYPT},
-    {"no such purpose", -2, "begin: Algorithm HMAC purpose 4 not implemented",
-     signer(KM_TAG_PURPOSE, 4), sign_request(), 4},
-    {"MAC length", -57, "authorize_begin: MAC length 120 below the key's minimum 128", sign_key(),
-     one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256).add(KM_TAG_MAC_LENGTH, 120)},
-    {"tag length", -57, "authorize_begin: MAC length 96 below the key's minimum 128",
+    {-55, BAD_NONCE, aes_key(KM_MODE_CBC), OWN_NONCE, ENCRYPT},
+    {0, "", aes_key(KM_MODE_CBC, one(KM_TAG_CALLER_NONCE, 1)), OWN_NONCE, ENCRYPT},
+    {-2, "begin: Algorithm HMAC purpose 0 not implemented", signer(KM_TAG_PURPOSE, ENCRYPT),
+     sign_request(), ENCRYPT},
+    {-2, "begin: Algorithm HMAC purpose 4 not implemented", signer(KM_TAG_PURPOSE, 4),
+     sign_request(), 4},
+    {-57, "MAC length 120 below the key's minimum 128", sign_key(), mac_use(120)},
+    {-57, "MAC length 96 below the key's minimum 128",
      aes_key(KM_MODE_GCM, one(KM_TAG_MIN_MAC_LENGTH, 128)),
      aes_request(KM_MODE_GCM, one(KM_TAG_MAC_LENGTH, 96)), ENCRYPT},
-    {"active now", 0, "", signer(KM_TAG_ACTIVE_DATETIME, NOW)},
-    {"no MAC length", -38,
-     "create_hmac_sign: No or too many KM_TAG_MAC_LENGTH | begin: Create operation failed",
-     sign_key(), one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256)},
-    {"not active", -24, NOT_YET, signer(KM_TAG_ACTIVE_DATETIME, NOW + 1)},
-    {"origination until now", 0, "", signer(KM_TAG_ORIGINATION_EXPIRE_DATETIME, NOW)},
-    {"origination over", -25, EXPIRED, signer(KM_TAG_ORIGINATION_EXPIRE_DATETIME, NOW - 1)},
-    {"no origination", 0, "", signer(KM_TAG_ORIGINATION_EXPIRE_DATETIME, 1), sign_request(),
-     KM_PURPOSE_VERIFY},
-    {"usage until now", 0, "", signer(KM_TAG_USAGE_EXPIRE_DATETIME, NOW), sign_request(),
-     KM_PURPOSE_VERIFY},
-    {"usage over", -25, EXPIRED, signer(KM_TAG_USAGE_EXPIRE_DATETIME, NOW - 1), sign_request(),
-     KM_PURPOSE_VERIFY},
-    {"no usage", 0, "", signer(KM_TAG_USAGE_EXPIRE_DATETIME, 1)},
-    {"bootloader", -33, "authorize_begin: Bootloader only key",
-     sign_key(one(KM_TAG_BOOTLOADER_ONLY, 1).add(KM_TAG_ACTIVE_DATETIME, NOW + 1))},
-    {"the first decides", -24, NOT_YET,
-     sign_key(one(KM_TAG_ACTIVE_DATETIME, NOW + 1).add(KM_TAG_BOOTLOADER_ONLY, 1))},
-    {"user and no user", -38,
-     "authorize_begin: Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED",
+    {-38, "create_hmac_sign: No or too many KM_TAG_MAC_LENGTH | begin: Create operation failed",
+     sign_key(), SHA_256},
+    {0, "", signer(ACTIVE, NOW)},
+    {-24, NOT_YET, signer(ACTIVE, NOW + 1)},
+    {0, "", signer(ORIGINATION, NOW)},
+    {-25, EXPIRED, signer(ORIGINATION, NOW - 1)},
+    {0, "", signer(ORIGINATION, 1), sign_request(), VERIFY},
+    {0, "", signer(USAGE, NOW), sign_request(), VERIFY},
+    {-25, EXPIRED, signer(USAGE, NOW - 1), sign_request(), VERIFY},
+    {0, "", signer(USAGE, 1)},
+    // Of several reasons the first of the key's parameters decides.
+    {-33, "Bootloader only key", signer(KM_TAG_BOOTLOADER_ONLY, 1).add(ACTIVE, NOW + 1)},
+    {-24, NOT_YET, signer(ACTIVE, NOW + 1).add(KM_TAG_BOOTLOADER_ONLY, 1)},
+    {-38, "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED",
      user_key(1).add(KM_TAG_NO_AUTH_REQUIRED, 1)},
-    {"no type", -38, "authorize_begin: Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE",
+    {-38, "Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE",
      signer(KM_TAG_USER_SECURE_ID, USER)},
-    {"timeout", -26, NOT_MET, user_key(1).add(KM_TAG_AUTH_TIMEOUT, UINT32_MAX)},
-    {"due, but refused later", -55, "authorize_begin: Caller nonce prohibited",
+    {-26, NOT_MET, user_key(1).add(KM_TAG_AUTH_TIMEOUT, UINT32_MAX)},
+    // Authentication is due, but a later check refuses.
+    {-55, BAD_NONCE,
      aes_key(KM_MODE_CBC, one(KM_TAG_USER_SECURE_ID, USER).add(KM_TAG_USER_AUTH_TYPE, 1)),
      OWN_NONCE, ENCRYPT},
 };
 
 TEST_F(auth, begin_is_granted_or_refused_for_what_the_key_says) {
   for (const begin_case& row : BEGINS) {
-    SCOPED_TRACE(row.name);
-    expect_begin(row.purpose, ta.generate(row.key), row.request, row.error, row.reason);
+    const bool is_whole = row.reason.empty() || row.reason.find(": ") != std::string::npos;
+    SCOPED_TRACE("row " + std::to_string(&row - BEGINS));
+    expect_begin(row.purpose, ta.generate(row.key), row.request, row.error,
+                 (is_whole ? "" : "authorize_begin: ") + row.reason);
   }
 }
 

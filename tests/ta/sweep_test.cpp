@@ -217,6 +217,11 @@ void for_each_fault(const std::function<void(uint64_t n)>& turn) {
   }
 }
 
+// Of the middle of long inputs, which is a blob or a number, one byte in seven is enough.
+bool is_swept(size_t at, size_t size) {
+  return at < 8 || size - at < 150 || at % 7 == 0;
+}
+
 TEST_F(Sweep, EveryFailedPlatformCallIsReported) {
   for (const good_request& row : good) {
     for_each_fault([&](uint64_t n) {
@@ -235,6 +240,7 @@ TEST_F(Sweep, EveryPrefixIsRefused) {
     const request sample = row.make();
     EXPECT_TRUE(succeeded(send(sample))) << row.name;
     for (size_t size = 0; size < sample.input.size(); size++) {
+      if (!is_swept(size, sample.input.size())) continue;
       request what = row.make();
       what.input.resize(size);
       EXPECT_EQ(send(what).ok(), size >= row.enough) << row.name << ", " << size << " bytes";
@@ -246,7 +252,10 @@ TEST_F(Sweep, ChangedInputsLeaveNothingBehind) {
   for (const good_request& row : good) {
     const request sample = row.make();
     EXPECT_TRUE(succeeded(send(sample))) << row.name;
+    // A changed size may be that of a key which takes minutes to make.
+    if (row.name == "generate_key, algorithm " + std::to_string(KM_ALGORITHM_RSA)) continue;
     for (size_t i = 0; i < sample.input.size(); i++) {
+      if (!is_swept(i, sample.input.size())) continue;
       request what = row.make();
       what.input[i] = static_cast<uint8_t>(what.input[i] ^ 1 << i % 8);
       send(what);

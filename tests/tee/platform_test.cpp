@@ -1,4 +1,4 @@
-// Properties, trace and extensions.
+// Properties and trace.
 #include <string>
 
 #include "support.h"
@@ -85,19 +85,6 @@ TEST_F(platform, trace_lines_are_filtered) {
   host::set_trace_level(TEE_TRACE_ERROR);
   host::set_trace_sink(nullptr, nullptr);
   EXPECT_EQ(seen, "1line\n2line\n");
-}
-
-TEST_F(platform, boot_seed_and_replay_protected_storage) {
-  bytes seeds[2] = {bytes(32), bytes(32)};
-  for (bytes& seed : seeds)
-    EXPECT_EQ(GetBootSeed(seed.data(), seed.size()), TEE_SUCCESS);
-  EXPECT_EQ(seeds[0], seeds[1]);
-  EXPECT_NE(seeds[0], bytes(32));
-  bytes longer(33);
-  EXPECT_EQ(GetBootSeed(longer.data(), longer.size()), TEE_ERROR_BAD_PARAMETERS);
-  uint32_t state = 0;
-  for (int start = 0; start < 2; ++start)
-    EXPECT_EQ(TEE_RPMB_MakeFileSystem(&state), TEE_SUCCESS);
 }
 
 TEST_F(platform_death, programming_errors_panic) {
