@@ -245,6 +245,8 @@ class SoterExport : public SoterDocument {
 };
 
 TEST_F(SoterExport, IsSignedByWhomTheKeySays) {
+  const pkey large = pkey::rsa(3072);
+  const bytes large_signer = ta.import(soter_key(), large.import_data());
   const bytes no_rsa = ta.generate(hmac_key(256));
   const bytes rsa_record = client::field_writer().u32(2048).raw(attk().import_data()).take();
   const std::string public_key =
@@ -259,6 +261,7 @@ TEST_F(SoterExport, IsSignedByWhomTheKeySays) {
       {"attk", by_attk, &attk()},
       {"blob", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, signer), &attk()},
       {"name", blob_tag(KM_TAG_SOTER_SIGN_KEY_NAME, small_signer), &key_1024()},
+      {"large", blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, large_signer), &large},
       {"blob before name",
        blob_tag(KM_TAG_SOTER_SIGN_KEY_BLOB, small_signer)
            .append(blob_tag(KM_TAG_SOTER_SIGN_KEY_NAME, signer)),
