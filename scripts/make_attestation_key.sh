@@ -96,7 +96,7 @@ write_certificate() {
   } > certificate.der
 }
 
-# A C array named $1 of $2 bytes from the hex in $3.
+# A C++ array named $1 from the hex in $2.
 array() {
   printf 'constexpr uint8_t %s[] = {\n' "$1"
   printf '%s' "$2" | sed 's/../0x&, /g' | fold -s -w 96 | sed 's/^/    /; s/ *$//'
