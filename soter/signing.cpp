@@ -76,8 +76,9 @@ TEE_Result do_sign_with_rsa(TEE_ObjectHandle key, uint32_t key_bits, byte_view d
   }
   if (TEE_Result res = rsa.set_key(key)) return res;
   heap_buffer made;
-  if (!made.allocate(std::max(USUAL_SIGNATURE, size_t{key_bits} / 8)))
+  if (!made.allocate(std::max(USUAL_SIGNATURE, size_t{key_bits} / 8))) {
     return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
+  }
   if (TEE_Result res = sign_digest(rsa, {}, digest, &made, trace_site::here())) return res;
   *signature = std::move(made);
   return TEE_SUCCESS;
