@@ -23,7 +23,6 @@ bool key_list::add(uint16_t key, heap_buffer&& value) {
   added->key = key;
   added->value = std::move(value);
   added->next = head_;
-  added->previous = nullptr;
   if (head_ != nullptr) head_->previous = added;
   head_ = added;
   return true;

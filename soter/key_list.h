@@ -12,10 +12,10 @@ namespace keymaster {
 class key_list {
  public:
   struct item {
-    uint16_t key;
+    uint16_t key = 0;
     heap_buffer value;
-    item* next;
-    item* previous;
+    item* next = nullptr;
+    item* previous = nullptr;
   };
 
   key_list() = default;
