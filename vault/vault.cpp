@@ -3,6 +3,7 @@
 
 #include "base/bytes.h"
 #include "base/results.h"
+#include "base/tee_handles.h"
 #include "product/uuids.h"
 
 namespace keymaster {
@@ -34,14 +35,12 @@ constexpr vault_command RETRIEVE_PROPERTY = {12, REQUEST_AND_BYTES, "TA property
 // on entry, what the vault wrote on success.
 TEE_Result call_vault(const vault_command& command, TEE_Param* params, size_t* length,
                       trace_site at) {
-  TEE_TASessionHandle session{};
-  if (TEE_Result res =
-          TEE_OpenTASession(&VAULT, TEE_TIMEOUT_INFINITE, 0, nullptr, &session, nullptr)) {
+  tee_session session;
+  if (TEE_Result res = session.open(VAULT, TEE_TIMEOUT_INFINITE)) {
     trace(TEE_TRACE_ERROR, at, "Open vault session fails, 0x%x\n", res);
     return res;
   }
-  TEE_Result res = TEE_InvokeTACommand(session, TEE_TIMEOUT_INFINITE, command.id, command.types,
-                                       params, nullptr);
+  TEE_Result res = session.invoke(command.id, command.types, params);
   const size_t reported =
       command.types == BYTES_AND_LENGTH ? params[1].value.a : params[1].memref.size;
   if (res == TEE_SUCCESS && reported > *length) res = TEE_ERROR_GENERIC;
@@ -51,7 +50,6 @@ TEE_Result call_vault(const vault_command& command, TEE_Param* params, size_t* l
   } else {
     trace(command.failure_level, at, "Retrieve %s fails, 0x%x\n", command.what, res);
   }
-  TEE_CloseTASession(session);
   return res;
 }
 

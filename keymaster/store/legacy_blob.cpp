@@ -1,5 +1,6 @@
 // Blobs of the earlier Keymaster TA, which that TA alone can open.
 #include "base/results.h"
+#include "base/tee_handles.h"
 #include "keymaster/store/blob_plaintext.h"
 #include "keymaster/store/key_blob.h"
 #include "product/uuids.h"
@@ -16,18 +17,15 @@ constexpr uint32_t OPEN_BLOB_TYPES = TEE_PARAM_TYPES(
 
 // Has the earlier TA replace the blob in *copy by its plaintext, and *copy cut to that.
 TEE_Result ask_earlier_keymaster(heap_buffer* copy, trace_site at) {
-  TEE_TASessionHandle session{};
-  if (TEE_Result res = TEE_OpenTASession(&EARLIER_KEYMASTER, 0, 0, nullptr, &session, nullptr)) {
+  tee_session session;
+  if (TEE_Result res = session.open(EARLIER_KEYMASTER, 0)) {
     trace(TEE_TRACE_ERROR, at, "OpenTASession failed with 0x%08x\n", res);
     return res;
   }
   TEE_Param params[4] = {};
   params[0].memref.buffer = copy->data();
   params[0].memref.size = static_cast<tee_size>(copy->size());
-  const TEE_Result res = TEE_InvokeTACommand(session, TEE_TIMEOUT_INFINITE, COMMAND_OPEN_BLOB,
-                                             OPEN_BLOB_TYPES, params, nullptr);
-  TEE_CloseTASession(session);
-  if (res != TEE_SUCCESS) {
+  if (TEE_Result res = session.invoke(COMMAND_OPEN_BLOB, OPEN_BLOB_TYPES, params)) {
     trace(TEE_TRACE_ERROR, at, "InvokeTACommand failed with 0x%08x\n", res);
     return res;
   }
