@@ -1,7 +1,6 @@
 // attest_key: a certificate chain for a key.
 #include "keymaster/alg/algorithm.h"
 #include "keymaster/attest/certificate.h"
-#include "keymaster/params/marshal.h"
 #include "ta/command.h"
 #include "ta/opened_key.h"
 
@@ -27,16 +26,9 @@ keymaster_error_t open_attested(byte_view blob, opened_key* key, trace_site at) 
 
 TEE_Result attest_key(command_io* io, keymaster_error_t* km_error) {
   const trace_site at = trace_site::here();
-  input_cursor in(io->input);
   byte_view blob;
-  byte_view marshalled;
-  if (!in.read_field(&blob) || !in.read_field(&marshalled)) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
-  }
   keymaster_key_param_set_t params;
-  if (unmarshal(marshalled, &params) != TEE_SUCCESS) {
-    return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "Unmarshal failed");
-  }
+  if (TEE_Result res = read_use(io->input, &blob, &params)) return res;
   opened_key key;
   *km_error = open_attested(blob, &key, at);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;

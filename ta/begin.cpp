@@ -3,7 +3,6 @@
 #include "keymaster/auth/authorization.h"
 #include "keymaster/auth/operation_pool.h"
 #include "keymaster/params/dump.h"
-#include "keymaster/params/marshal.h"
 #include "ta/command.h"
 #include "ta/opened_key.h"
 #include "ta/operation_end.h"
@@ -90,16 +89,9 @@ TEE_Result enter(operation_t* operation, const keymaster_key_param_set_t& out_pa
 
 TEE_Result begin(command_io* io, keymaster_error_t* km_error) {
   const trace_site at = trace_site::here();
-  input_cursor in(io->input);
   byte_view blob;
-  byte_view marshalled;
-  if (!in.read_field(&blob) || !in.read_field(&marshalled)) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
-  }
   keymaster_key_param_set_t params;
-  if (unmarshal(marshalled, &params) != TEE_SUCCESS) {
-    return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "Unmarshal failed");
-  }
+  if (TEE_Result res = read_use(io->input, &blob, &params)) return res;
   KEYMASTER_DUMP_KEY_PARAM_SET(params);
   opened_key key;
   *km_error = open_checked_key(blob, &key, at);

@@ -1,7 +1,6 @@
 // generate_key and import_key.
 #include "keymaster/alg/algorithm.h"
 #include "keymaster/params/dump.h"
-#include "keymaster/params/marshal.h"
 #include "keymaster/store/key_blob.h"
 #include "ta/command.h"
 #include "ta/opened_key.h"
@@ -82,9 +81,7 @@ TEE_Result write_imported(byte_view material, const keymaster_key_param_set_t& c
 
 TEE_Result generate_key(command_io* io, keymaster_error_t* km_error) {
   keymaster_key_param_set_t description;
-  if (unmarshal(io->input, &description) != TEE_SUCCESS) {
-    return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "Unmarshal failed");
-  }
+  if (TEE_Result res = read_params(io->input, &description)) return res;
   KEYMASTER_DUMP_KEY_PARAM_SET(description);
   const auto* tag = get_unique(description, KM_TAG_ALGORITHM);
   if (tag == nullptr) {
@@ -113,9 +110,7 @@ TEE_Result import_key(command_io* io, keymaster_error_t* km_error) {
   byte_view marshalled;
   if (!in.read_field(&marshalled)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
   keymaster_key_param_set_t description;
-  if (unmarshal(marshalled, &description) != TEE_SUCCESS) {
-    return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "Unmarshal failed");
-  }
+  if (TEE_Result res = read_params(marshalled, &description)) return res;
   KEYMASTER_DUMP_KEY_PARAM_SET(description);
   const algorithm_t* algorithm = nullptr;
   *km_error = choose_import(description, &algorithm, at);

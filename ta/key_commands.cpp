@@ -101,9 +101,7 @@ TEE_Result delete_all_key(command_io*, keymaster_error_t*) {
 
 TEE_Result configure(command_io* io, keymaster_error_t*) {
   keymaster_key_param_set_t set;
-  if (unmarshal(io->input, &set) != TEE_SUCCESS) {
-    return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "Unmarshal failed");
-  }
+  if (TEE_Result res = read_params(io->input, &set)) return res;
   configured_set(set);
   return TEE_SUCCESS;
 }

@@ -1,4 +1,4 @@
-// What the commands share that take a key blob.
+// What the commands share.
 #include "ta/opened_key.h"
 
 #include "keymaster/auth/authorization.h"
@@ -7,6 +7,23 @@
 #include "ta/configured.h"
 
 namespace keymaster {
+
+TEE_Result read_params(byte_view marshalled, keymaster_key_param_set_t* params, trace_site at) {
+  if (unmarshal(marshalled, params) == TEE_SUCCESS) return TEE_SUCCESS;
+  trace(TEE_TRACE_ERROR, at, "Unmarshal failed");
+  return TEE_ERROR_BAD_PARAMETERS;
+}
+
+TEE_Result read_use(byte_view input, byte_view* blob, keymaster_key_param_set_t* params,
+                    trace_site at) {
+  input_cursor in(input);
+  byte_view marshalled;
+  if (!in.read_field(blob) || !in.read_field(&marshalled)) {
+    trace(TEE_TRACE_ERROR, at, "Too short input");
+    return TEE_ERROR_GENERIC;
+  }
+  return read_params(marshalled, params, at);
+}
 
 keymaster_error_t open_checked_key(byte_view blob, opened_key* key, trace_site at) {
   if (!key->blob.copy_of(blob)) {

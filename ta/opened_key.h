@@ -1,4 +1,4 @@
-// What the commands share that take a key blob, and that write parameter sets to the client.
+// What the commands share that take a key blob or a parameter set, or write a set to the client.
 #pragma once
 
 #include "base/heap.h"
@@ -13,6 +13,16 @@ struct opened_key {
   heap_buffer material;
   keymaster_key_param_set_t characteristics;
 };
+
+// read_params: the set that a command brings; TEE_ERROR_BAD_PARAMETERS when it cannot be read.
+[[nodiscard]] TEE_Result read_params(byte_view marshalled, keymaster_key_param_set_t* params,
+                                     trace_site at = trace_site::here());
+
+// read_use: an input of two fields, key blob and set. TEE_ERROR_GENERIC when it is too short, and
+// as read_params.
+[[nodiscard]] TEE_Result read_use(byte_view input, byte_view* blob,
+                                  keymaster_key_param_set_t* params,
+                                  trace_site at = trace_site::here());
 
 // open_checked_key: copies `blob` and opens it; refuses keys older or newer than the configured
 // system. Whatever open_key says, a blob that does not open is -62; -33 for a newer key; -41 out of

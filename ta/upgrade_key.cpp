@@ -1,6 +1,5 @@
 // upgrade_key: seals a key anew under the configured OS version and patch level.
 #include "keymaster/auth/authorization.h"
-#include "keymaster/params/marshal.h"
 #include "keymaster/store/key_blob.h"
 #include "ta/command.h"
 #include "ta/configured.h"
@@ -65,9 +64,7 @@ TEE_Result upgrade_key(command_io* io, keymaster_error_t* km_error) {
     return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
   }
   keymaster_key_param_set_t params;
-  if (unmarshal(marshalled, &params) != TEE_SUCCESS) {
-    return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "Unmarshal failed");
-  }
+  if (TEE_Result res = read_params(marshalled, &params)) return res;
   opened_key key;
   const TEE_Result res = open_any(blob, &key, km_error, at);
   if (failed(res, *km_error)) return res;
