@@ -45,8 +45,6 @@ TEEC_TempMemoryReference input_reference(byte_view input) {
   return {const_cast<uint8_t*>(input.data()), input.size()};
 }
 
-constexpr status MALFORMED = {TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API};
-
 // Reads an answer with `parse`; one that is not in its form leaves no outputs.
 template <typename Result, typename Parse>
 Result read_answer(const status& outcome, Parse parse) {

@@ -12,13 +12,11 @@ constexpr uint32_t GET_DEVICE_ID = 0xFF03;
 constexpr uint32_t REPORT_MATCH = 1;
 
 constexpr size_t FIRST_CAPACITY = 4096;
-constexpr size_t MAX_CAPACITY = 64 * 1024;
+constexpr size_t MAX_SOTER_CAPACITY = 64 * 1024;
 
 // What 0xFF02 answers when the SOTER data does not load. The number is a Keymaster error's, too,
 // but means none.
 constexpr keymaster_error_t DATA_UNAVAILABLE = -1;
-
-constexpr status MALFORMED = {TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API};
 
 }  // namespace
 
@@ -47,7 +45,7 @@ soter_result soter::fetch(uint32_t command) {
     if (result.tee == TEEC_SUCCESS) {
       result.error = static_cast<keymaster_error_t>(slots[0].value.a);
     }
-    if (result.error == KM_ERROR_INSUFFICIENT_BUFFER_SPACE && buffer.size() < MAX_CAPACITY) {
+    if (result.error == KM_ERROR_INSUFFICIENT_BUFFER_SPACE && buffer.size() < MAX_SOTER_CAPACITY) {
       continue;
     }
     if (!result.ok()) return result;

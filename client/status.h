@@ -30,6 +30,9 @@ struct status {
   std::string_view advice() const;
 };
 
+// An answer that is not in its form.
+inline constexpr status MALFORMED = {TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API};
+
 // A TEE that cannot be reached: no context or no session.
 class open_error : public std::runtime_error {
  public:

@@ -16,7 +16,7 @@ namespace tee {
 
 namespace {
 
-constexpr size_t FILE_LIMIT = 4096;
+constexpr size_t BOOT_FILE_LIMIT = 4096;
 constexpr std::string_view SEED_KEY = "\"boot_seed\"";
 constexpr size_t SEED_DIGITS = 2 * device::BOOT_SEED_LENGTH;
 constexpr char BLANK = '0';
@@ -90,7 +90,7 @@ boot_record start_boot(const std::string& folder) {
 
 boot_record current_boot(const std::string& folder) {
   const std::string path = boot_path(folder);
-  auto text = read_file(path, FILE_LIMIT);
+  auto text = read_file(path, BOOT_FILE_LIMIT);
   if (!text) throw device_error(device_error::kind::DAMAGED, path + " is missing");
   auto seed = take_seed(&*text);
   if (!seed) throw device_error(device_error::kind::DAMAGED, path + " holds no boot seed");

@@ -15,7 +15,7 @@ namespace {
 
 constexpr char MAGIC[] = {'K', 'M', 'R', 'T'};
 constexpr uint32_t VERSION = 1;
-constexpr size_t FILE_LIMIT = 16 * 1024 * 1024;
+constexpr size_t TABLE_FILE_LIMIT = 16 * 1024 * 1024;
 
 using entry = std::pair<object_name, uint64_t>;
 
@@ -131,7 +131,7 @@ void replay_table::store(content next) {
   if (next.pending) append_entry(&bytes, next.pending->first, next.pending->second);
   mac_bytes mac = compute_mac(key_, bytes);
   bytes.insert(bytes.end(), mac.begin(), mac.end());
-  if (bytes.size() > FILE_LIMIT) {
+  if (bytes.size() > TABLE_FILE_LIMIT) {
     errno = ENOSPC;
     throw file_error("write", path_);
   }
@@ -141,7 +141,7 @@ void replay_table::store(content next) {
 }
 
 void replay_table::read() {
-  auto file = read_file(path_, FILE_LIMIT);
+  auto file = read_file(path_, TABLE_FILE_LIMIT);
   if (!file) return;
   std::span<const uint8_t> bytes = *file;
   if (bytes.size() < sizeof(mac_bytes)) throw_damaged(path_);

@@ -47,18 +47,18 @@ constexpr implementation_property IMPLEMENTATION[] = {
 
 std::optional<property_value> find_property(const char* call, TEE_PropSetHandle set,
                                             const char* name) {
-  instance& running = current_instance(call);
+  instance& caller = current_instance(call);
   if (!name) panic(call, "name is null");
   if (set == TEE_PROPSET_TEE_IMPLEMENTATION) {
     for (const auto& property : IMPLEMENTATION) {
-      if (property.name == name) return property.value(running.dev());
+      if (property.name == name) return property.value(caller.dev());
     }
   } else if (set == TEE_PROPSET_CURRENT_CLIENT) {
-    bool known = running.client() && std::string_view(name) == "gpd.client.identity";
-    if (known) return *running.client();
+    bool known = caller.client() && std::string_view(name) == "gpd.client.identity";
+    if (known) return *caller.client();
   } else if (set == TEE_PROPSET_CURRENT_TA) {
-    auto found = running.properties().find(std::string_view(name));
-    if (found != running.properties().end()) return found->second;
+    auto found = caller.properties().find(std::string_view(name));
+    if (found != caller.properties().end()) return found->second;
   } else {
     panic(call, "%p is not a property set", static_cast<void*>(set));
   }

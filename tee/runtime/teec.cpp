@@ -52,11 +52,11 @@ TEEC_Result call_in(const void* context, TEEC_Operation* operation, uint32_t* re
                     Call call) {
   uint32_t origin = TEEC_ORIGIN_API;
   TEEC_Result res = client_call([&]() -> TEEC_Result {
-    tee::teec_parameters parameters;
-    TEEC_Result taken = parameters.take(context, operation);
+    tee::teec_parameters given;
+    TEEC_Result taken = given.take(context, operation);
     if (taken != TEEC_SUCCESS) return taken;
-    TEEC_Result result = call(parameters, &origin);
-    if (origin == TEEC_ORIGIN_TRUSTED_APP && operation != nullptr) parameters.give_back(operation);
+    TEEC_Result result = call(given, &origin);
+    if (origin == TEEC_ORIGIN_TRUSTED_APP && operation != nullptr) given.give_back(operation);
     return result;
   });
   if (return_origin != nullptr) *return_origin = origin;
