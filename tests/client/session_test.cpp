@@ -3,7 +3,6 @@
 
 #include <gtest/gtest.h>
 
-#include "client/authenticator.h"
 #include "client/operation.h"
 #include "fake_teec.h"
 
@@ -15,8 +14,6 @@ using fake_teec::request;
 using fake_teec::requests;
 
 const bytes BLOB = {0xb1, 0x0b};
-const param_set VERSION = param_set().add(KM_TAG_OS_VERSION, 7);
-constexpr char VERSION_HEX[] = "01000000c10200300000000007000000000000000000000000000000";
 constexpr char EMPTY_SET[] = "00000000";
 constexpr char MALFORMED_SET[] = "01000000";
 
@@ -28,43 +25,6 @@ class Session : public testing::Test {
  protected:
   session keymaster{context("")};
 };
-
-TEST_F(Session, SendsEachCommandInItsLayout) {
-  const std::string version = VERSION_HEX;
-  const application app = {{'i', 'd'}, {'d', 'a', 't', 'a'}};
-  struct {
-    uint32_t command, types, a;
-    std::string input;
-    std::function<void()> send;
-  } cases[] = {
-      {13, 0x653, 0, version, [&] { keymaster.generate_key(VERSION); }},
-      {14, 0x53, 0, "02000000b10b0200000069640400000064617461",
-       [&] { keymaster.get_key_characteristics(BLOB, app); }},
-      {16, 0x653, 2, "02000000b10b1c000000" + version, [&] { keymaster.begin(2, BLOB, VERSION); }},
-      {17, 0x653, 0xDEADBEEF, "02000000b10b1c000000" + version,
-       [&] { keymaster.update(0xDEADBEEF, BLOB, VERSION); }},
-      {18, 0x653, 5, "000000000400000000000000", [&] { keymaster.finish(5); }},
-      {19, 0x653, 0, "1c000000" + version + "b10b", [&] { keymaster.import_key(VERSION, BLOB); }},
-      {20, 0x653, 0, "02000000b10b0000000000000000", [&] { keymaster.export_key(BLOB); }},
-      {21, 0x53, 0, "b10b", [&] { keymaster.delete_key(BLOB); }},
-      {22, 0x3, 0, "", [&] { keymaster.delete_all_keys(); }},
-      {23, 0x3, 9, "", [&] { keymaster.abort(9); }},
-      {24, 0x653, 0, "02000000b10b1c000000" + version,
-       [&] { keymaster.attest_key(BLOB, VERSION); }},
-      {25, 0x53, 0, version, [&] { keymaster.configure(VERSION); }},
-      {26, 0x653, 0, "1c000000" + version + "02000000b10b",
-       [&] { keymaster.upgrade_key(BLOB, VERSION); }},
-  };
-  for (const auto& c : cases) {
-    answer_with({.a = -33});
-    c.send();
-    ASSERT_EQ(requests.size(), 1u) << c.command;
-    EXPECT_EQ(requests[0].command, c.command);
-    EXPECT_EQ(requests[0].types, c.types) << c.command;
-    EXPECT_EQ(requests[0].a, c.a) << c.command;
-    EXPECT_EQ(to_hex(requests[0].input), c.input) << c.command;
-  }
-}
 
 TEST_F(Session, TellsTheKeymasterErrorFromAnUntouchedSlot) {
   struct {
@@ -169,17 +129,6 @@ TEST_F(Session, OperationFeedsAllAndAbortsWhatIsNotFinished) {
   answer_with({});  // consumes nothing, for ever
   operation stuck(&keymaster, {});
   EXPECT_EQ(stuck.update(BLOB, &output).tee, TEEC_ERROR_BAD_FORMAT);
-}
-
-TEST(Authenticator, SendsTheRequestAndWantsAWholeToken) {
-  authenticator issuer{context("")};
-  answer_with({});
-  data_result token = issuer.issue({.user_id = 2, .authenticator_id = 3, .challenge = 1});
-  EXPECT_TRUE(token.ok());
-  EXPECT_EQ(token.data.size(), AUTH_TOKEN_LENGTH);
-  EXPECT_EQ(requests[0].types, 0x65u);
-  EXPECT_EQ(to_hex(requests[0].input), "01000000000000000200000000000000030000000000000001000000");
-  EXPECT_EQ(requests[0].capacity, AUTH_TOKEN_LENGTH);
 }
 
 }  // namespace

@@ -3,7 +3,6 @@
 
 #include <gtest/gtest.h>
 
-#include "client/vault.h"
 #include "fake_teec.h"
 
 namespace keymaster::client {
@@ -22,20 +21,6 @@ class Soter : public testing::Test {
   session keymaster{context("")};
   soter commands{&keymaster};
 };
-
-TEST_F(Soter, TellsTheStatesOfTheAttk) {
-  for (const attk_state state :
-       {attk_state::READY, attk_state::NOT_PROVISIONED, attk_state::UNREADABLE}) {
-    answer_with({.a = static_cast<int32_t>(state)});
-    const attk_result checked = commands.check_attk();
-    EXPECT_TRUE(checked.ok());
-    EXPECT_EQ(checked.state, state);
-    EXPECT_EQ(requests[0].command, 0xFF01u);
-    EXPECT_EQ(requests[0].types, 0x3u);
-  }
-  answer_with({.a = -3});
-  EXPECT_EQ(commands.check_attk().tee, TEEC_ERROR_BAD_FORMAT);
-}
 
 TEST_F(Soter, ReadsOutputsAndRefusesMalformedOnes) {
   const struct {
@@ -80,26 +65,6 @@ TEST(SignedDocument, IsTakenApartOrRefused) {
                           "020000007b7daabb", "00000000aabb"}) {
     EXPECT_THROW(parse_signed_document(from_hex(bad)), format_error) << bad;
   }
-}
-
-TEST(Vault, SendsTheRecordOfBoxes) {
-  answer_with({});
-  factory_data data;
-  data.attk = read_rsa_numbers(
-      from_hex("01000000a101000000a201000000a30000000000000000000000000000000000000000"));
-  data.fingerprint_name = "fn";
-  data.fingerprint_version = "v";
-  data.cpu_id = "cpu";
-  data.device_id = "dev";
-  EXPECT_TRUE(vault(context("")).provision(data).ok());
-  EXPECT_EQ(requests[0].command, 100u);
-  // Key box, no TA data, property box, CPU id, device id.
-  EXPECT_EQ(to_hex(requests[0].input),
-            "0f00000011000100a112000100a213000100a3"
-            "00000000"
-            "1f00000035180200666e361801007637181000d5587ae3f4906c4ba2d164c8f1b09375"
-            "03000000637075"
-            "03000000646576");
 }
 
 }  // namespace

@@ -139,18 +139,6 @@ TEST(Blob, NoBitMayChange) {
   EXPECT_TRUE(succeeded(open(&ta, blob)));
 }
 
-TEST(KeyStorageKey, SurvivesRestartAndReboot) {
-  for (const bool rpmb : {false, true}) {
-    ta_under_test ta({.rpmb = rpmb});
-    const bytes blob = make(&ta);
-    EXPECT_EQ(blob[0], rpmb ? 1 : 0);
-    ta.restart();
-    expect_signs(&ta, blob);
-    ta.reboot();
-    expect_signs(&ta, blob);
-  }
-}
-
 // A device may gain replay-protected storage, and lose it: what the derived key sealed still opens.
 TEST(KeyStorageKey, BlobsOfTheDerivedOneOpenBesideTheOther) {
   ta_under_test ta({.rpmb = false, .configured = false});

@@ -484,14 +484,5 @@ TEST_F(Rsa, NumbersThatAreNoKeyAreRefusedWhenUsed) {
   }
 }
 
-TEST_F(Rsa, SoterKeysWaitForTheirResources) {
-  const bytes blob = ta.import(any_use().add_flag(KM_TAG_SOTER_KEY), key_512().import_data());
-  const param_set params = use(PKCS1_SHA1);
-  EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, params), -1000));
-  EXPECT_NE(ta.trace().errors().find("create_rsa_sign: soter resources is not ready, error 0x"),
-            std::string::npos);
-  EXPECT_TRUE(succeeded(ta.abort(ta.begun(KM_PURPOSE_VERIFY, blob, params))));
-}
-
 }  // namespace
 }  // namespace keymaster::test

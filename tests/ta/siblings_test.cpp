@@ -59,17 +59,6 @@ TEST_F(Siblings, SecretsAreKeptFromTheNormalWorld) {
   }
 }
 
-TEST_F(Siblings, CallsInAnotherFormAreRefused) {
-  for (const TEEC_UUID& application : {VAULT, FINGERPRINT, EARLIER}) {
-    EXPECT_EQ(call(application, 99, 0), TEEC_ERROR_NOT_SUPPORTED);
-  }
-  EXPECT_EQ(call(FINGERPRINT, 1, IN), TEEC_ERROR_BAD_PARAMETERS);
-  EXPECT_EQ(call(EARLIER, 100, IN), TEEC_ERROR_BAD_PARAMETERS);
-  EXPECT_EQ(call(EARLIER, 100, TEEC_PARAM_TYPES(IN, OUT, 0, 0), bytes(64 * 1024 + 1)),
-            TEEC_ERROR_BAD_PARAMETERS);
-  EXPECT_EQ(call(EARLIER, 100, TEEC_PARAM_TYPES(IN, OUT, 0, 0), bytes(8)), TEEC_ERROR_SHORT_BUFFER);
-}
-
 TEST_F(Siblings, ADeviceIsProvisionedOnceAndWhole) {
   bytes trailing = record({1, 1, 1, 1, 1});
   trailing.push_back(0);

@@ -17,32 +17,6 @@ TEE_ObjectHandle allocate(uint32_t type, uint32_t bits) {
   return object;
 }
 
-TEST_F(objects, types_and_sizes) {
-  const struct {
-    uint32_t type, bits;
-    TEE_Result result;
-  } rows[] = {
-      {TEE_TYPE_AES, 128, TEE_SUCCESS},
-      {TEE_TYPE_AES, 160, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_TYPE_HMAC_SHA256, 8, TEE_SUCCESS},
-      {TEE_TYPE_HMAC_SHA512, 1024, TEE_SUCCESS},
-      {TEE_TYPE_HMAC_SHA512, 1032, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_TYPE_HMAC_SHA1, 12, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_TYPE_RSA_KEYPAIR, 504, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_TYPE_RSA_KEYPAIR, 8200, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_TYPE_ECDSA_KEYPAIR, 520, TEE_ERROR_NOT_SUPPORTED},
-      {0xA1234567, 128, TEE_ERROR_NOT_SUPPORTED},
-  };
-  for (const auto& row : rows) {
-    auto object = reinterpret_cast<TEE_ObjectHandle>(uintptr_t{1});
-    EXPECT_EQ(TEE_AllocateTransientObject(row.type, row.bits, &object), row.result)
-        << std::hex << row.type << std::dec << " " << row.bits;
-    EXPECT_EQ(object != nullptr, row.result == TEE_SUCCESS);
-    TEE_FreeTransientObject(object);
-  }
-  EXPECT_EQ(ta_.counts(), host::live_counts{});
-}
-
 TEST_F(objects, a_secret_comes_back_as_it_went_in) {
   const bytes secret = hex("00000102030405060708090a0b0c0d0e");
   TEE_ObjectHandle object = allocate(TEE_TYPE_AES, 256);
@@ -92,24 +66,6 @@ TEST_F(objects, keys_are_found_again) {
     key_of(TEE_TYPE_AES, fill);
   }
   EXPECT_NE(key_of(TEE_TYPE_AES, 0), first);
-}
-
-// The table is bounded, and every slot can be used again.
-TEST_F(objects, handles_are_bounded_and_reused) {
-  std::vector<TEE_ObjectHandle> held;
-  for (int round = 0; round < 2; ++round) {
-    TEE_ObjectHandle object = nullptr;
-    while (TEE_AllocateTransientObject(TEE_TYPE_AES, 128, &object) == TEE_SUCCESS) {
-      EXPECT_LT(reinterpret_cast<uintptr_t>(object), uintptr_t{1} << 31);
-      held.push_back(object);
-    }
-    EXPECT_EQ(object, nullptr);
-    EXPECT_EQ(held.size(), handle_table<tee::object>::SLOTS);
-    for (TEE_ObjectHandle handle : held)
-      TEE_FreeTransientObject(handle);
-    held.clear();
-  }
-  EXPECT_EQ(ta_.counts(), host::live_counts{});
 }
 
 TEST_F(objects_death, programming_errors_panic) {

@@ -1,4 +1,4 @@
-// Operations: which ones there are, their keys and states.
+// Operations: what their keys and states forbid.
 #include <functional>
 
 #include "support.h"
@@ -6,36 +6,7 @@
 namespace tee::test {
 namespace {
 
-using operations = in_instance;
 using operations_death = in_instance;
-
-TEST_F(operations, algorithms_modes_and_sizes) {
-  const struct {
-    uint32_t algorithm, mode, bits;
-    TEE_Result result;
-  } rows[] = {
-      {TEE_ALG_SHA256, TEE_MODE_MAC, 0, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 0, TEE_SUCCESS},
-      {TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 1032, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 129, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_ALG_AES_GCM, TEE_MODE_SIGN, 128, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_ALG_AES_CTR, 33, 128, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_ALG_RSA_NOPAD, TEE_MODE_EXPORT, 0, TEE_SUCCESS},
-      {TEE_ALG_RSA_NOPAD, TEE_MODE_SIGN, 2048, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_ALG_RSAES_PKCS1_V1_5, TEE_MODE_EXPORT, 0, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_ALG_RSASSA_PKCS1_PSS_MGF1_SHA512, TEE_MODE_VERIFY, 8200, TEE_ERROR_NOT_SUPPORTED},
-      {TEE_ALG_ECDSA_P256, TEE_MODE_SIGN, 384, TEE_ERROR_NOT_SUPPORTED},
-      {0x10000311, TEE_MODE_ENCRYPT, 128, TEE_ERROR_NOT_SUPPORTED},
-  };
-  for (const auto& row : rows) {
-    auto made = reinterpret_cast<TEE_OperationHandle>(uintptr_t{1});
-    EXPECT_EQ(TEE_AllocateOperation(&made, row.algorithm, row.mode, row.bits), row.result)
-        << std::hex << row.algorithm << " " << row.mode;
-    EXPECT_EQ(made != nullptr, row.result == TEE_SUCCESS);
-    TEE_FreeOperation(made);
-  }
-  EXPECT_EQ(ta_.counts(), host::live_counts{});
-}
 
 TEST_F(operations_death, calls_that_do_not_fit_panic) {
   const bytes block(16);

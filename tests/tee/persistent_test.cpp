@@ -85,44 +85,6 @@ TEST_F(persistent, flags_of_two_handles_agree_or_conflict) {
   EXPECT_EQ(owner.objects().size(), 0u);
 }
 
-TEST_F(persistent, stream_position_gaps_and_limits) {
-  ASSERT_EQ(create_object(READ | WRITE | META, "0123456789", &object), TEE_SUCCESS);
-  struct {
-    intmax_t offset;
-    TEE_Whence whence;
-    TEE_Result result;
-    const char* rest;
-  } seeks[] = {
-      {4, TEE_DATA_SEEK_SET, TEE_SUCCESS, "456789"},
-      {-3, TEE_DATA_SEEK_END, TEE_SUCCESS, "789"},
-      {-2, TEE_DATA_SEEK_CUR, TEE_SUCCESS, "89"},
-      {-100, TEE_DATA_SEEK_CUR, TEE_SUCCESS, "0123456789"},
-      {INTMAX_MIN, TEE_DATA_SEEK_END, TEE_SUCCESS, "0123456789"},
-      {5, TEE_DATA_SEEK_END, TEE_SUCCESS, ""},
-      {0xFFFFFFFF, TEE_DATA_SEEK_SET, TEE_SUCCESS, ""},
-      {1, TEE_DATA_SEEK_CUR, TEE_ERROR_OVERFLOW, ""},
-      {INTMAX_MAX, TEE_DATA_SEEK_END, TEE_ERROR_OVERFLOW, ""},
-  };
-  for (const auto& seek : seeks) {
-    EXPECT_EQ(TEE_SeekObjectData(object, seek.offset, seek.whence), seek.result);
-    EXPECT_EQ(read_all(object), seek.rest);
-  }
-  EXPECT_EQ(TEE_WriteObjectData(object, "x", 1), TEE_ERROR_OVERFLOW);
-  TEE_SeekObjectData(object, -2, TEE_DATA_SEEK_CUR);
-  EXPECT_EQ(TEE_WriteObjectData(object, "x", 1), TEE_ERROR_STORAGE_NO_SPACE);
-  TEE_SeekObjectData(object, 12, TEE_DATA_SEEK_SET);
-  EXPECT_EQ(TEE_WriteObjectData(object, "end", 3), TEE_SUCCESS);
-
-  TEE_ObjectInfo info;
-  ASSERT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
-  EXPECT_EQ(info.dataSize, 15u);
-  EXPECT_EQ(info.dataPosition, 15u);
-  EXPECT_EQ(info.objectType, TEE_TYPE_DATA);
-  TEE_CloseObject(object);
-  ASSERT_EQ(open_object(READ, &object), TEE_SUCCESS);
-  EXPECT_EQ(read_all(object), std::string("0123456789\0\0end", 15));
-}
-
 TEST_F(persistent, names_belong_to_storage_and_trusted_application) {
   ASSERT_EQ(create_object(READ, "", &object), TEE_SUCCESS);
   EXPECT_EQ(read_all(object), "");

@@ -49,44 +49,6 @@ TEST_F(platform, properties_as_text) {
   }
 }
 
-TEST_F(platform, properties_as_uuid_and_identity) {
-  TEE_UUID uuid{};
-  ASSERT_EQ(TEE_GetPropertyAsUUID(TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.deviceID", &uuid),
-            TEE_SUCCESS);
-  EXPECT_EQ(uuid.timeLow, 0x01020304U);
-  EXPECT_EQ(TEE_GetPropertyAsUUID(TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.description", &uuid),
-            TEE_ERROR_BAD_FORMAT);
-  TEE_Identity identity{};
-  auto get = [&] {
-    return TEE_GetPropertyAsIdentity(TEE_PROPSET_CURRENT_CLIENT, "gpd.client.identity", &identity);
-  };
-  EXPECT_EQ(get(), TEE_ERROR_ITEM_NOT_FOUND);
-  const TEE_Identity client{TEE_LOGIN_USER, UUID};
-  ta_.set_client(&client);
-  EXPECT_EQ(get(), TEE_SUCCESS);
-  EXPECT_EQ(identity.login, uint32_t{TEE_LOGIN_USER});
-  EXPECT_EQ(TEE_GetPropertyAsIdentity(TEE_PROPSET_CURRENT_TA, "gpd.ta.appID", &identity),
-            TEE_ERROR_BAD_FORMAT);
-}
-
-TEST_F(platform, trace_lines_are_filtered) {
-  static std::string seen;
-  seen.clear();
-  host::set_trace_sink(
-      [](void*, uint32_t level, const char* line, size_t length) {
-        seen += std::to_string(level) + std::string(line, length);
-      },
-      nullptr);
-  host::set_trace_level(TEE_TRACE_INFO);
-  for (uint32_t level = 1; level <= 4; ++level)
-    TEE_TraceWrite(level, "line\n", 5);
-  host::set_trace_level(0);
-  TEE_TraceWrite(TEE_TRACE_ERROR, "none\n", 5);
-  host::set_trace_level(TEE_TRACE_ERROR);
-  host::set_trace_sink(nullptr, nullptr);
-  EXPECT_EQ(seen, "1line\n2line\n");
-}
-
 TEST_F(platform_death, programming_errors_panic) {
   size_t length = 0;
   auto no_set = reinterpret_cast<TEE_PropSetHandle>(uintptr_t{5});

@@ -40,23 +40,6 @@ uint32_t count(client& from) {
   return operation.params[0].value.a;
 }
 
-TEST_F(sessions, globals_last_as_long_as_the_context) {
-  {
-    client first(made.path(), echo::FIRST);
-    EXPECT_EQ(count(first), 1u);
-    client again(made.path(), echo::FIRST);  // a context of its own, on the same device
-    EXPECT_EQ(count(again), 2u);
-    first.close_session();
-    first.open_session(echo::FIRST);
-    EXPECT_EQ(count(first), 3u);
-    temp_device other;
-    client elsewhere(other.path(), echo::FIRST);
-    EXPECT_EQ(count(elsewhere), 1u);
-  }
-  client fresh(made.path(), echo::FIRST);
-  EXPECT_EQ(count(fresh), 1u);
-}
-
 TEST_F(sessions, a_failed_create_leaves_nothing) {
   client user(made.path(), echo::FIRST);
   EXPECT_EQ(user.invoke(echo::FAIL_CREATE, nullptr), TEEC_SUCCESS);
@@ -88,15 +71,6 @@ TEST_F(sessions, what_a_trusted_application_leaves_is_counted_and_reported) {
   EXPECT_NE(trace.find("1f3c5e70-0001-4a00-8000-000000000001 ended with 1 heap blocks (100 bytes)"),
             std::string::npos)
       << trace;
-}
-
-TEST_F(sessions, mutual_sessions_end_with_the_context) {
-  client user(made.path(), echo::FIRST);
-  EXPECT_EQ(user.invoke(echo::KEEP_SESSION, nullptr), TEEC_SUCCESS);
-  EXPECT_EQ(user.open_session(echo::SECOND), TEEC_SUCCESS);
-  EXPECT_EQ(user.invoke(echo::KEEP_SESSION, nullptr), TEEC_SUCCESS);
-  user.restart();
-  EXPECT_EQ(user.open_session(echo::FIRST), TEEC_SUCCESS);
 }
 
 TEST_F(sessions, the_callee_sees_who_calls) {

@@ -150,35 +150,5 @@ TEST_F(gcm, tags_of_every_length) {
   TEE_FreeOperation(op);
 }
 
-// Every changed bit of a tag, every wrong length, a changed message and changed associated data are
-// seen; the output of the failed call is wiped and the operation can be used again.
-TEST_F(gcm, forgeries_are_refused) {
-  TEE_OperationHandle op = begin(TEE_MODE_DECRYPT);
-  const auto check = [&](gcm_case message, size_t tag_length, TEE_Result expected) {
-    start(op, message);
-    bytes output(message.ciphertext.size(), 1);
-    size_t length = output.size();
-    EXPECT_EQ(TEE_AEDecryptFinal(op, message.ciphertext.data(), length, output.data(), &length,
-                                 message.tag.data(), tag_length),
-              expected);
-    EXPECT_EQ(output, expected == TEE_SUCCESS ? PLAIN : bytes(output.size()));
-  };
-  for (size_t bit = 0; bit < 128; ++bit) {
-    gcm_case forged = GCM[0];
-    forged.tag[bit / 8] ^= static_cast<uint8_t>(1U << (bit % 8));
-    check(forged, 16, TEE_ERROR_MAC_INVALID);
-  }
-  for (size_t length = 0; length < 16; ++length)
-    check(GCM[0], length, TEE_ERROR_MAC_INVALID);
-  gcm_case changed = GCM[0];
-  changed.ciphertext[59] ^= 1;
-  check(changed, 16, TEE_ERROR_MAC_INVALID);
-  changed = GCM[0];
-  changed.associated[0] ^= 1;
-  check(changed, 16, TEE_ERROR_MAC_INVALID);
-  check(GCM[0], 16, TEE_SUCCESS);
-  TEE_FreeOperation(op);
-}
-
 }  // namespace
 }  // namespace tee::test

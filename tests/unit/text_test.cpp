@@ -92,31 +92,6 @@ TEST_F(Text, JsonNumbers) {
     EXPECT_EQ(written(json_value(row.number)), row.written);
 }
 
-TEST_F(Text, JsonTrees) {
-  EXPECT_EQ(written(json_value()), "null");
-  json_value root;
-  ASSERT_TRUE(root.make_object());
-  EXPECT_EQ(written(root), "{}");
-  json_value array;
-  ASSERT_TRUE(array.make_array());
-  EXPECT_EQ(written(array), "[]");
-  EXPECT_EQ(json_append(array.array(), json_value(true)), 0);
-  EXPECT_EQ(json_append(array.array(), json_value(false)), 0);
-  EXPECT_EQ(json_append(array.array(), json_value()), 0);
-  json_list* members = root.object();
-  EXPECT_EQ(json_set_string(members, "z", bytes_of("first")), 0);
-  EXPECT_EQ(json_set(members, "a/\"", std::move(array)), 0);
-  EXPECT_EQ(json_set_number(members, "", 3), 0);
-  EXPECT_EQ(written(root), R"({"z":"first","a\/\"":[true,false,null],"":3})");
-  // A name that is there keeps its place; a value of another kind may take it.
-  EXPECT_EQ(json_set_number(members, "z", 1), 0);
-  EXPECT_EQ(json_set_string(members, "a/\"", bytes_of("x")), 0);
-  EXPECT_EQ(written(root), R"({"z":1,"a\/\"":"x","":3})");
-  // A value without members takes none.
-  EXPECT_LT(json_set_number(json_value(1.0).object(), "n", 1), 0);
-  EXPECT_LT(json_append(root.array(), json_value()), 0);
-}
-
 // Builds and writes a document; counts on each step to be whole or not done at all.
 bool build(std::string* text) {
   json_value root;
