@@ -39,12 +39,39 @@ uint32_t load_u32(byte_view bytes) {
   return value;
 }
 
+// Whether the bytes are values in DER (X.690, 10): each in the one form that it may have. The order
+// of sets is not looked at: theirs is that of adding, which is intended.
+bool is_der(byte_view in) {
+  while (!in.empty()) {
+    const uint8_t* at = in.data();
+    long length = 0;
+    int tag = 0;
+    int tag_class = 0;
+    const int form = ASN1_get_object(&at, &length, &tag, &tag_class, static_cast<long>(in.size()));
+    if ((form & 0x80) != 0 || (form & 1) != 0) return false;  // malformed, or without a length
+    const byte_view content(at, static_cast<size_t>(length));
+    const bool constructed = (form & V_ASN1_CONSTRUCTED) != 0;
+    const int shortest = ASN1_object_size(constructed ? 1 : 0, static_cast<int>(length), tag);
+    if (content.data() + length - in.data() != shortest) return false;
+    if (constructed && !is_der(content)) return false;
+    const bool padded = length > 1 && (content[0] == 0 || content[0] == 0xFF) &&
+                        (content[0] & 0x80) == (content[1] & 0x80);
+    const bool integer = tag_class == V_ASN1_UNIVERSAL && tag == V_ASN1_INTEGER;
+    const bool boolean = tag_class == V_ASN1_UNIVERSAL && tag == V_ASN1_BOOLEAN;
+    if (integer && (length == 0 || padded)) return false;
+    if (boolean && (length != 1 || content[0] != 0xFF)) return false;  // FALSE is the default
+    in = in.subspan(static_cast<size_t>(shortest));
+  }
+  return true;
+}
+
 // The two certificates of a chain; its lengths must cover it exactly.
 std::vector<certificate> parse_chain(byte_view chain) {
   std::vector<certificate> links;
   while (chain.size() >= 4) {
     const uint32_t length = load_u32(chain);
     EXPECT_LE(length, chain.size() - 4);
+    EXPECT_TRUE(is_der(chain.subspan(4, length)));
     links.push_back(parse(chain.subspan(4, length)));
     chain = chain.subspan(4 + length);
   }
@@ -93,6 +120,8 @@ bytes extension_value(const certificate& from, const char* id) {
 }
 
 TEST(Attestation, ChainsVerifyForRsaAndEc) {
+  EXPECT_TRUE(is_der(bytes{2, 2, 0, 0x80, 1, 1, 0xFF}));
+  EXPECT_FALSE(is_der(bytes{2, 0x81, 1, 5}) || is_der(bytes{2, 2, 0, 5}) || is_der(bytes{1, 1, 1}));
   ta_under_test ta;
   const struct {
     param_set description;
@@ -128,7 +157,9 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     EXPECT_EQ(text_of(X509_get0_notBefore(chain[0].get())), row.not_before);
     EXPECT_EQ(text_of(X509_get0_notAfter(chain[0].get())), row.not_after);
     EXPECT_EQ(extension_value(chain[0], "2.5.29.15"), row.key_usage);
-    EXPECT_FALSE(extension_value(chain[0], KEY_DESCRIPTION).empty());
+    const bytes description = extension_value(chain[0], KEY_DESCRIPTION);
+    EXPECT_FALSE(description.empty());
+    EXPECT_TRUE(is_der(description));
     EXPECT_EQ(common_name(X509_get_subject_name(chain[0].get())), "A Keymaster Key\0"s);
     EXPECT_EQ(common_name(X509_get_issuer_name(chain[0].get())).size(), 18u);
     EXPECT_EQ(X509_get_signature_nid(chain[0].get()), NID_sha256WithRSAEncryption);
