@@ -3,6 +3,7 @@
 
 #include "tee_extensions.h"
 
+#include <algorithm>
 #include <string_view>
 
 #include "base/results.h"
@@ -12,6 +13,9 @@ namespace keymaster {
 namespace {
 
 constexpr uint32_t ATTK_BITS = 2048;
+
+// Above the public key of 8192 bits, so that a client's large buffer is no wish for as much memory.
+constexpr size_t MAX_DER = 4096;
 
 constexpr std::string_view PEM_BEGIN = "-----BEGIN PUBLIC KEY-----\n";
 constexpr std::string_view PEM_END = "\n-----END PUBLIC KEY-----";
@@ -82,7 +86,8 @@ TEE_Result export_rsa_public_key(TEE_ObjectHandle key, uint32_t key_bits, byte_s
                                  size_t* length) {
   *length = 0;
   heap_buffer der;
-  if (TEE_Result res = export_der(key, key_bits, buffer.size(), &der, trace_site::here())) {
+  if (TEE_Result res =
+          export_der(key, key_bits, std::min(buffer.size(), MAX_DER), &der, trace_site::here())) {
     return res;
   }
   heap_buffer base64;

@@ -100,11 +100,17 @@ TEST_F(SoterDocument, HoldsWhatTheDeviceKnows) {
   EXPECT_EQ(parsed(sign(blob, PKCS1, "x", user)).text(),
             R"({"raw":"x","fid":7,"counter":5,"uid":0,)" + std::string(DEVICE));
 
+  // A report from the future is none.
+  tee::host::set_clocks(START_SYSTEM_MS + 3000, START_REE_MS);
+  EXPECT_EQ(signed_by(blob, PKCS1, "x").text(),
+            R"({"raw":"x","counter":6,"uid":0,)" + std::string(DEVICE));
+
   // A restart forgets the finger, not the counter.
+  ta_under_test::advance(1);
   ta.restart();
   load();
   EXPECT_EQ(signed_by(blob, PKCS1, "x").text(),
-            R"({"raw":"x","counter":6,"uid":0,)" + std::string(DEVICE));
+            R"({"raw":"x","counter":7,"uid":0,)" + std::string(DEVICE));
 }
 
 TEST_F(SoterDocument, IsSignedWithEverySchemeOfTheKey) {
