@@ -51,19 +51,6 @@ TEE_Result report_match(uint32_t fid) {
 
 }  // namespace
 
-TEE_Result TA_CreateEntryPoint() {
-  return TEE_SUCCESS;
-}
-
-void TA_DestroyEntryPoint() {}
-
-TEE_Result TA_OpenSessionEntryPoint(uint32_t paramTypes, TEE_Param* /*params*/,
-                                    void** /*sessionContext*/) {
-  return paramTypes == 0 ? TEE_SUCCESS : TEE_ERROR_BAD_PARAMETERS;
-}
-
-void TA_CloseSessionEntryPoint(void* /*sessionContext*/) {}
-
 TEE_Result TA_InvokeCommandEntryPoint(void* /*sessionContext*/, uint32_t commandID,
                                       uint32_t paramTypes, TEE_Param* params) {
   if (commandID != COMMAND_REPORT_MATCH) return TEE_ERROR_NOT_SUPPORTED;

@@ -3,18 +3,6 @@
 // than there was room for.
 #include "tee_internal_api.h"
 
-TEE_Result TA_CreateEntryPoint() {
-  return TEE_SUCCESS;
-}
-
-void TA_DestroyEntryPoint() {}
-
-TEE_Result TA_OpenSessionEntryPoint(uint32_t, TEE_Param*, void**) {
-  return TEE_SUCCESS;
-}
-
-void TA_CloseSessionEntryPoint(void*) {}
-
 TEE_Result TA_InvokeCommandEntryPoint(void*, uint32_t command, uint32_t types, TEE_Param* params) {
   const bool asked_well = command == 27 && types == 0x7 && params[0].memref.size >= 4;
   if (!asked_well) return TEE_ERROR_BAD_PARAMETERS;

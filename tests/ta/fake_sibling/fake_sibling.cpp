@@ -64,18 +64,6 @@ TEE_Result retrieve(uint32_t question, TEE_Param* output, uint32_t* reported) {
 
 }  // namespace
 
-TEE_Result TA_CreateEntryPoint() {
-  return TEE_SUCCESS;
-}
-
-void TA_DestroyEntryPoint() {}
-
-TEE_Result TA_OpenSessionEntryPoint(uint32_t, TEE_Param*, void**) {
-  return TEE_SUCCESS;
-}
-
-void TA_CloseSessionEntryPoint(void*) {}
-
 TEE_Result TA_InvokeCommandEntryPoint(void*, uint32_t command, uint32_t types, TEE_Param* params) {
   if (command == FAKE_PROGRAM) return program(params[0]);
   if (command == FAKE_FORWARD) return forward(params[0]);
