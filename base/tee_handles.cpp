@@ -1,4 +1,4 @@
-// Owners of the platform's objects, operations and sessions.
+// Owners of the platform's objects and operations.
 #include "base/tee_handles.h"
 
 #include "base/results.h"
@@ -111,18 +111,6 @@ TEE_Result tee_operation::ae_update(byte_view input, byte_span output, size_t* p
 void tee_operation::reset(TEE_OperationHandle handle) {
   if (*this) TEE_FreeOperation(handle_);
   handle_ = handle;
-}
-
-tee_session::~tee_session() {
-  if (handle_ != TEE_TASessionHandle{}) TEE_CloseTASession(handle_);
-}
-
-TEE_Result tee_session::open(const TEE_UUID& application, uint32_t timeout) {
-  return TEE_OpenTASession(&application, timeout, 0, nullptr, &handle_, nullptr);
-}
-
-TEE_Result tee_session::invoke(uint32_t command, uint32_t types, TEE_Param* params) {
-  return TEE_InvokeTACommand(handle_, TEE_TIMEOUT_INFINITE, command, types, params, nullptr);
 }
 
 }  // namespace keymaster

@@ -1,4 +1,4 @@
-// Owners of the platform's objects, operations and sessions. Each has a zero state in which every
+// Owners of the platform's objects and operations. Each has a zero state in which every
 // call that cleans up is legal. Methods trace a failure under the caller's function and line.
 #pragma once
 
@@ -82,25 +82,6 @@ class tee_operation {
 
  private:
   TEE_OperationHandle handle_{};
-};
-
-// tee_session: owns a session with another trusted application. Calls trace nothing: who calls says
-// what failed in its own words.
-class tee_session {
- public:
-  tee_session() = default;
-  tee_session(const tee_session&) = delete;
-  tee_session& operator=(const tee_session&) = delete;
-  ~tee_session();
-
-  // Once; `timeout` in ms.
-  [[nodiscard]] TEE_Result open(const TEE_UUID& application, uint32_t timeout);
-  // Without a limit in time. Sizes that come back in `params` are the other side's word: hold them
-  // against the buffers.
-  [[nodiscard]] TEE_Result invoke(uint32_t command, uint32_t types, TEE_Param* params);
-
- private:
-  TEE_TASessionHandle handle_{};
 };
 
 }  // namespace keymaster

@@ -3,7 +3,7 @@
 
 #include "base/bytes.h"
 #include "base/results.h"
-#include "base/tee_handles.h"
+#include "base/tee_session.h"
 #include "product/uuids.h"
 
 namespace keymaster {

@@ -1,6 +1,6 @@
 // Blobs of the earlier Keymaster TA, which that TA alone can open.
 #include "base/results.h"
-#include "base/tee_handles.h"
+#include "base/tee_session.h"
 #include "keymaster/store/blob_plaintext.h"
 #include "keymaster/store/key_blob.h"
 #include "product/uuids.h"
