@@ -116,8 +116,9 @@ INSTANTIATE_TEST_SUITE_P(kinds, storage, ::testing::Values(PRIVATE, RPMB));
 TEST_P(storage, edited_and_swapped_rows_are_corrupt_and_removed) {
   const char* attacks[] = {
       "UPDATE objects SET sealed = substr(sealed, 1, length(sealed) - 1) WHERE id = x'61'",
-      "UPDATE objects SET sealed = CAST(substr(sealed, 1, 14) || x'5a' || substr(sealed, 16)"
-      " AS BLOB) WHERE id = x'61'",
+      "UPDATE objects SET sealed = CAST(substr(sealed, 1, 14) ||"
+      " CASE substr(sealed, 15, 1) WHEN x'5a' THEN x'5b' ELSE x'5a' END ||"
+      " substr(sealed, 16) AS BLOB) WHERE id = x'61'",
       "UPDATE objects SET sealed = x'' WHERE id = x'61'",
       "UPDATE objects SET sealed = 'text' WHERE id = x'61'",
       "UPDATE objects SET sealed = (SELECT sealed FROM objects WHERE id = x'62') WHERE id = x'61'",
