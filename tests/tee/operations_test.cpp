@@ -12,7 +12,6 @@ TEST_F(operations_death, calls_that_do_not_fit_panic) {
   const bytes block(16);
   uint8_t out[64];
   size_t length = sizeof(out);
-  size_t tag_length = 16;
   auto aes = [] { return secret_key(TEE_TYPE_AES, bytes(16)); };
   auto mac_key = secret_key(TEE_TYPE_HMAC_SHA1, bytes(16));
   TEE_ObjectHandle empty = nullptr;
@@ -20,7 +19,6 @@ TEST_F(operations_death, calls_that_do_not_fit_panic) {
   auto big_key = secret_key(TEE_TYPE_AES, bytes(32));
   auto digest = operation(TEE_ALG_SHA256, TEE_MODE_DIGEST, 0, nullptr);
   auto keyless = operation(TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 128, nullptr);
-  auto keyless_mac = operation(TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 256, nullptr);
   auto initial = operation(TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 128, aes());
   auto running = operation(TEE_ALG_AES_ECB_NOPAD, TEE_MODE_ENCRYPT, 128, aes());
   TEE_CipherInit(running, nullptr, 0);
@@ -34,33 +32,19 @@ TEST_F(operations_death, calls_that_do_not_fit_panic) {
       {"SetOperationKey: a digest takes no key", [&] { TEE_SetOperationKey(digest, empty); }},
       {"SetOperationKey: key is not an initialised", [&] { TEE_SetOperationKey(keyless, empty); }},
       {"SetOperationKey: key of type", [&] { TEE_SetOperationKey(keyless, mac_key); }},
-      {"SetOperationKey: key of type", [&] { TEE_SetOperationKey(keyless_mac, mac_key); }},
       {"SetOperationKey: key of 256 bits", [&] { TEE_SetOperationKey(keyless, big_key); }},
-      {"SetOperationKey: operation is initialised", [&] { TEE_SetOperationKey(running, nullptr); }},
       {"DigestUpdate: operation of algorithm", [&] { TEE_DigestUpdate(initial, out, 1); }},
       {"DigestUpdate: chunk is null with length 1", [&] { TEE_DigestUpdate(digest, nullptr, 1); }},
-      {"DigestDoFinal: the length of hash is null",
-       [&] { TEE_DigestDoFinal(digest, nullptr, 0, out, nullptr); }},
-      {"MACInit: operation has no key", [&] { TEE_MACInit(keyless_mac, nullptr, 0); }},
       {"CipherInit: operation has no key", [&] { TEE_CipherInit(keyless, block.data(), 16); }},
       {"CipherInit: IV of 12 bytes", [&] { TEE_CipherInit(initial, block.data(), 12); }},
-      {"CipherInit: IV of 16 bytes", [&] { TEE_CipherInit(running, block.data(), 16); }},
       {"CipherUpdate: operation is not initialised",
        [&] { TEE_CipherUpdate(initial, block.data(), 1, out, &length); }},
-      {"CipherUpdate: destData is null with capacity",
-       [&] { TEE_CipherUpdate(running, block.data(), 1, nullptr, &(length = 5)); }},
       {"CipherDoFinal: the message ends inside a block",
        [&] { TEE_CipherDoFinal(running, block.data(), 15, out, &length); }},
-      {"AEInit: operation is initialised already",
-       [&] { TEE_AEInit(sealing, block.data(), 12, 128, 0, 0); }},
       {"AEUpdateAAD: associated data after payload",
        [&] { TEE_AEUpdateAAD(sealing, block.data(), 1); }},
       {"AEDecryptFinal: operation is of mode 0, not 1",
        [&] { TEE_AEDecryptFinal(sealing, nullptr, 0, nullptr, &(length = 0), out, 16); }},
-      {"AEEncryptFinal: operation of algorithm",
-       [&] { TEE_AEEncryptFinal(running, nullptr, 0, out, &length, out, &tag_length); }},
-      {"AsymmetricSignDigest: operation of algorithm",
-       [&] { TEE_AsymmetricSignDigest(running, nullptr, 0, out, 1, out, &length); }},
       {"Panic: code 0xffff0007", [&] { TEE_Panic(TEE_ERROR_BAD_STATE); }},
   };
   for (const auto& row : rows) {

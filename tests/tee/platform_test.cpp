@@ -20,9 +20,7 @@ TEST_F(platform, properties_as_text) {
     const char* name;
     const char* text;
   } rows[] = {
-      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.deviceID", "01020304-0506-0708-090a-0b0c0d0e0f10"},
       {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.trustedos.manufacturer", "Keymaster"},
-      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.systemTime.protectionLevel", "100"},
       {TEE_PROPSET_CURRENT_TA, "gpd.ta.appID", "01020304-0506-0708-090a-0b0c0d0e0f10"},
       {TEE_PROPSET_CURRENT_TA, "gpd.ta.singleInstance", "true"},
       {TEE_PROPSET_CURRENT_TA, "gpd.ta.dataSize", "4096"},
@@ -56,7 +54,6 @@ TEST_F(platform_death, programming_errors_panic) {
                "panic: TEE_GetPropertyAsString: .* is not a property set");
   EXPECT_DEATH((void)TEE_GetPropertyAsString(TEE_PROPSET_CURRENT_TA, nullptr, nullptr, &length),
                "panic: TEE_GetPropertyAsString: name is null");
-  EXPECT_DEATH(TEE_GetSystemTime(nullptr), "panic: TEE_GetSystemTime: time is null");
   EXPECT_DEATH(TEE_GenerateRandom(nullptr, 1), "panic: TEE_GenerateRandom: .* is null");
 }
 

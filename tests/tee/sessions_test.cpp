@@ -33,25 +33,6 @@ TEEC_Result relay(client& from, std::vector<TEE_UUID> path, std::string* identit
   return result;
 }
 
-uint32_t count(client& from) {
-  TEEC_Operation operation{};
-  operation.paramTypes = TEEC_PARAM_TYPES(TEEC_VALUE_OUTPUT, 0, 0, 0);
-  EXPECT_EQ(from.invoke(echo::COUNT, &operation), TEEC_SUCCESS);
-  return operation.params[0].value.a;
-}
-
-TEST_F(sessions, a_failed_create_leaves_nothing) {
-  client user(made.path(), echo::FIRST);
-  EXPECT_EQ(user.invoke(echo::FAIL_CREATE, nullptr), TEEC_SUCCESS);
-  user.restart();
-  EXPECT_EQ(user.open_session(echo::FIRST), TEEC_ERROR_BAD_STATE);
-  EXPECT_EQ(user.origin, TEEC_ORIGIN_TRUSTED_APP);
-  host::live_counts counts;
-  EXPECT_FALSE(host::counts_of(echo::FIRST, &counts));
-  EXPECT_EQ(user.open_session(echo::FIRST), TEEC_SUCCESS);
-  EXPECT_EQ(count(user), 1u);
-}
-
 TEST_F(sessions, what_a_trusted_application_leaves_is_counted_and_reported) {
   std::string trace;
   host::set_trace_level(TEE_TRACE_INFO);
@@ -115,11 +96,9 @@ TEST_F(sessions, logins_are_derived_and_checked) {
       {TEEC_LOGIN_USER, nullptr, TEEC_SUCCESS, "1:"},
       {TEEC_LOGIN_GROUP, &own_group, TEEC_SUCCESS, "2:"},
       {TEEC_LOGIN_APPLICATION, nullptr, TEEC_SUCCESS, "4:"},
-      {TEEC_LOGIN_GROUP_APPLICATION, &own_group, TEEC_SUCCESS, "6:"},
       {TEEC_LOGIN_GROUP, &no_group, TEEC_ERROR_ACCESS_DENIED, ""},
       {TEEC_LOGIN_GROUP, nullptr, TEEC_ERROR_BAD_PARAMETERS, ""},
       {TEEC_LOGIN_PUBLIC, &own_group, TEEC_ERROR_BAD_PARAMETERS, ""},
-      {3, nullptr, TEEC_ERROR_BAD_PARAMETERS, ""},
       {TEE_LOGIN_TRUSTED_APP, nullptr, TEEC_ERROR_BAD_PARAMETERS, ""},
   };
   for (const auto& row : cases) {

@@ -39,26 +39,12 @@ TEE_Attribute ref(uint32_t id, const bytes& value) {
   return attribute;
 }
 
-TEE_Attribute value(uint32_t id, uint32_t a, uint32_t b) {
-  TEE_Attribute attribute;
-  TEE_InitValueAttribute(&attribute, id, a, b);
-  return attribute;
-}
-
-TEE_ObjectHandle populate(uint32_t type, uint32_t bits,
-                          const std::vector<TEE_Attribute>& attributes, TEE_Result* result) {
-  TEE_ObjectHandle object = nullptr;
-  EXPECT_EQ(TEE_AllocateTransientObject(type, bits, &object), TEE_SUCCESS);
-  *result = TEE_PopulateTransientObject(object, attributes.data(),
-                                        static_cast<uint32_t>(attributes.size()));
-  return object;
-}
-
 TEE_ObjectHandle secret_key(uint32_t type, const bytes& secret) {
-  TEE_Result result = TEE_SUCCESS;
+  TEE_ObjectHandle key = nullptr;
   auto bits = static_cast<uint32_t>(secret.size() * 8);
-  TEE_ObjectHandle key = populate(type, bits, {ref(TEE_ATTR_SECRET_VALUE, secret)}, &result);
-  EXPECT_EQ(result, TEE_SUCCESS);
+  EXPECT_EQ(TEE_AllocateTransientObject(type, bits, &key), TEE_SUCCESS);
+  const TEE_Attribute attribute = ref(TEE_ATTR_SECRET_VALUE, secret);
+  EXPECT_EQ(TEE_PopulateTransientObject(key, &attribute, 1), TEE_SUCCESS);
   return key;
 }
 

@@ -32,14 +32,8 @@ class in_instance : public ::testing::Test {
   instance_scope scope_{ta_};
 };
 
-// Attributes that borrow their bytes.
+// ref: an attribute that borrows its bytes.
 TEE_Attribute ref(uint32_t id, const bytes& value);
-TEE_Attribute value(uint32_t id, uint32_t a, uint32_t b = 0);
-
-// populate: a fresh object of that type and size with these attributes; *result is what populating
-// gave. The object is there whatever that was.
-TEE_ObjectHandle populate(uint32_t type, uint32_t bits,
-                          const std::vector<TEE_Attribute>& attributes, TEE_Result* result);
 
 // secret_key: an object that holds a symmetric key.
 TEE_ObjectHandle secret_key(uint32_t type, const bytes& secret);

@@ -46,7 +46,6 @@ TEST_F(teec, registered_and_allocated_memory) {
     size_t size;  // of the output slot afterwards
   } cases[] = {
       {PART_IN, {&in, 4, 6}, PART_OUT, {&out, 5, 3}, 0, 4},
-      {PART_IN, {&in, 2, 0}, WHOLE, {&out, 0, 0}, 0, 2},
       {WHOLE, {&in, 0, 0}, WHOLE, {&out, 0, 0}, TEEC_ERROR_SHORT_BUFFER, 10},
       {PART_IN, {&in, 0, 10}, WHOLE, {&out, 0, 0}, 0, 0},
       {PART_IN, {&in, 5, 6}, WHOLE, {&out, 9, 0}, BAD, 9},
@@ -77,7 +76,6 @@ TEST_F(teec, registered_and_allocated_memory) {
   EXPECT_EQ(out.buffer, nullptr);
   for (auto [buffer, size, flags, expected] :
        {std::tuple{bytes.data(), size_t{10}, 0u, TEEC_ERROR_BAD_PARAMETERS},
-        {bytes.data(), size_t{10}, 4u, TEEC_ERROR_BAD_PARAMETERS},
         {static_cast<char*>(nullptr), size_t{10}, 1u, TEEC_ERROR_BAD_PARAMETERS},
         {bytes.data(), size_t{TEEC_CONFIG_SHAREDMEM_MAX_SIZE} + 1, 1u, TEEC_ERROR_OUT_OF_MEMORY}}) {
     TEEC_SharedMemory memory{buffer, size, flags, nullptr};
@@ -89,7 +87,7 @@ TEST_F(teec, bad_calls_are_refused) {
   for (uint32_t types : {4u, 8u, 0xBu, 0x40u, 0x10000u, 0xFFFF0000u}) {
     TEEC_Operation operation{};
     operation.paramTypes = types;
-    EXPECT_EQ(user.invoke(echo::COUNT, &operation), TEEC_ERROR_BAD_PARAMETERS) << types;
+    EXPECT_EQ(user.invoke(echo::MIRROR, &operation), TEEC_ERROR_BAD_PARAMETERS) << types;
     EXPECT_EQ(user.origin, TEEC_ORIGIN_API);
   }
   TEEC_Operation operation{};
@@ -106,7 +104,7 @@ TEST_F(teec, bad_calls_are_refused) {
   EXPECT_EQ(user.open_session(echo::FIRST, &operation), TEEC_ERROR_EXCESS_DATA);
   EXPECT_EQ(operation.params[0].value.b, 3u);
   EXPECT_EQ(user.origin, TEEC_ORIGIN_TRUSTED_APP);
-  EXPECT_EQ(user.invoke(echo::COUNT, nullptr), TEEC_ERROR_BAD_PARAMETERS);
+  EXPECT_EQ(user.invoke(echo::MIRROR, nullptr), TEEC_ERROR_BAD_PARAMETERS);
 
   EXPECT_EQ(user.open_session({1, 1, 1, {}}), TEEC_ERROR_ITEM_NOT_FOUND);
   EXPECT_EQ(user.origin, TEEC_ORIGIN_TEE);
@@ -121,7 +119,7 @@ TEST_F(teec, bad_calls_are_refused) {
 TEST_F(teec, a_context_that_ends_takes_its_sessions_along) {
   TEEC_Session copy = user.session;
   TEEC_FinalizeContext(&user.context);
-  EXPECT_EQ(TEEC_InvokeCommand(&copy, echo::COUNT, nullptr, nullptr), TEEC_ERROR_BAD_PARAMETERS);
+  EXPECT_EQ(TEEC_InvokeCommand(&copy, echo::MIRROR, nullptr, nullptr), TEEC_ERROR_BAD_PARAMETERS);
   TEEC_CloseSession(&copy);
   EXPECT_NE(made.open(), nullptr);
 }

@@ -39,10 +39,8 @@ TEST_F(EcSignature, Lengths) {
   const struct {
     uint32_t length;
     bytes encoding;
-  } rows[] = {{0, {0}},
-              {126, {126}},
+  } rows[] = {{126, {126}},
               {127, {0x81, 0x7F}},
-              {128, {0x81, 0x80}},
               {254, {0x81, 0xFE}},
               {255, {0x82, 0x00, 0xFF}},
               {65534, {0x82, 0xFF, 0xFE}},
@@ -71,7 +69,6 @@ TEST_F(EcSignature, EncodingsAndBack) {
       {joined({{0, 0}, HIGH}), {0, 0x7F}, joined({{0x30, 0x26, 2, 0x21, 0}, HIGH, {2, 1, 0x7F}})},
       {LONG, LONG, joined({{0x30, 0x81, 0x88, 2, 0x42}, LONG, {2, 0x42}, LONG})},
       {{0, 0}, {1}, {0x30, 5, 2, 0, 2, 1, 1}},
-      {{}, {}, {0x30, 4, 2, 0, 2, 0}},
       {WIDE, bytes(65, 0x11), joined({{0x30, 0x7E, 2, 57}, WIDE, {2, 65}, bytes(65, 0x11)})},
   };
   for (const auto& row : rows) {
@@ -103,13 +100,10 @@ TEST_F(EcSignature, OnlyTheShortestFormIsTaken) {
       {{0x30}, "Wrong der length"},
       {joined({{0x31, 68}, integer, integer}), "Wrong tag, expect 0x30, got 0x31"},
       {joined({{0x30, 0x85, 0, 0, 0, 0, 68}, integer, integer}), "Decode length failed"},
-      {{0x30, 0x82, 0x01}, "Decode length failed"},
       {joined({{0x30, 68}, integer, integer, {0}}),
        "Wrong length of sequence, expect 70B, got 71B"},
-      {joined({{0x30, 68}, integer}), "Wrong length of sequence, expect 70B, got 36B"},
       {joined({{0x30, 0x84, 0xFF, 0xFF, 0xFF, 0xFF}, integer}), "Wrong length of sequence"},
       {joined({{0x30, 68, 3, 32}, part, integer}), "Wrong tag, expect 0x02, got 0x03"},
-      {joined({{0x30, 34}, integer}), "Wrong tag, expect 0x02, got 0x00"},
       {joined({{0x30, 68}, integer, {2, 33}, part}),
        "Wrong length of integer, 32B available, got 33B"},
       {joined({{0x30, 38, 2, 0x84, 0xFF, 0xFF, 0xFF, 0xFF}, part}),
@@ -118,7 +112,6 @@ TEST_F(EcSignature, OnlyTheShortestFormIsTaken) {
       {joined({{0x30, 69}, integer, {2, 33, 1}, part}),
        "Wrong length of S, expect max 32B, got 33B"},
       {joined({{0x30, 0x81, 68}, integer, integer}), "Encoding size mismatch"},
-      {joined({{0x30, 69}, integer, {2, 0x81, 32}, part}), "Encoding size mismatch"},
       {joined({{0x30, 69, 2, 33, 0}, part, integer}), "Encoding size mismatch"},
       {joined({{0x30, 70}, integer, integer, {5, 0}}), "Encoding size mismatch"},
       {joined({{0x30, 35, 2, 0x80}, {2, 29}, bytes(29, 1), {5, 0}}), "Encoding size mismatch"},

@@ -5,8 +5,6 @@
 
 namespace {
 
-constexpr char FAIL_MARK[] = "fail";
-uint32_t count = 0;
 TEE_TASessionHandle kept = nullptr;
 
 TEE_Result mirror(TEE_Param* params) {
@@ -42,21 +40,6 @@ TEE_Result relay(uint32_t types, TEE_Param* params) {
   return res;
 }
 
-TEE_Result set_fail_mark() {
-  TEE_ObjectHandle mark;
-  TEE_Result res = TEE_CreatePersistentObject(TEE_STORAGE_PRIVATE, FAIL_MARK, sizeof(FAIL_MARK), 0,
-                                              nullptr, nullptr, 0, &mark);
-  TEE_CloseObject(mark);
-  return res;
-}
-
-bool take_fail_mark() {
-  TEE_ObjectHandle mark;
-  TEE_Result res = TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, FAIL_MARK, sizeof(FAIL_MARK),
-                                            TEE_DATA_FLAG_ACCESS_WRITE_META, &mark);
-  return res == TEE_SUCCESS && TEE_CloseAndDeletePersistentObject1(mark) == TEE_SUCCESS;
-}
-
 TEE_Result keep_session() {
   TEE_UUID own;
   TEE_GetPropertyAsUUID(TEE_PROPSET_CURRENT_TA, "gpd.ta.appID", &own);
@@ -69,9 +52,6 @@ TEE_Result keep_session() {
 extern "C" TA_EXPORT const char TA_Properties[] = "gpd.ta.dataSize=65536\ngpd.ta.version=1.2\n";
 
 TEE_Result TA_CreateEntryPoint() {
-  count++;
-  if (take_fail_mark()) return TEE_ERROR_BAD_STATE;
-  count--;
   return TEE_SUCCESS;
 }
 
@@ -93,11 +73,6 @@ TEE_Result TA_InvokeCommandEntryPoint(void*, uint32_t command, uint32_t types, T
       return mirror(params);
     case echo::RELAY:
       return relay(types, params);
-    case echo::COUNT:
-      params[0].value.a = ++count;
-      return TEE_SUCCESS;
-    case echo::FAIL_CREATE:
-      return set_fail_mark();
     case echo::KEEP_SESSION:
       return keep_session();
     case echo::LEAK:

@@ -10,23 +10,18 @@ constexpr TEE_UUID SECOND = {0x1f3c5e70, 0x0002, 0x4a00, {0x80, 0, 0, 0, 0, 0, 0
 
 enum command : uint32_t {
   // Slot 0, value inout: a and b are exchanged. Slot 1, memory input; slot 2, memory output or
-  // inout:
-  // the input's bytes, SHORT_BUFFER when they do not fit. Slot 3, value output: as found at entry,
-  // with 1 added to a.
+  // inout: the input's bytes, SHORT_BUFFER when they do not fit. Slot 3, value output: as found at
+  // entry, with 1 added to a.
   MIRROR = 1,
   // Slot 0, memory input: UUIDs, one behind the other, of trusted applications to call in turn,
-  // each
-  // with the rest of the list. Slot 1, memory output (64): the client identity, as text, that the
-  // last one sees; the other ones' results are passed on. Slot 2, value output: the origin of that.
+  // each with the rest of the list. Slot 1, memory output (64): the client identity, as text, that
+  // the last one sees; the other ones' results are passed on. Slot 2, value output: the origin of
+  // that.
   RELAY = 2,
-  // Slot 0, value output: how often it was called in this instance.
-  COUNT = 3,
-  // Has the next create entry point fail, with BAD_STATE, after it counted.
-  FAIL_CREATE = 4,
   // Opens a session with the other identity and keeps it.
-  KEEP_SESSION = 5,
+  KEEP_SESSION = 3,
   // Leaves a heap block of 100 bytes behind.
-  LEAK = 6,
+  LEAK = 4,
 };
 
 }  // namespace echo
