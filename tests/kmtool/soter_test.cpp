@@ -1,7 +1,5 @@
 // SOTER on the command line: provisioning, the ATTK, and documents that openssl verifies.
 #include <cstdlib>
-#include <gtest/gtest.h>
-#include <nlohmann/json.hpp>
 
 #include "run.h"
 #include "tee/device/device.h"
@@ -9,84 +7,52 @@
 
 namespace {
 
-using nlohmann::json;
-using words = std::vector<std::string>;
-
-enum { DONE, REFUSED, WRONG_USAGE, TEE_FAILED };
-
 // A sandbox with a device whose ATTK lies in attk (private) and attk.pub (public).
-class KmtoolSoter : public testing::Test {
+class KmtoolSoter : public sandbox {
  protected:
-  void SetUp() override {
+  KmtoolSoter() {
     openssl("genpkey -algorithm RSA -pkeyopt rsa_keygen_bits:2048 -out attk");
     openssl("pkey -in attk -pubout -out attk.pub");
-    box.write("m", "pay/10\x01");
-    expect({"device", "create", "--os-version", "130000", "--attk", "attk", "--fp-name", "sensor",
-            "--fp-version", "2", "--cpu-id", "cpu", "--device-id", "serial 1"},
-           DONE, "");
+    write("m", "pay/10\x01");
+    expect_done({"device", "create", "--attk", "attk", "--fp-name", "sensor", "--fp-version", "2",
+                 "--cpu-id", "cpu", "--device-id", "serial 1"});
   }
-  void openssl(const std::string& arguments, int exit_code = 0) {
-    const std::string line =
-        "cd '" + box.path("") + "' && openssl " + arguments + " >.openssl 2>&1";
-    EXPECT_EQ(WEXITSTATUS(std::system(line.c_str())), exit_code)
-        << arguments << ": " << box.read(".openssl");
+  void openssl(const std::string& arguments) {
+    const std::string line = "cd '" + path("") + "' && openssl " + arguments + " >.openssl 2>&1";
+    EXPECT_EQ(std::system(line.c_str()), 0) << arguments << ": " << read(".openssl");
   }
-  void expect(const words& arguments, int exit_code, const std::string& message) {
-    const call_result result = box.run(arguments);
-    EXPECT_EQ(result.exit_code, exit_code) << testing::PrintToString(arguments) << result.err;
-    EXPECT_NE((result.out + result.err).find(message), std::string::npos)
-        << testing::PrintToString(arguments) << result.out << result.err;
-  }
-  json run_json(words arguments) {
-    arguments.insert(arguments.begin(), "--json");
-    return json::parse(box.run(arguments).out);
-  }
-  // The members of a document in a file, which must end with its zero byte.
-  json document(const std::string& name) {
-    std::string text = box.read(name);
-    EXPECT_EQ(text.back(), '\0');
-    text.pop_back();
-    return json::parse(text);
-  }
-  sandbox box;
 };
 
 TEST_F(KmtoolSoter, DevicesAreProvisionedOnce) {
   expect({"soter", "check-attk"}, DONE, "ready");
-  EXPECT_EQ(box.run({"soter", "export-attk"}).out, box.read("attk.pub"));
-  EXPECT_EQ(box.run({"soter", "device-id"}).out, "serial 1\n");
+  EXPECT_EQ(out_of({"soter", "export-attk"}), read("attk.pub"));
+  EXPECT_EQ(out_of({"soter", "device-id"}), "serial 1\n");
   expect({"soter", "fingerprint", "3"}, DONE, "took the report");
   expect({"device", "provision"}, REFUSED, "provisioned before");
 
   tee::device_settings settings;
   settings.id = tee::new_uuid();
-  tee::device::create(box.path("bare"), settings);
+  tee::device::create(path("bare"), settings);
   expect({"--device", "bare", "soter", "check-attk"}, REFUSED, "no ATTK (-1)");
   expect({"--device", "bare", "soter", "export-attk"}, REFUSED, "kmtool device provision");
   expect({"--device", "bare", "soter", "device-id"}, REFUSED, "(-1000)");
-  expect({"--device", "bare", "device", "provision"}, DONE, "");
+  expect_done({"--device", "bare", "device", "provision"});
   expect({"--device", "bare", "soter", "check-attk"}, DONE, "ready");
   EXPECT_EQ(run_json({"--device", "bare", "soter", "device-id"})["device_id"],
             tee::to_text(settings.id));
 }
 
 TEST_F(KmtoolSoter, DocumentsAreSplitAndVerified) {
-  const words generate = {"generate", "rsa", "--soter", "--padding", "pkcs1-sign", "-o"};
-  const auto generated = [&](const std::string& name, const words& more) {
-    words call = generate;
-    call.push_back(name);
-    call.insert(call.end(), more.begin(), more.end());
-    expect(call, DONE, "");
-  };
-  generated("k", {"--uid", "7", "--counter"});
+  const words generate = {"generate", "rsa", "--soter", "--padding", "pkcs1-sign"};
+  expect_done(generate, {"-o", "k", "--uid", "7", "--counter"});
   expect({"soter", "export", "k", "-o", "e", "--public-key", "k.pub"}, DONE, "e.sig");
   openssl("dgst -sha256 -verify attk.pub -signature e.sig e");
   expect({"soter", "verify", "e", "e.sig", "--key", "attk.pub"}, DONE, "\"counter\":1,\"uid\":7");
-  EXPECT_EQ(std::string(document("e")["pub_key"]) + "\n", box.read("k.pub"));
+  EXPECT_EQ(std::string(json::parse(read("e").c_str())["pub_key"]) + "\n", read("k.pub"));
 
-  expect({"sign", "k", "-i", "m", "-o", "d", "--signature", "s", "--fingerprint", "5"}, DONE, "");
+  expect_done({"sign", "k", "-i", "m", "-o", "d", "--signature", "s", "--fingerprint", "5"});
   openssl("dgst -sha256 -verify k.pub -signature s d");
-  const std::string text = box.run({"soter", "verify", "d", "s", "--key", "k.pub"}).out;
+  const std::string text = out_of({"soter", "verify", "d", "s", "--key", "k.pub"});
   EXPECT_TRUE(text.starts_with(
       R"({"raw":"pay\/10\u0001","fid":5,"counter":2,"uid":7,"tee_n":"Keymaster","tee_v":")"))
       << text;
@@ -94,36 +60,31 @@ TEST_F(KmtoolSoter, DocumentsAreSplitAndVerified) {
 
   expect({"soter", "verify", "d", "s", "--key", "attk.pub"}, REFUSED, "(-30)");
   expect({"soter", "verify", "d", "s", "--key", "k.pub", "--digest", "sha512"}, REFUSED, "(-30)");
-  std::string shorter = box.read("d");
-  shorter.pop_back();
-  box.write("text", shorter);
+  write("text", read("d").c_str());
   expect({"soter", "verify", "text", "s", "--key", "k.pub"}, REFUSED, "zero byte");
 
-  box.write("m", std::string(100'000, '/'));  // escaped, twice as long
+  write("m", std::string(100'000, '/'));  // escaped, twice as long
   const json again = json::parse(
       std::string(run_json({"sign", "k", "-i", "m", "--padding", "pkcs1-sign"})["document"]));
   EXPECT_EQ(again["counter"], 3);
   EXPECT_FALSE(again.contains("fid"));
-  box.write("m", std::string("a\0b", 3));
+  write("m", std::string("a\0b", 3));
   expect({"sign", "k", "-i", "m"}, REFUSED, "UTF-8 text without zero bytes");
 
-  expect({"generate", "rsa", "-o", "signer", "--padding", "pkcs1-sign"}, DONE, "");
-  expect({"export", "signer", "-o", "signer.pub"}, DONE, "");
-  generated("other", {"--export-sign", "key=signer"});
-  expect({"soter", "export", "other", "-o", "o"}, DONE, "");
+  expect_done({"generate", "rsa", "-o", "signer", "--padding", "pkcs1-sign"});
+  expect_done({"export", "signer", "-o", "signer.pub"});
+  expect_done(generate, {"-o", "other", "--export-sign", "key=signer"});
+  expect_done({"soter", "export", "other", "-o", "o"});
   expect({"soter", "verify", "o", "o.sig", "--key", "signer.pub"}, DONE, "{\"pub_key\":");
-  generated("mute", {"--export-sign", "none"});
+  expect_done(generate, {"-o", "mute", "--export-sign", "none"});
   expect({"soter", "export", "mute"}, REFUSED, "--export-sign");
 }
 
 TEST_F(KmtoolSoter, WrongUsageExitsWithTwo) {
   openssl("genpkey -algorithm RSA -pkeyopt rsa_keygen_bits:1024 -out small");
-  expect({"generate", "hmac", "-o", "h"}, DONE, "");
-  expect({"generate", "rsa", "--soter", "-o", "k"}, DONE, "");
-  const struct {
-    words arguments;
-    const char* message;
-  } rows[] = {
+  expect_done({"generate", "hmac", "-o", "h"});
+  expect_done({"generate", "rsa", "--soter", "-o", "k"});
+  const std::vector<failing_call> calls = {
       {{"--device", "x", "device", "create", "--attk", "small"}, "2048 bits"},
       {{"--device", "x", "device", "create", "--attk", "m"}, "no RSA private key"},
       {{"--device", "x", "device", "create", "--cpu-id", std::string(65, 'c')}, "1 to 64"},
@@ -142,10 +103,7 @@ TEST_F(KmtoolSoter, WrongUsageExitsWithTwo) {
       {{"soter", "verify", "m", "m", "--key", "m"}, "no RSA public key"},
       {{"soter", "verify", "m", "m", "--key", "attk.pub", "--digest", "none"}, "--digest"},
   };
-  const words before = box.files();
-  for (const auto& row : rows)
-    expect(row.arguments, WRONG_USAGE, row.message);
-  EXPECT_EQ(box.files(), before);
+  expect_all(WRONG_USAGE, calls);
 }
 
 }  // namespace
