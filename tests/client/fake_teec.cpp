@@ -44,6 +44,10 @@ void set_handler(handler answers) {
   current = std::move(answers);
 }
 
+void answer_with(const answer& reply) {
+  set_handler([reply](const request&) { return reply; });
+}
+
 }  // namespace fake_teec
 
 using fake_teec::current;

@@ -34,5 +34,7 @@ using handler = std::function<answer(const request&)>;
 // Every request since the handler was set.
 extern std::vector<request> requests;
 void set_handler(handler answers);
+// answer_with: the same to every request.
+void answer_with(const answer& reply);
 
 }  // namespace fake_teec

@@ -1,25 +1,22 @@
-// What the client sends, and what it makes of good, failed and hostile answers.
+// What the client sends, and what it makes of good, failed and hostile answers and of the documents
+// in them.
 #include "client/session.h"
 
 #include <gtest/gtest.h>
 
 #include "client/operation.h"
+#include "client/soter.h"
 #include "fake_teec.h"
 
 namespace keymaster::client {
 namespace {
 
 using fake_teec::answer;
+using fake_teec::answer_with;
 using fake_teec::request;
 using fake_teec::requests;
 
 const bytes BLOB = {0xb1, 0x0b};
-constexpr char EMPTY_SET[] = "00000000";
-constexpr char MALFORMED_SET[] = "01000000";
-
-void answer_with(const answer& reply) {
-  fake_teec::set_handler([reply](const request&) { return reply; });
-}
 
 class Session : public testing::Test {
  protected:
@@ -46,38 +43,28 @@ TEST_F(Session, TellsTheKeymasterErrorFromAnUntouchedSlot) {
 }
 
 TEST_F(Session, RefusesMalformedAnswers) {
+  const auto import = [&] { return keymaster.import_key({}, BLOB); };
+  const auto finish = [&] { return keymaster.finish(1); };
   struct {
     const char* what;
     answer reply;
     std::function<status()> send;
   } cases[] = {
-      {"a size beyond the capacity", {.output_size = 1 << 20}, [&] { return keymaster.finish(1); }},
       {"an empty blob", {}, [&] { return keymaster.generate_key({}); }},
-      {"import: a field too long",
-       {.output = {9, 0, 0, 0}},
-       [&] { return keymaster.import_key({}, BLOB); }},
-      {"import: characteristics missing",
-       {.output = from_hex("02000000b10b")},
-       [&] { return keymaster.import_key({}, BLOB); }},
-      {"finish: bytes left over",
-       {.output = from_hex("00000000040000000000000000")},
-       [&] { return keymaster.finish(1); }},
-      {"finish: no set",
-       {.output = from_hex("0000000000000000")},
-       [&] { return keymaster.finish(1); }},
-      {"characteristics: absurd size",
-       {.b = 0xFFFFFFFF},
-       [&] { return keymaster.get_key_characteristics(BLOB); }},
-      {"update: more consumed than given", {.b = 3}, [&] { return keymaster.update(1, BLOB); }},
-      {"begin: no set",
-       {.b = 7, .output = from_hex(MALFORMED_SET)},
+      {"a field too long", {.output = {9, 0, 0, 0}}, import},
+      {"characteristics missing", {.output = from_hex("02000000b10b")}, import},
+      {"a size beyond the capacity", {.output_size = 1 << 20}, finish},
+      {"bytes left over", {.output = from_hex("00000000040000000000000000")}, finish},
+      {"no set to finish", {.output = from_hex("0000000000000000")}, finish},
+      {"absurd size", {.b = ~0u}, [&] { return keymaster.get_key_characteristics(BLOB); }},
+      {"more consumed than given", {.b = 3}, [&] { return keymaster.update(1, BLOB); }},
+      {"a malformed set",
+       {.b = 7, .output = from_hex("01000000")},
        [&] { return keymaster.begin(2, BLOB, {}); }},
   };
   for (const auto& c : cases) {
     answer_with(c.reply);
-    status result = c.send();
-    EXPECT_EQ(result.tee, TEEC_ERROR_BAD_FORMAT) << c.what;
-    EXPECT_EQ(result.origin, uint32_t{TEEC_ORIGIN_API}) << c.what;
+    EXPECT_EQ(c.send().text(), status({TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API}).text()) << c.what;
   }
   // The last one had begun in the TA: the handle goes back.
   EXPECT_EQ(requests.back().command, 23u);
@@ -93,21 +80,18 @@ TEST_F(Session, GrowsOutputsOnlyWhereNothingHappensTwice) {
   EXPECT_EQ(keymaster.generate_key({}).blob.size(), 100'000u);
   EXPECT_EQ(requests.size(), 2u);
 
-  for (int i = 0; i < 3; ++i) {
-    answer_with({.result = TEEC_ERROR_SHORT_BUFFER, .output_size = 100'000});
-    status result = i == 0   ? status(keymaster.begin(2, BLOB, {}))
-                    : i == 1 ? status(keymaster.update(1, BLOB))
-                             : status(keymaster.finish(1));
-    EXPECT_EQ(result.tee, TEEC_ERROR_SHORT_BUFFER);
-    EXPECT_EQ(requests.size(), 1u);
-  }
+  answer_with({.result = TEEC_ERROR_SHORT_BUFFER, .output_size = 100'000});
+  EXPECT_EQ(keymaster.begin(2, BLOB, {}).tee, TEEC_ERROR_SHORT_BUFFER);
+  EXPECT_EQ(keymaster.update(1, BLOB).tee, TEEC_ERROR_SHORT_BUFFER);
+  EXPECT_EQ(keymaster.finish(1).tee, TEEC_ERROR_SHORT_BUFFER);
+  EXPECT_EQ(requests.size(), 3u);
   answer_with({.result = TEEC_ERROR_SHORT_BUFFER, .output_size = 0});
   EXPECT_EQ(keymaster.export_key(BLOB).tee, TEEC_ERROR_SHORT_BUFFER);  // and comes to an end
 }
 
 TEST_F(Session, OperationFeedsAllAndAbortsWhatIsNotFinished) {
   fake_teec::set_handler([](const request& sent) {
-    if (sent.command == 16) return answer{.b = 3, .output = from_hex(EMPTY_SET)};
+    if (sent.command == 16) return answer{.b = 3, .output = bytes(4)};
     return answer{.b = 2, .output = {'x'}};  // takes two bytes, puts out one
   });
   bytes output;
@@ -129,6 +113,56 @@ TEST_F(Session, OperationFeedsAllAndAbortsWhatIsNotFinished) {
   answer_with({});  // consumes nothing, for ever
   operation stuck(&keymaster, {});
   EXPECT_EQ(stuck.update(BLOB, &output).tee, TEEC_ERROR_BAD_FORMAT);
+}
+
+class Soter : public Session {
+ protected:
+  soter commands{&keymaster};
+};
+
+TEST_F(Soter, ReadsOutputsAndRefusesMalformedOnes) {
+  const struct {
+    answer reply;
+    status expected;
+    bool unavailable;
+  } rows[] = {
+      {{.output = {'P', 0}}, {}, false},
+      {{.a = -1}, {TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, -1}, true},
+      {{.a = -1000}, {TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, -1000}, false},
+      {{.output = {'P'}}, {TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API}, false},
+      {{.output = {}}, {TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API}, false},
+      {{.output_size = 1 << 20}, {TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API}, false},
+  };
+  for (const auto& row : rows) {
+    answer_with(row.reply);
+    const soter_result exported = commands.export_attk();
+    EXPECT_EQ(exported.text(), row.expected.text());
+    EXPECT_EQ(exported.unavailable, row.unavailable);
+    EXPECT_EQ(exported.data, row.expected.ok() ? bytes{'P'} : bytes{});
+    EXPECT_EQ(requests[0].types, 0x602u);
+  }
+}
+
+TEST_F(Soter, AsksAgainWithMoreRoomUntilThatIsAbsurd) {
+  fake_teec::set_handler([](const request& sent) {
+    const bytes id(10'000, 'd');
+    return sent.capacity < id.size() ? answer{.a = -29} : answer{.output = id};
+  });
+  EXPECT_EQ(commands.device_id().data.size(), 10'000u);
+  EXPECT_EQ(requests.size(), 3u);
+  answer_with({.a = -29});
+  EXPECT_EQ(commands.device_id().error, KM_ERROR_INSUFFICIENT_BUFFER_SPACE);
+}
+
+TEST(SignedDocument, IsTakenApartOrRefused) {
+  const signed_document good = parse_signed_document(from_hex("030000007b7d00aabb"));
+  EXPECT_EQ(good.text(), "{}");
+  EXPECT_EQ(to_hex(good.document), "7b7d00");
+  EXPECT_EQ(to_hex(good.signature), "aabb");
+  for (const char* bad : {"", "03000000", "040000007b7d00", "ffffffff7b7d00aa", "030000007b7d00",
+                          "020000007b7daabb", "00000000aabb"}) {
+    EXPECT_THROW(parse_signed_document(from_hex(bad)), format_error) << bad;
+  }
 }
 
 }  // namespace
