@@ -4,8 +4,12 @@
 namespace keymaster::test {
 namespace {
 
-request make(command id, bytes input, size_t capacity = 0) {
-  return {.id = static_cast<uint32_t>(id), .input = std::move(input), .capacity = capacity};
+request make(command id, bytes input, size_t capacity = 0, uint32_t a = 0) {
+  return {.id = static_cast<uint32_t>(id), .a = a, .input = std::move(input), .capacity = capacity};
+}
+
+bytes two_fields(byte_view first, byte_view second) {
+  return client::field_writer().field(first).field(second).take();
 }
 
 }  // namespace
@@ -29,46 +33,35 @@ request key_request(command id, byte_view blob, const client::application& app, 
 }
 
 request upgrade_request(byte_view blob, const param_set& params, size_t capacity) {
-  return make(command::UPGRADE_KEY,
-              client::field_writer().field(params.marshal()).field(blob).take(), capacity);
+  return make(command::UPGRADE_KEY, two_fields(params.marshal(), blob), capacity);
 }
 
 request begin_request(uint32_t purpose, byte_view blob, const param_set& params, size_t capacity) {
-  request what = make(command::BEGIN,
-                      client::field_writer().field(blob).field(params.marshal()).take(), capacity);
-  what.a = purpose;
-  return what;
+  return make(command::BEGIN, two_fields(blob, params.marshal()), capacity, purpose);
 }
 
 request step_request(command id, uint32_t handle, byte_view input, const param_set& params,
                      size_t capacity) {
-  request what =
-      make(id, client::field_writer().field(input).field(params.marshal()).take(), capacity);
-  what.a = handle;
-  return what;
+  return make(id, two_fields(input, params.marshal()), capacity, handle);
 }
 
 request abort_request(uint32_t handle) {
-  request what = make(command::ABORT, {});
-  what.a = handle;
-  return what;
+  return make(command::ABORT, {}, 0, handle);
 }
 
 request attest_request(byte_view blob, const param_set& params, size_t capacity) {
-  return make(command::ATTEST_KEY,
-              client::field_writer().field(blob).field(params.marshal()).take(), capacity);
+  return make(command::ATTEST_KEY, two_fields(blob, params.marshal()), capacity);
 }
 
 reply ta_under_test::configure(uint32_t os_version, uint32_t os_patchlevel) {
-  param_set params;
-  params.add(KM_TAG_OS_VERSION, os_version).add(KM_TAG_OS_PATCHLEVEL, os_patchlevel);
-  return send(configure_request(params));
+  return send(configure_request(
+      param_set().add(KM_TAG_OS_VERSION, os_version).add(KM_TAG_OS_PATCHLEVEL, os_patchlevel)));
 }
 
 bytes ta_under_test::generate(const param_set& description) {
   const reply answer = send(generate_request(description));
   EXPECT_TRUE(succeeded(answer)) << trace_.errors();
-  return {answer.output().begin(), answer.output().end()};
+  return client::copy_of(answer.output());
 }
 
 bytes ta_under_test::import(const param_set& description, byte_view key_data) {
@@ -103,10 +96,6 @@ reply ta_under_test::finish(uint32_t handle, byte_view input, const param_set& p
   return send(step_request(command::FINISH, handle, input, params));
 }
 
-reply ta_under_test::abort(uint32_t handle) {
-  return send(abort_request(handle));
-}
-
 reply ta_under_test::upgrade(byte_view blob, const param_set& params) {
   return send(upgrade_request(blob, params));
 }
@@ -117,12 +106,12 @@ bytes ta_under_test::run(uint32_t purpose, byte_view blob, const param_set& para
   const reply updated = update(handle, input);
   EXPECT_TRUE(succeeded(updated)) << trace_.errors();
   EXPECT_EQ(updated.b, input.size());
-  bytes output(updated.output().begin(), updated.output().end());
+  bytes output = client::copy_of(updated.output());
   const reply finished = finish(handle);
   EXPECT_TRUE(succeeded(finished)) << trace_.errors();
   client::finish_result rest;
   if (finished.ok()) client::parse_finished(finished.output(), &rest);
-  output.insert(output.end(), rest.output.begin(), rest.output.end());
+  client::append(&output, rest.output);
   return output;
 }
 

@@ -9,6 +9,7 @@
 #include "tee_extensions.h"
 
 #include <cstdint>
+#include <functional>
 #include <gtest/gtest.h>
 #include <map>
 #include <memory>
@@ -118,6 +119,11 @@ class ta_under_test {
   // send: one command, with the checks that this file begins with.
   reply send(const request& what);
 
+  // fail_each_call: sends what `make` gives with the n-th platform call failing, n = 1, 2, ...,
+  // until a command comes to its end without. `check` sees each answer, and whether a call failed.
+  void fail_each_call(TEE_Result fault, const std::function<request()>& make,
+                      const std::function<void(const reply& answer, bool fired)>& check);
+
   // Commands with their usual arguments. generate and import expect success and return the blob.
   reply configure(uint32_t os_version, uint32_t os_patchlevel);
   bytes generate(const param_set& description);
@@ -129,7 +135,7 @@ class ta_under_test {
   uint32_t begun(uint32_t purpose, byte_view blob, const param_set& params = {});
   reply update(uint32_t handle, byte_view input, const param_set& params = {});
   reply finish(uint32_t handle, byte_view input = {}, const param_set& params = {});
-  reply abort(uint32_t handle);
+  reply abort(uint32_t handle) { return send(abort_request(handle)); }
   reply upgrade(byte_view blob, const param_set& params = {});
   // begin, update and finish of a use that must succeed; returns the output of both.
   bytes run(uint32_t purpose, byte_view blob, const param_set& params, byte_view input);

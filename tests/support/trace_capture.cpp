@@ -38,18 +38,12 @@ trace_capture::~trace_capture() {
 void trace_capture::take(void* self, uint32_t level, const char* line, size_t length) {
   auto* capture = static_cast<trace_capture*>(self);
   capture->lines_.push_back(shorten({line, length}));
-  if (level == TEE_TRACE_ERROR) capture->errors_.push_back(capture->lines_.back());
+  if (level != TEE_TRACE_ERROR) return;
+  capture->errors_ += (capture->errors_.empty() ? "" : " | ") + capture->lines_.back();
 }
 
 bool trace_capture::has(std::string_view line) const {
   return std::ranges::find(lines_, line) != lines_.end();
-}
-
-std::string trace_capture::errors() const {
-  std::string joined;
-  for (const std::string& line : errors_)
-    joined += (joined.empty() ? "" : " | ") + line;
-  return joined;
 }
 
 void trace_capture::clear() {

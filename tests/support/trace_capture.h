@@ -21,7 +21,7 @@ class trace_capture {
   bool has(std::string_view line) const;
 
   // errors: the lines of level 1, each "function: message", joined with " | ".
-  std::string errors() const;
+  const std::string& errors() const { return errors_; }
 
   void clear();
 
@@ -29,7 +29,7 @@ class trace_capture {
   static void take(void* self, uint32_t level, const char* line, size_t length);
 
   std::vector<std::string> lines_;
-  std::vector<std::string> errors_;
+  std::string errors_;
 };
 
 }  // namespace keymaster::test
