@@ -1,9 +1,7 @@
 // Attestation through the command interface, read back and verified with libcrypto.
 #include <algorithm>
-#include <cstring>
 #include <gtest/gtest.h>
 #include <memory>
-#include <openssl/evp.h>
 #include <openssl/x509.h>
 #include <openssl/x509v3.h>
 #include <string>
@@ -19,24 +17,14 @@ using namespace std::string_literals;
 constexpr size_t STORED_SIZE = 783;
 constexpr char KEY_DESCRIPTION[] = "1.3.6.1.4.1.11129.2.1.17";
 
-struct deleter {
-  void operator()(X509* certificate) const { X509_free(certificate); }
-  void operator()(EVP_PKEY* key) const { EVP_PKEY_free(key); }
-};
-using certificate = std::unique_ptr<X509, deleter>;
+using certificate = std::unique_ptr<X509, decltype(&X509_free)>;
 
 certificate parse(byte_view der) {
   const unsigned char* next = der.data();
-  certificate parsed(d2i_X509(nullptr, &next, static_cast<long>(der.size())));
+  certificate parsed(d2i_X509(nullptr, &next, static_cast<long>(der.size())), X509_free);
   EXPECT_TRUE(parsed);
   EXPECT_EQ(next, der.data() + der.size());
   return parsed;
-}
-
-uint32_t load_u32(byte_view bytes) {
-  uint32_t value = 0;
-  memcpy(&value, bytes.data(), sizeof(value));
-  return value;
 }
 
 // Whether the bytes are values in DER (X.690, 10): each in the one form that it may have. The order
@@ -68,35 +56,29 @@ bool is_der(byte_view in) {
 // The two certificates of a chain; its lengths must cover it exactly.
 std::vector<certificate> parse_chain(byte_view chain) {
   std::vector<certificate> links;
-  while (chain.size() >= 4) {
-    const uint32_t length = load_u32(chain);
-    EXPECT_LE(length, chain.size() - 4);
-    EXPECT_TRUE(is_der(chain.subspan(4, length)));
-    links.push_back(parse(chain.subspan(4, length)));
-    chain = chain.subspan(4 + length);
+  client::field_reader reader(chain);
+  while (reader.left() > 0) {
+    const byte_view der = reader.field();
+    EXPECT_TRUE(is_der(der));
+    links.push_back(parse(der));
   }
-  EXPECT_TRUE(chain.empty());
   return links;
 }
 
-param_set ec_description() {
-  return one(KM_TAG_ALGORITHM, KM_ALGORITHM_EC)
-      .add(KM_TAG_KEY_SIZE, 256)
-      .add(KM_TAG_PURPOSE, KM_PURPOSE_SIGN)
-      .add(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256)
-      .add_flag(KM_TAG_NO_AUTH_REQUIRED);
-}
+const param_set EC_256_KEY = one(KM_TAG_ALGORITHM, KM_ALGORITHM_EC)
+                                 .add(KM_TAG_KEY_SIZE, 256)
+                                 .add(KM_TAG_PURPOSE, KM_PURPOSE_SIGN)
+                                 .add(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256)
+                                 .add_flag(KM_TAG_NO_AUTH_REQUIRED);
 
-param_set rsa_description() {
-  return one(KM_TAG_ALGORITHM, KM_ALGORITHM_RSA)
-      .add(KM_TAG_KEY_SIZE, 1024)
-      .add(KM_TAG_RSA_PUBLIC_EXPONENT, 65537)
-      .add(KM_TAG_PURPOSE, KM_PURPOSE_SIGN)
-      .add(KM_TAG_PURPOSE, KM_PURPOSE_ENCRYPT)
-      .add(KM_TAG_ACTIVE_DATETIME, 1'000'000'000'999)
-      .add(KM_TAG_USAGE_EXPIRE_DATETIME, 1'900'000'000'000)
-      .add_flag(KM_TAG_NO_AUTH_REQUIRED);
-}
+const param_set RSA_KEY =
+    one(KM_TAG_ALGORITHM, KM_ALGORITHM_RSA)
+        .add(KM_TAG_KEY_SIZE, 1024)
+        .add(KM_TAG_RSA_PUBLIC_EXPONENT, 65537)
+        .append(several(KM_TAG_PURPOSE, {KM_PURPOSE_SIGN, KM_PURPOSE_ENCRYPT}))
+        .add(KM_TAG_ACTIVE_DATETIME, 1'000'000'000'999)
+        .add(KM_TAG_USAGE_EXPIRE_DATETIME, 1'900'000'000'000)
+        .add_flag(KM_TAG_NO_AUTH_REQUIRED);
 
 std::string text_of(const ASN1_STRING* string) {
   return std::string(reinterpret_cast<const char*>(ASN1_STRING_get0_data(string)),
@@ -108,15 +90,14 @@ std::string common_name(const X509_NAME* name) {
   return text_of(X509_NAME_ENTRY_get_data(X509_NAME_get_entry(name, 0)));
 }
 
-// The content octets of extension `id` of a certificate, in hex.
+// The content octets of extension `id` of a certificate.
 bytes extension_value(const certificate& from, const char* id) {
   const std::unique_ptr<ASN1_OBJECT, decltype(&ASN1_OBJECT_free)> object(OBJ_txt2obj(id, 1),
                                                                          ASN1_OBJECT_free);
   const int index = X509_get_ext_by_OBJ(from.get(), object.get(), -1);
   if (index < 0) return {};
-  const ASN1_OCTET_STRING* value = X509_EXTENSION_get_data(X509_get_ext(from.get(), index));
-  const unsigned char* data = ASN1_STRING_get0_data(value);
-  return bytes(data, data + ASN1_STRING_length(value));
+  const auto* value = X509_EXTENSION_get_data(X509_get_ext(from.get(), index));
+  return client::copy_of(client::as_bytes(text_of(value)));
 }
 
 TEST(Attestation, ChainsVerifyForRsaAndEc) {
@@ -128,17 +109,14 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     param_set params;
     const char* not_before;
     const char* not_after;
-    bytes key_usage;
+    uint8_t key_usage;
   } cases[] = {
-      {ec_description(), {}, "700101000000Z", "060207062815Z", {3, 2, 0, 0x80}},
+      {EC_256_KEY, {}, "700101000000Z", "060207062815Z", 0x80},
       // The algorithm that is asked for chooses no other key.
-      {without(rsa_description(), KM_TAG_PURPOSE).add(KM_TAG_PURPOSE, KM_PURPOSE_DECRYPT),
-       one(KM_TAG_ALGORITHM, KM_ALGORITHM_EC),
-       "010909014640Z",
-       "700219170247Z",
-       {3, 2, 0, 0x30}},
+      {without(RSA_KEY, KM_TAG_PURPOSE).add(KM_TAG_PURPOSE, KM_PURPOSE_DECRYPT),
+       one(KM_TAG_ALGORITHM, KM_ALGORITHM_EC), "010909014640Z", "700219170247Z", 0x30},
       // The expiry is cut to 32 bits of milliseconds before it becomes seconds.
-      {rsa_description(), {}, "010909014640Z", "700219170247Z", {3, 2, 0, 0xB0}},
+      {RSA_KEY, {}, "010909014640Z", "700219170247Z", 0xB0},
   };
   for (const auto& row : cases) {
     const bytes blob = ta.generate(row.description);
@@ -156,36 +134,28 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     EXPECT_EQ(ASN1_INTEGER_get(X509_get0_serialNumber(chain[0].get())), 1);
     EXPECT_EQ(text_of(X509_get0_notBefore(chain[0].get())), row.not_before);
     EXPECT_EQ(text_of(X509_get0_notAfter(chain[0].get())), row.not_after);
-    EXPECT_EQ(extension_value(chain[0], "2.5.29.15"), row.key_usage);
+    EXPECT_EQ(extension_value(chain[0], "2.5.29.15"), (bytes{3, 2, 0, row.key_usage}));
     const bytes description = extension_value(chain[0], KEY_DESCRIPTION);
-    EXPECT_FALSE(description.empty());
-    EXPECT_TRUE(is_der(description));
+    EXPECT_TRUE(!description.empty() && is_der(description));
     EXPECT_EQ(common_name(X509_get_subject_name(chain[0].get())), "A Keymaster Key\0"s);
     EXPECT_EQ(common_name(X509_get_issuer_name(chain[0].get())).size(), 18u);
     EXPECT_EQ(X509_get_signature_nid(chain[0].get()), NID_sha256WithRSAEncryption);
+    if (row.description.number(KM_TAG_ALGORITHM) == KM_ALGORITHM_EC) continue;
+    bytes subject(1024);
+    uint8_t* end = subject.data();
+    subject.resize(static_cast<size_t>(i2d_PUBKEY(X509_get0_pubkey(chain[0].get()), &end)));
+    EXPECT_EQ(subject, client::copy_of(ta.send(key_request(command::EXPORT_KEY, blob)).output()));
   }
-}
-
-TEST(Attestation, SubjectKeyIsTheExportedKey) {
-  ta_under_test ta;
-  const bytes blob = ta.generate(rsa_description());
-  const std::vector<certificate> chain = parse_chain(ta.send(attest_request(blob)).output());
-  const reply exported = ta.send(key_request(command::EXPORT_KEY, blob));
-  ASSERT_TRUE(succeeded(exported));
-  const unsigned char* next = exported.output().data();
-  const std::unique_ptr<EVP_PKEY, deleter> key(
-      d2i_PUBKEY(nullptr, &next, static_cast<long>(exported.output_size)));
-  EXPECT_EQ(EVP_PKEY_eq(key.get(), X509_get0_pubkey(chain.at(0).get())), 1);
 }
 
 // A length, a new certificate or the stored one that does not fit, and room for all; the sizes
 // between are the sweep's.
 TEST(Attestation, Capacities) {
   ta_under_test ta;
-  const bytes blob = ta.generate(ec_description());
+  const bytes blob = ta.generate(EC_256_KEY);
   const reply whole = ta.send(attest_request(blob));
   ASSERT_TRUE(succeeded(whole));
-  const size_t first = 4 + load_u32(whole.output());
+  const size_t first = 4 + client::field_reader(whole.output()).u32();
   ASSERT_EQ(whole.output_size, first + 4 + STORED_SIZE);
   const struct {
     size_t capacity;
@@ -219,11 +189,11 @@ TEST(Attestation, Refusals) {
   ta_under_test ta;
   EXPECT_TRUE(
       refused(ta.send(attest_request(ta.generate(hmac_key(256)))), KM_ERROR_UNSUPPORTED_ALGORITHM));
-  const bytes blob = ta.generate(ec_description());
+  const bytes blob = ta.generate(EC_256_KEY);
   const auto challenge = param_set().add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes(129));
   EXPECT_TRUE(refused(ta.send(attest_request(blob, challenge)), KM_ERROR_INVALID_INPUT_LENGTH));
   EXPECT_TRUE(refused(ta.send(attest_request(bytes{1})), KM_ERROR_KEY_REQUIRES_UPGRADE));
-  const bytes unique = ta.generate(ec_description().add_flag(KM_TAG_INCLUDE_UNIQUE_ID));
+  const bytes unique = ta.generate(param_set(EC_256_KEY).add_flag(KM_TAG_INCLUDE_UNIQUE_ID));
   EXPECT_TRUE(refused(ta.send(attest_request(unique)), KM_ERROR_UNIMPLEMENTED));
   request no_set = attest_request(blob);
   no_set.input[4 + blob.size() + 4] = 3;  // announces parameters that are not there
@@ -236,7 +206,8 @@ TEST(Attestation, OfLongDescriptions) {
   ta_under_test ta;
   for (const size_t size : {1100u, 2500u}) {
     const bytes application(size, 'x');
-    const bytes blob = ta.generate(ec_description().add_bytes(KM_TAG_APPLICATION_ID, application));
+    const bytes blob =
+        ta.generate(param_set(EC_256_KEY).add_bytes(KM_TAG_APPLICATION_ID, application));
     const reply answer = ta.send(attest_request(blob));
     ASSERT_TRUE(succeeded(answer)) << ta.trace().errors();
     const std::vector<certificate> chain = parse_chain(answer.output());
