@@ -18,26 +18,23 @@ const tee::object_name COUNTER_OBJECT = {TEE_STORAGE_PRIVATE,
 class Counter : public soter_device {
  protected:
   Counter()
-      : blob(ta.import(
-            soter_key(param_set().add_flag(KM_TAG_SOTER_ATTK_SIGNS).add_flag(KM_TAG_SOTER_COUNTER)),
-            pkey::rsa(1024).import_data())) {}
+      : blob(ta.import(soter_key(one(KM_TAG_SOTER_ATTK_SIGNS, 1).add_flag(KM_TAG_SOTER_COUNTER)),
+                       pkey::rsa(1024).import_data())) {}
 
   // Of the next document; 0 when there is none.
   uint64_t next() {
     ta.expect_loading();
     const reply answer = ta.send(key_request(command::EXPORT_KEY, blob));
     EXPECT_TRUE(succeeded(answer));
-    const std::string text(answer.buffer.begin(), answer.buffer.begin() + answer.output_size);
-    const std::string member = R"({"counter":)";
-    const size_t at = text.find(member);
-    return at == std::string::npos ? 0 : std::stoull(text.substr(at + member.size()));
+    if (answer.output_size == 0) return 0;
+    const std::string text(client::parse_signed_document(answer.output()).text());
+    EXPECT_TRUE(text.starts_with(R"({"counter":)"));
+    return std::stoull(text.substr(11));
   }
   // What the stored object holds; the device must be stopped.
   bytes stored() {
     const auto found = tee::device::open(ta.path())->objects().load(COUNTER_OBJECT);
-    if (!found) return {};
-    const auto object = tee::decode(*found);
-    return {object->data.begin(), object->data.end()};
+    return client::copy_of(tee::decode(found.value())->data);
   }
   void store(const bytes& content) {
     tee::stored_object object;

@@ -18,13 +18,12 @@ inline const pkey& attk() {
 }
 
 inline client::factory_data factory() {
-  client::factory_data data;
-  data.attk = client::read_rsa_numbers(attk().import_data());
-  data.fingerprint_name = "s";
-  data.fingerprint_version = "2";
-  data.cpu_id = "c";
-  data.device_id = "0123456789abcdef";
-  return data;
+  return {.attk = client::read_rsa_numbers(attk().import_data()),
+          .fingerprint_name = "s",
+          .fingerprint_version = "2",
+          .cpu_id = "c",
+          .device_id = "0123456789abcdef",
+          .ta_data = {}};
 }
 
 // The SOTER commands; their error codes are in slot 0.
@@ -33,11 +32,11 @@ inline request soter_request(uint32_t id, size_t capacity = AMPLE) {
 }
 
 // A SOTER key for `digest` and `padding`, with more tags; and what begin with it asks for.
-inline param_set soter_use(scheme how = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA_2_256}) {
+constexpr scheme PKCS1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA_2_256};
+inline param_set soter_use(scheme how = PKCS1) {
   return one(KM_TAG_PADDING, how.padding).add(KM_TAG_DIGEST, how.digest);
 }
-inline param_set soter_key(const param_set& more = {},
-                           scheme how = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA_2_256}) {
+inline param_set soter_key(const param_set& more = {}, scheme how = PKCS1) {
   return one(KM_TAG_ALGORITHM, KM_ALGORITHM_RSA)
       .add(KM_TAG_PURPOSE, KM_PURPOSE_SIGN)
       .append(soter_use(how))
