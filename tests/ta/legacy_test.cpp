@@ -10,8 +10,6 @@
 namespace keymaster::test {
 namespace {
 
-constexpr TEEC_UUID EARLIER = EARLIER_KEYMASTER_TA_UUID;
-constexpr uint32_t OPEN_BLOB = 27;
 constexpr uint32_t MAKE_BLOB = 100;
 constexpr size_t BLOB_OVERHEAD = 32;
 
@@ -27,28 +25,30 @@ class Legacy : public testing::Test {
     plaintext = blob_plaintext(material, set);
   }
 
-  // Both sides of the earlier TA: the factory's, and what it says to the normal world.
-  TEEC_Result call_earlier(uint32_t command, bytes input, bytes* output) {
-    client::connection earlier(client::context(ta.path()), EARLIER);
-    client::parameter_slots slots{};
-    slots[0].tmpref = {input.data(), input.size()};
-    slots[1].tmpref = {output->data(), output->size()};
-    const uint32_t types = command == MAKE_BLOB ? TEEC_PARAM_TYPES(TEEC_MEMREF_TEMP_INPUT,
-                                                                   TEEC_MEMREF_TEMP_OUTPUT, 0, 0)
-                                                : TEEC_PARAM_TYPES(TEEC_MEMREF_TEMP_INOUT, 0, 0, 0);
-    return earlier.invoke(command, types, &slots).tee;
+  ~Legacy() override { unsetenv("TEE_TA_PATH"); }
+
+  // A new instance, with trusted applications from these folders.
+  void restart_with(const std::string& folders) {
+    setenv("TEE_TA_PATH", folders.c_str(), 1);
+    ta.restart();
   }
-  bytes legacy_blob(const bytes& content) {
+  // A blob as the factory made them with the earlier TA.
+  bytes legacy_blob(bytes content) {
+    client::connection earlier(client::context(ta.path()), EARLIER_KEYMASTER_TA_UUID);
     bytes blob(content.size() + BLOB_OVERHEAD);
-    EXPECT_EQ(call_earlier(MAKE_BLOB, content, &blob), TEEC_SUCCESS);
+    client::parameter_slots slots{};
+    slots[0].tmpref = {content.data(), content.size()};
+    slots[1].tmpref = {blob.data(), blob.size()};
+    const uint32_t types = TEEC_PARAM_TYPES(TEEC_MEMREF_TEMP_INPUT, TEEC_MEMREF_TEMP_OUTPUT, 0, 0);
+    EXPECT_TRUE(earlier.invoke(MAKE_BLOB, types, &slots).ok());
     return blob;
   }
   // Refused with both results, nothing put out.
-  void expect_refused(byte_view blob, TEEC_Result res, int32_t km_error, const std::string& line) {
+  void expect_refused(byte_view blob, TEEC_Result res, const std::string& line) {
     const reply answer = ta.upgrade(blob);
     EXPECT_EQ(answer.res, res) << line;
     if (res == TEEC_SUCCESS) {
-      EXPECT_EQ(answer.km_error, km_error) << line;
+      EXPECT_EQ(answer.km_error, KM_ERROR_INVALID_KEY_BLOB) << line;
     }
     EXPECT_TRUE(ta.trace().has(line)) << line << " is not in: " << ta.trace().errors();
     EXPECT_TRUE(ta.trace().has("upgrade_key: Open V1 key failed")) << ta.trace().errors();
@@ -57,10 +57,9 @@ class Legacy : public testing::Test {
   }
   static bool earlier_is_alive() {
     tee::host::live_counts ignored;
-    return tee::host::counts_of(EARLIER_KEYMASTER, &ignored);
+    return tee::host::counts_of(EARLIER_KEYMASTER_TA_UUID, &ignored);
   }
 
-  static constexpr TEE_UUID EARLIER_KEYMASTER = EARLIER_KEYMASTER_TA_UUID;
   bytes key, material, plaintext;
   const param_set set =
       hmac_key(256).add(KM_TAG_OS_VERSION, 70000).add(KM_TAG_ORIGIN, KM_ORIGIN_GENERATED);
@@ -75,7 +74,7 @@ TEST_F(Legacy, BlobsAreUpgradedAndOpenAsCurrentOnes) {
 
   const reply upgraded = ta.upgrade(old);
   ASSERT_TRUE(succeeded(upgraded)) << ta.trace().errors();
-  const bytes blob(upgraded.output().begin(), upgraded.output().end());
+  const bytes blob = client::copy_of(upgraded.output());
   const param_set found = ta.characteristics(blob);
   EXPECT_EQ(found.number(KM_TAG_OS_VERSION), OS_VERSION);
   EXPECT_EQ(found.number(KM_TAG_OS_PATCHLEVEL), OS_PATCHLEVEL);
@@ -103,31 +102,17 @@ TEST_F(Legacy, BindingAndVersionHoldForOldKeysToo) {
 
 // An unreadable set is -33 here and -38 in a current blob: intended.
 TEST_F(Legacy, PlaintextsThatLieAreRefused) {
-  const auto fields = [](uint32_t k, byte_view first, uint32_t p, byte_view second) {
-    return client::field_writer().u32(k).raw(first).u32(p).raw(second).take();
+  const auto lengths = [&](uint32_t of_key, uint32_t of_set) {
+    return client::field_writer().u32(of_key).raw(material).u32(of_set).raw(set.marshal()).take();
   };
-  const bytes marshalled = set.marshal();
   const auto size = static_cast<uint32_t>(material.size());
-  const struct {
-    bytes content;
-    TEEC_Result res;
-    const char* line;
-  } rows[] = {
-      {{}, TEEC_ERROR_GENERIC, "open_v1_key: Too short input"},
-      {fields(0xFFFFFFFF, material, 4, marshalled), TEEC_ERROR_GENERIC,
-       "open_v1_key: Too short input"},
-      {fields(size, material, static_cast<uint32_t>(marshalled.size()) + 1, marshalled),
-       TEEC_ERROR_GENERIC, "open_v1_key: Too short input"},
-      {fields(size, material, 0xFFFFFFFF, marshalled), TEEC_ERROR_GENERIC,
-       "open_v1_key: Too short input"},
-      {fields(size, material, 0, marshalled), TEEC_SUCCESS, "open_v1_key: Unmarshal failed"},
-      {fields(size, material, 4, bytes(4, 0xFF)), TEEC_SUCCESS, "open_v1_key: Unmarshal failed"},
-  };
-  for (const auto& row : rows)
-    expect_refused(legacy_blob(row.content), row.res, KM_ERROR_INVALID_KEY_BLOB, row.line);
+  const std::string short_input = "open_v1_key: Too short input";
+  expect_refused(legacy_blob(lengths(UINT32_MAX, 4)), TEEC_ERROR_GENERIC, short_input);
+  expect_refused(legacy_blob(lengths(size, UINT32_MAX)), TEEC_ERROR_GENERIC, short_input);
+  expect_refused(legacy_blob(lengths(size, 0)), TEEC_SUCCESS, "open_v1_key: Unmarshal failed");
   for (size_t length = 0; length < plaintext.size(); length++) {
-    EXPECT_FALSE(ta.upgrade(legacy_blob({plaintext.begin(), plaintext.begin() + length})).ok())
-        << length;
+    const bytes cut(plaintext.begin(), plaintext.begin() + length);
+    EXPECT_FALSE(ta.upgrade(legacy_blob(cut)).ok()) << length;
   }
 }
 
@@ -137,27 +122,22 @@ TEST_F(Legacy, CutAndChangedBlobsAreRefused) {
     const bytes cut(old.begin(), old.begin() + i);
     bytes changed = old;
     changed[i] ^= 1;
-    EXPECT_TRUE(failed_with(ta.upgrade(cut),
-                            i < BLOB_OVERHEAD ? TEEC_ERROR_BAD_FORMAT : TEE_ERROR_MAC_INVALID))
-        << i;
-    EXPECT_TRUE(
-        failed_with(ta.upgrade(changed), i < 4 ? TEEC_ERROR_BAD_FORMAT : TEE_ERROR_MAC_INVALID))
-        << i;
+    const auto expected = [i](size_t from) {
+      return i < from ? TEEC_ERROR_BAD_FORMAT : TEE_ERROR_MAC_INVALID;
+    };
+    EXPECT_TRUE(failed_with(ta.upgrade(cut), expected(BLOB_OVERHEAD))) << i;
+    EXPECT_TRUE(failed_with(ta.upgrade(changed), expected(4))) << i;
   }
 }
 
 TEST_F(Legacy, EveryFailedPlatformCallIsReported) {
   const bytes old = legacy_blob(plaintext);
-  bool fired = true;
-  for (uint64_t n = 1; fired; n++) {
-    tee::host::fail_nth_call(n, TEE_ERROR_OUT_OF_MEMORY);
-    const reply answer = ta.upgrade(old);
-    fired = tee::host::fault_fired();
-    tee::host::clear_fault();
-    EXPECT_EQ(answer.ok(), !fired) << n;
-    EXPECT_EQ(answer.buffer == bytes(AMPLE, UNTOUCHED), fired) << n;
-    EXPECT_TRUE(succeeded(ta.upgrade(old))) << n;
-  }
+  const auto upgrade = [&] { return upgrade_request(old); };
+  ta.fail_each_call(TEE_ERROR_OUT_OF_MEMORY, upgrade, [&](const reply& answer, bool fired) {
+    EXPECT_EQ(answer.ok(), !fired);
+    EXPECT_EQ(answer.buffer == bytes(AMPLE, UNTOUCHED), fired);
+    EXPECT_TRUE(succeeded(ta.upgrade(old)));
+  });
 }
 
 TEST_F(Legacy, TheEarlierKeymasterIsAskedForUnknownBlobsAlone) {
@@ -165,57 +145,32 @@ TEST_F(Legacy, TheEarlierKeymasterIsAskedForUnknownBlobsAlone) {
   EXPECT_TRUE(succeeded(ta.upgrade(blob)));
   EXPECT_FALSE(earlier_is_alive());
   blob.back() ^= 1;
-  expect_refused(blob, TEEC_ERROR_ITEM_NOT_FOUND, 0,  // it never made a blob on this device
+  expect_refused(blob, TEEC_ERROR_ITEM_NOT_FOUND,  // it never made a blob on this device
                  "open_v1_key: InvokeTACommand failed with 0xffff0008");
   EXPECT_TRUE(earlier_is_alive());
   legacy_blob(plaintext);
-  expect_refused(blob, TEEC_ERROR_BAD_FORMAT, 0,
+  expect_refused(blob, TEEC_ERROR_BAD_FORMAT,
                  "open_v1_key: InvokeTACommand failed with 0xffff0005");
 }
 
-TEST_F(Legacy, PlaintextsGoToTheKeymasterAlone) {
-  bytes none;
-  EXPECT_EQ(call_earlier(OPEN_BLOB, legacy_blob(plaintext), &none), TEEC_ERROR_ACCESS_DENIED);
-}
-
-// Devices whose trusted applications lie elsewhere.
-class LegacyElsewhere : public Legacy {
- protected:
-  // A new instance, with trusted applications from these folders.
-  void restart_with(const std::string& folders) {
-    setenv("TEE_TA_PATH", folders.c_str(), 1);
-    ta.restart();
-  }
-  ~LegacyElsewhere() override { unsetenv("TEE_TA_PATH"); }
-
+TEST_F(Legacy, WithoutTheEarlierKeymasterItsSessionFails) {
   const std::filesystem::path keymaster_file = KEYMASTER_TA_FILE;
-};
-
-TEST_F(LegacyElsewhere, WithoutTheEarlierKeymasterItsSessionFails) {
   const std::filesystem::path folder = ta.path() + "/ta";
   std::filesystem::create_directory(folder);
   std::filesystem::create_symlink(keymaster_file, folder / keymaster_file.filename());
   restart_with(folder);
-  expect_refused(bytes(200, 1), TEEC_ERROR_ITEM_NOT_FOUND, 0,
+  expect_refused(bytes(200, 1), TEEC_ERROR_ITEM_NOT_FOUND,
                  "open_v1_key: OpenTASession failed with 0xffff0008");
 }
 
-TEST_F(LegacyElsewhere, AnswersThatMisbehaveAreRefused) {
+TEST_F(Legacy, AnswersThatMisbehaveAreRefused) {
   restart_with(TEST_TA_PATH);
-  const struct {
-    uint32_t code;
-    TEEC_Result res;
-    const char* line;
-  } rows[] = {
-      {TEE_SUCCESS, TEEC_ERROR_GENERIC, "open_v1_key: Too long answer"},
-      {TEE_ERROR_SHORT_BUFFER, TEEC_ERROR_SHORT_BUFFER,
-       "open_v1_key: InvokeTACommand failed with 0xffff0010"},
-      {0x12345678, 0x12345678, "open_v1_key: InvokeTACommand failed with 0x12345678"},
+  const auto answered_with = [](uint32_t code) {
+    return client::field_writer().u32(code).raw(bytes(96, 0)).take();
   };
-  for (const auto& row : rows) {
-    expect_refused(client::field_writer().u32(row.code).raw(bytes(96, 0)).take(), row.res, 0,
-                   row.line);
-  }
+  expect_refused(answered_with(TEE_SUCCESS), TEEC_ERROR_GENERIC, "open_v1_key: Too long answer");
+  expect_refused(answered_with(0x12345678), 0x12345678,
+                 "open_v1_key: InvokeTACommand failed with 0x12345678");
 }
 
 }  // namespace

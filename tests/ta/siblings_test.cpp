@@ -7,8 +7,6 @@ namespace keymaster::test {
 namespace {
 
 constexpr TEEC_UUID VAULT = VAULT_TA_UUID;
-constexpr TEEC_UUID FINGERPRINT = FINGERPRINT_TA_UUID;
-constexpr TEEC_UUID EARLIER = EARLIER_KEYMASTER_TA_UUID;
 
 constexpr uint32_t PROVISION = 100;
 constexpr uint32_t IN = TEEC_MEMREF_TEMP_INPUT;
@@ -41,38 +39,35 @@ class Siblings : public testing::Test {
 TEST_F(Siblings, SecretsAreKeptFromTheNormalWorld) {
   EXPECT_EQ(provision(record({8192, 1024, 512, 64, 128})), TEEC_SUCCESS);
   const struct {
-    const TEEC_UUID& application;
+    TEEC_UUID application;
     uint32_t command, types;
     size_t size;
   } rows[] = {
       {VAULT, 2, TEEC_PARAM_TYPES(OUT, TEEC_VALUE_OUTPUT, 0, 0), 8192},
       {VAULT, 5, TEEC_PARAM_TYPES(OUT, TEEC_VALUE_OUTPUT, 0, 0), 8192},
       {VAULT, 12, TEEC_PARAM_TYPES(IN, OUT, 0, 0), 4},
-      {EARLIER, 27, TEEC_MEMREF_TEMP_INOUT, 64},
+      {EARLIER_KEYMASTER_TA_UUID, 27, TEEC_MEMREF_TEMP_INOUT, 64},
   };
   for (const auto& row : rows) {
+    SCOPED_TRACE(row.command);
     EXPECT_EQ(call(row.application, row.command, row.types, bytes(row.size)),
-              TEEC_ERROR_ACCESS_DENIED)
-        << row.command;
-    EXPECT_EQ(call(row.application, row.command, TEEC_VALUE_INPUT), TEEC_ERROR_BAD_PARAMETERS)
-        << row.command;
+              TEEC_ERROR_ACCESS_DENIED);
+    EXPECT_EQ(call(row.application, row.command, TEEC_VALUE_INPUT), TEEC_ERROR_BAD_PARAMETERS);
   }
 }
 
 TEST_F(Siblings, ADeviceIsProvisionedOnceAndWhole) {
   bytes trailing = record({1, 1, 1, 1, 1});
   trailing.push_back(0);
-  const bytes bad[] = {
-      {},
-      record({1, 1, 1, 1}),
-      trailing,
-      record({8193, 0, 0, 0, 0}),
-      record({0, 1025, 0, 0, 0}),
-      record({0, 0, 513, 0, 0}),
-      record({0, 0, 0, 65, 0}),
-      record({0, 0, 0, 0, 129}),
-      bytes(20, 0xFF),
-  };
+  const bytes bad[] = {{},
+                       record({1, 1, 1, 1}),
+                       trailing,
+                       record({8193, 0, 0, 0, 0}),
+                       record({0, 1025, 0, 0, 0}),
+                       record({0, 0, 513, 0, 0}),
+                       record({0, 0, 0, 65, 0}),
+                       record({0, 0, 0, 0, 129}),
+                       bytes(20, 0xFF)};
   for (const bytes& row : bad)
     EXPECT_EQ(provision(row), TEEC_ERROR_BAD_PARAMETERS) << row.size();
 
