@@ -50,7 +50,6 @@ TEST_F(Kmtool, WrongUsageAndUnreadableInputExitWithTwoAndWriteNothing) {
   const std::vector<failing_call> calls = {
       {{}, "no verb"},
       {{"nonsense"}, "nonsense"},
-      {{"device"}, "no verb"},
       {{"device", "create"}, "exists"},
       {{"device", "create", "--id", "not-a-uuid"}, "not a UUID"},
       {{"device", "set", "--os-version", "4294967296"}, "not a number"},
@@ -70,11 +69,9 @@ TEST_F(Kmtool, WrongUsageAndUnreadableInputExitWithTwoAndWriteNothing) {
       {{"generate", "hmac", "-o", "no/folder/x"}, "no/folder/x"},
       {{"generate", "hmac", "-o", "k"}, "--force"},
       {{"--json", "generate", "hmac", "-o", "-"}, "standard output"},
-      {{"import", "hmac", "nowhere", "-o", "x"}, "nowhere"},
       {{"import", "hmac", "empty", "-o", "x"}, "empty"},
       {{"show", "nowhere"}, "nowhere"},
       {{"show", "."}, "directory"},
-      {{"sign", "k", "-i", "nowhere"}, "nowhere"},
       {{"sign", "k", "-i", "m", "--authenticate", "me"}, "USER_ID"},
       {{"sign", "k", "-i", "m", "-o", "device"}, "folder"},
       {{"sign", "k", "-i", "m", "-o", "/dev/full"}, "No space"},
@@ -171,27 +168,23 @@ TEST_F(Kmtool, TeeFailuresExitWithThree) {
 }
 
 TEST_F(Kmtool, DescribesKeys) {
-  const std::pair<words, json> cases[] = {
+  const std::pair<words, const char*> cases[] = {
       {{},
-       {{"key_size", 256},
-        {"digest", {"sha256"}},
-        {"min_mac_length", 128},
-        {"purpose", {"sign", "verify"}},
-        {"no_auth_required", true}}},
+       R"({"key_size": 256, "digest": ["sha256"], "min_mac_length": 128,
+           "purpose": ["sign", "verify"], "no_auth_required": true})"},
       {{"--size", "512", "--digest", "SHA-512", "--min-mac", "64", "--purpose", "sign"},
-       {{"key_size", 512}, {"digest", {"sha512"}}, {"min_mac_length", 64}, {"purpose", {"sign"}}}},
+       R"({"key_size": 512, "digest": ["sha512"], "min_mac_length": 64, "purpose": ["sign"]})"},
       {{"--user-id", "0x10", "--auth-type", "password,fingerprint", "--auth-timeout", "30"},
-       {{"user_secure_id", {16}},
-        {"user_auth_type", "password,fingerprint"},
-        {"auth_timeout", 30},
-        {"no_auth_required", nullptr}}},
+       R"({"user_secure_id": [16], "user_auth_type": "password,fingerprint", "auth_timeout": 30,
+           "no_auth_required": null})"},
       {{"--param", "min_mac_length=72", "--param", "USAGE_EXPIRE_DATETIME=2031-02-03"},
-       {{"min_mac_length", 72}, {"usage_expire_datetime", "2031-02-03T00:00:00.000Z"}}},
+       R"({"min_mac_length": 72, "usage_expire_datetime": "2031-02-03T00:00:00.000Z"})"},
   };
   for (const auto& [options, expected] : cases) {
     expect_done({"generate", "hmac", "-o", "x", "--force"}, options);
     json found = run_json({"show", "x"})["characteristics"];
-    for (const auto& [name, value] : expected.items())
+    const json wanted = json::parse(expected);
+    for (const auto& [name, value] : wanted.items())
       EXPECT_EQ(found[name], value) << name;
   }
   using std::filesystem::perms;

@@ -1,10 +1,7 @@
 // Attestation through the command interface, read back and verified with libcrypto.
 #include <algorithm>
-#include <gtest/gtest.h>
-#include <memory>
 #include <openssl/x509.h>
 #include <openssl/x509v3.h>
-#include <string>
 
 #include "support/sets.h"
 #include "support/ta_under_test.h"

@@ -1,6 +1,5 @@
 // Authorisation of key use: what a begin, update and finish are refused for, tokens, counted and
 // rate-limited keys, the TA's clock, the operation pool.
-#include <gtest/gtest.h>
 #include <set>
 
 #include "support/sets.h"

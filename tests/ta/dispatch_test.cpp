@@ -1,6 +1,5 @@
 // What every command goes through before its handler runs, and the configured state.
 #include <dlfcn.h>
-#include <gtest/gtest.h>
 
 #include "support/sets.h"
 #include "support/ta_under_test.h"

@@ -1,6 +1,5 @@
 // Keys of the earlier Keymaster: upgrade_key opens their blobs through that TA and seals them anew.
 #include <filesystem>
-#include <gtest/gtest.h>
 #include <stdlib.h>
 
 #include "support/blob_forge.h"

@@ -1,6 +1,4 @@
 // The stand-ins for sibling trusted applications, as the normal world meets them.
-#include <gtest/gtest.h>
-
 #include "support/ta_under_test.h"
 
 namespace keymaster::test {
@@ -57,11 +55,9 @@ TEST_F(Siblings, SecretsAreKeptFromTheNormalWorld) {
 }
 
 TEST_F(Siblings, ADeviceIsProvisionedOnceAndWhole) {
-  bytes trailing = record({1, 1, 1, 1, 1});
-  trailing.push_back(0);
   const bytes bad[] = {{},
                        record({1, 1, 1, 1}),
-                       trailing,
+                       record({1, 1, 1, 1, 1, 1}),
                        record({8193, 0, 0, 0, 0}),
                        record({0, 1025, 0, 0, 0}),
                        record({0, 0, 513, 0, 0}),
