@@ -3,35 +3,9 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <fcntl.h>
 #include <fstream>
-#include <signal.h>
 #include <sstream>
 #include <sys/wait.h>
-#include <unistd.h>
-
-namespace {
-
-// In the child: standard streams to files, the sandbox as working folder, kmtool in its place.
-[[noreturn]] void become_kmtool(const std::filesystem::path& folder, const words& arguments) {
-  std::vector<char*> argv = {const_cast<char*>(KMTOOL_PROGRAM)};
-  for (const std::string& argument : arguments)
-    argv.push_back(const_cast<char*>(argument.c_str()));
-  argv.push_back(nullptr);
-  if (chdir(folder.c_str()) != 0) _exit(99);
-  setenv("KEYMASTER_DEVICE", (folder / "device").c_str(), 1);
-  setenv("TEE_TRACE_LEVEL", "0", 1);
-  unsetenv("TEE_TA_PATH");
-  constexpr int NEW = O_WRONLY | O_CREAT | O_TRUNC;
-  dup2(open(".in", O_RDONLY), STDIN_FILENO);
-  dup2(open(".out", NEW, 0600), STDOUT_FILENO);
-  dup2(open(".err", NEW, 0600), STDERR_FILENO);
-  alarm(60);
-  execv(KMTOOL_PROGRAM, argv.data());
-  _exit(99);
-}
-
-}  // namespace
 
 sandbox::sandbox() {
   std::string name = (std::filesystem::temp_directory_path() / "kmtool-test.XXXXXX").string();
@@ -44,13 +18,20 @@ sandbox::~sandbox() {
   std::filesystem::remove_all(folder_, ignored);
 }
 
+int sandbox::shell(const std::string& line) const {
+  const int status = std::system(("cd '" + path("") + "' && " + line).c_str());
+  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
 call_result sandbox::run(const words& arguments, const std::string& input) const {
   write(".in", input);
-  pid_t child = fork();
-  if (child == 0) become_kmtool(folder_, arguments);
-  int status = 0;
-  waitpid(child, &status, 0);
-  return {WIFEXITED(status) ? WEXITSTATUS(status) : -1, read(".out"), read(".err")};
+  std::string line =
+      "env -u TEE_TA_PATH TEE_TRACE_LEVEL=0 KEYMASTER_DEVICE=\"$PWD/device\" timeout "
+      "60 " KMTOOL_PROGRAM;
+  for (const std::string& argument : arguments)
+    line += " '" + argument + "'";
+  const int exit_code = shell(line + " <.in >.out 2>.err");
+  return {exit_code, read(".out"), read(".err")};
 }
 
 json sandbox::run_json(words arguments, const std::string& input) const {

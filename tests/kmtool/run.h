@@ -12,7 +12,7 @@ using words = std::vector<std::string>;
 
 enum { DONE, REFUSED, WRONG_USAGE, TEE_FAILED };
 
-// What a call left behind. A call that does not end in a minute is killed: exit code -1.
+// What a call left behind. A call that does not end in a minute is killed: exit code 124.
 struct call_result {
   int exit_code;
   std::string out;
@@ -31,7 +31,11 @@ class sandbox : public testing::Test {
   sandbox();
   ~sandbox() override;
 
-  // run: kmtool with these arguments; the default device is the sandbox's folder "device".
+  // shell: the exit code of a shell's line in the sandbox.
+  int shell(const std::string& line) const;
+
+  // run: kmtool with these arguments, none with a single quote in it; the default device is the
+  // sandbox's folder "device".
   call_result run(const words& arguments, const std::string& input = "") const;
   std::string out_of(const words& arguments, const std::string& input = "") const {
     return run(arguments, input).out;

@@ -53,28 +53,30 @@ request attest_request(byte_view blob, const param_set& params, size_t capacity)
   return make(command::ATTEST_KEY, two_fields(blob, params.marshal()), capacity);
 }
 
+reply ta_under_test::send_well(const request& what) {
+  const reply answer = send(what);
+  EXPECT_TRUE(succeeded(answer)) << trace_.errors();
+  return answer;
+}
+
 reply ta_under_test::configure(uint32_t os_version, uint32_t os_patchlevel) {
   return send(configure_request(
       param_set().add(KM_TAG_OS_VERSION, os_version).add(KM_TAG_OS_PATCHLEVEL, os_patchlevel)));
 }
 
 bytes ta_under_test::generate(const param_set& description) {
-  const reply answer = send(generate_request(description));
-  EXPECT_TRUE(succeeded(answer)) << trace_.errors();
-  return client::copy_of(answer.output());
+  return client::copy_of(send_well(generate_request(description)).output());
 }
 
 bytes ta_under_test::import(const param_set& description, byte_view key_data) {
-  const reply answer = send(import_request(description, key_data));
-  EXPECT_TRUE(succeeded(answer)) << trace_.errors();
+  const reply answer = send_well(import_request(description, key_data));
   client::key_result imported;
   if (answer.ok()) client::parse_imported(answer.output(), &imported);
   return imported.blob;
 }
 
 param_set ta_under_test::characteristics(byte_view blob, const client::application& app) {
-  const reply answer = send(key_request(command::GET_KEY_CHARACTER, blob, app));
-  EXPECT_TRUE(succeeded(answer)) << trace_.errors();
+  const reply answer = send_well(key_request(command::GET_KEY_CHARACTER, blob, app));
   return answer.ok() ? param_set::parse(answer.output()) : param_set();
 }
 
@@ -83,9 +85,7 @@ reply ta_under_test::begin(uint32_t purpose, byte_view blob, const param_set& pa
 }
 
 uint32_t ta_under_test::begun(uint32_t purpose, byte_view blob, const param_set& params) {
-  const reply answer = begin(purpose, blob, params);
-  EXPECT_TRUE(succeeded(answer)) << trace_.errors();
-  return answer.b;
+  return send_well(begin_request(purpose, blob, params)).b;
 }
 
 reply ta_under_test::update(uint32_t handle, byte_view input, const param_set& params) {
@@ -103,12 +103,11 @@ reply ta_under_test::upgrade(byte_view blob, const param_set& params) {
 bytes ta_under_test::run(uint32_t purpose, byte_view blob, const param_set& params,
                          byte_view input) {
   const uint32_t handle = begun(purpose, blob, params);
-  const reply updated = update(handle, input);
-  EXPECT_TRUE(succeeded(updated)) << trace_.errors();
+  const reply updated =
+      send_well(step_request(command::UPDATE, handle, input, {}, input.size() + AMPLE));
   EXPECT_EQ(updated.b, input.size());
   bytes output = client::copy_of(updated.output());
-  const reply finished = finish(handle);
-  EXPECT_TRUE(succeeded(finished)) << trace_.errors();
+  const reply finished = send_well(step_request(command::FINISH, handle));
   client::finish_result rest;
   if (finished.ok()) client::parse_finished(finished.output(), &rest);
   client::append(&output, rest.output);

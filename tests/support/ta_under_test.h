@@ -118,6 +118,8 @@ class ta_under_test {
 
   // send: one command, with the checks that this file begins with.
   reply send(const request& what);
+  // send_well: the same, and it must succeed.
+  reply send_well(const request& what);
 
   // fail_each_call: sends what `make` gives with the n-th platform call failing, n = 1, 2, ...,
   // until a command comes to its end without. `check` sees each answer, and whether a call failed.

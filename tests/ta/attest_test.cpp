@@ -16,14 +16,6 @@ constexpr char KEY_DESCRIPTION[] = "1.3.6.1.4.1.11129.2.1.17";
 
 using certificate = std::unique_ptr<X509, decltype(&X509_free)>;
 
-certificate parse(byte_view der) {
-  const unsigned char* next = der.data();
-  certificate parsed(d2i_X509(nullptr, &next, static_cast<long>(der.size())), X509_free);
-  EXPECT_TRUE(parsed);
-  EXPECT_EQ(next, der.data() + der.size());
-  return parsed;
-}
-
 // Whether the bytes are values in DER (X.690, 10): each in the one form that it may have. The order
 // of sets is not looked at: theirs is that of adding, which is intended.
 bool is_der(byte_view in) {
@@ -57,7 +49,9 @@ std::vector<certificate> parse_chain(byte_view chain) {
   while (reader.left() > 0) {
     const byte_view der = reader.field();
     EXPECT_TRUE(is_der(der));
-    links.push_back(parse(der));
+    const unsigned char* next = der.data();
+    links.emplace_back(d2i_X509(nullptr, &next, static_cast<long>(der.size())), X509_free);
+    EXPECT_EQ(next, der.data() + der.size());
   }
   return links;
 }
@@ -119,8 +113,7 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     const bytes blob = ta.generate(row.description);
     const param_set params =
         param_set(row.params).add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes{1, 2, 3});
-    const reply answer = ta.send(attest_request(blob, params));
-    ASSERT_TRUE(succeeded(answer));
+    const reply answer = ta.send_well(attest_request(blob, params));
     EXPECT_EQ(answer.b, 2u);
     const std::vector<certificate> chain = parse_chain(answer.output());
     ASSERT_EQ(chain.size(), 2u);
@@ -141,7 +134,8 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     bytes subject(1024);
     uint8_t* end = subject.data();
     subject.resize(static_cast<size_t>(i2d_PUBKEY(X509_get0_pubkey(chain[0].get()), &end)));
-    EXPECT_EQ(subject, client::copy_of(ta.send(key_request(command::EXPORT_KEY, blob)).output()));
+    EXPECT_EQ(subject,
+              client::copy_of(ta.send_well(key_request(command::EXPORT_KEY, blob)).output()));
   }
 }
 
@@ -150,8 +144,7 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
 TEST(Attestation, Capacities) {
   ta_under_test ta;
   const bytes blob = ta.generate(EC_256_KEY);
-  const reply whole = ta.send(attest_request(blob));
-  ASSERT_TRUE(succeeded(whole));
+  const reply whole = ta.send_well(attest_request(blob));
   const size_t first = 4 + client::field_reader(whole.output()).u32();
   ASSERT_EQ(whole.output_size, first + 4 + STORED_SIZE);
   const struct {
@@ -205,9 +198,7 @@ TEST(Attestation, OfLongDescriptions) {
     const bytes application(size, 'x');
     const bytes blob =
         ta.generate(param_set(EC_256_KEY).add_bytes(KM_TAG_APPLICATION_ID, application));
-    const reply answer = ta.send(attest_request(blob));
-    ASSERT_TRUE(succeeded(answer)) << ta.trace().errors();
-    const std::vector<certificate> chain = parse_chain(answer.output());
+    const auto chain = parse_chain(ta.send_well(attest_request(blob)).output());
     const bytes description = extension_value(chain.at(0), KEY_DESCRIPTION);
     EXPECT_NE(std::ranges::search(description, application).begin(), description.end());
     EXPECT_EQ(X509_verify(chain[0].get(), X509_get0_pubkey(chain.at(1).get())), 1);

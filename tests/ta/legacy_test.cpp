@@ -71,9 +71,7 @@ TEST_F(Legacy, BlobsAreUpgradedAndOpenAsCurrentOnes) {
   const bytes old = legacy_blob(plaintext);
   EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, old, mac_use()), KM_ERROR_KEY_REQUIRES_UPGRADE));
 
-  const reply upgraded = ta.upgrade(old);
-  ASSERT_TRUE(succeeded(upgraded)) << ta.trace().errors();
-  const bytes blob = client::copy_of(upgraded.output());
+  const bytes blob = client::copy_of(ta.send_well(upgrade_request(old)).output());
   const param_set found = ta.characteristics(blob);
   EXPECT_EQ(found.number(KM_TAG_OS_VERSION), OS_VERSION);
   EXPECT_EQ(found.number(KM_TAG_OS_PATCHLEVEL), OS_PATCHLEVEL);

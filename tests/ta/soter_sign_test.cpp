@@ -66,8 +66,7 @@ class SoterDocument : public soter_device {
 
   // The document of the key's export when there is one; export itself always succeeds.
   std::optional<client::signed_document> exported(byte_view blob) {
-    const reply answer = ta.send(key_request(command::EXPORT_KEY, blob));
-    EXPECT_TRUE(succeeded(answer));
+    const reply answer = ta.send_well(key_request(command::EXPORT_KEY, blob));
     if (answer.output_size == 0) return std::nullopt;
     return client::parse_signed_document(answer.output());
   }
@@ -177,9 +176,7 @@ TEST_F(SoterDocument, HoldsMessagesOfAnyLength) {
     EXPECT_EQ(lines.has("rsa_sign_update: expand soter buf 4096 -> 8192"), end > 4096);
   }
   EXPECT_TRUE(lines.has("rsa_sign_update: expand soter buf 8192 -> 28192"));
-  const reply answer = ta.send(step_request(command::FINISH, handle, {}, {}, 40000));
-  ASSERT_TRUE(succeeded(answer)) << ta.trace().errors();
-  const auto document = parsed(answer);
+  const auto document = parsed(ta.send_well(step_request(command::FINISH, handle, {}, {}, 40000)));
   EXPECT_EQ(document.text(), R"({"raw":")" + message + R"(","counter":1,"uid":0,)" + DEVICE);
   EXPECT_TRUE(key_1024().verify(PKCS1, document.document, document.signature));
 }
@@ -277,8 +274,7 @@ TEST_F(SoterExport, RespectsTheOutput) {
   const bytes blob = made(BY_ATTK);
   const size_t needed = ta.send(key_request(command::EXPORT_KEY, blob)).output_size;
   for (const size_t capacity : {size_t{0}, size_t{4}, needed - 1, needed, needed + 1}) {
-    const reply answer = ta.send(key_request(command::EXPORT_KEY, blob, {}, capacity));
-    EXPECT_TRUE(succeeded(answer));
+    const reply answer = ta.send_well(key_request(command::EXPORT_KEY, blob, {}, capacity));
     EXPECT_EQ(answer.output_size, capacity < needed ? 0 : needed);
     EXPECT_TRUE(capacity >= needed || answer.buffer == bytes(capacity, UNTOUCHED));
   }
@@ -306,9 +302,7 @@ TEST(SoterUnprovisioned, HasNoDocuments) {
   EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, soter_use(PKCS1)), KM_ERROR_UNKNOWN_ERROR));
   EXPECT_TRUE(ta.trace().has("create_rsa_sign: soter resources is not ready, error 0xffff0008"))
       << ta.trace().errors();
-  const reply answer = ta.send(key_request(command::EXPORT_KEY, blob));
-  EXPECT_TRUE(succeeded(answer));
-  EXPECT_EQ(answer.output_size, 0u);
+  EXPECT_EQ(ta.send_well(key_request(command::EXPORT_KEY, blob)).output_size, 0u);
   EXPECT_TRUE(ta.trace().has("soter_enhance_export_key: soter is not ready"));
 }
 
