@@ -15,18 +15,6 @@ uint32_t type_of(uint32_t types, int slot) {
   return types >> (4 * slot) & 0xf;
 }
 
-void take(uint32_t types, const TEEC_Parameter* slots, request* seen) {
-  if (type_of(types, 0) == TEEC_VALUE_INOUT) seen->a = slots[0].value.a;
-  for (int i = 0; i < 4; ++i) {
-    const TEEC_TempMemoryReference& memory = slots[i].tmpref;
-    if (type_of(types, i) == TEEC_MEMREF_TEMP_OUTPUT) seen->capacity = memory.size;
-    if (type_of(types, i) == TEEC_MEMREF_TEMP_INPUT) {
-      auto* data = static_cast<const uint8_t*>(memory.buffer);
-      seen->input.assign(data, data + memory.size);
-    }
-  }
-}
-
 void put(const answer& reply, uint32_t types, TEEC_Parameter* slots) {
   const uint32_t kind = type_of(types, 0);
   if (kind != TEEC_VALUE_INOUT && kind != TEEC_VALUE_OUTPUT) return;
@@ -67,11 +55,13 @@ void TEEC_CloseSession(TEEC_Session*) {}
 
 TEEC_Result TEEC_InvokeCommand(TEEC_Session*, uint32_t command, TEEC_Operation* operation,
                                uint32_t* origin) {
-  fake_teec::request seen{command, operation->paramTypes};
-  fake_teec::take(operation->paramTypes, operation->params, &seen);
+  const uint32_t types = operation->paramTypes;
+  fake_teec::request seen{command, types};
+  if (fake_teec::type_of(types, 0) == TEEC_VALUE_INOUT) seen.a = operation->params[0].value.a;
+  if (fake_teec::type_of(types, 2) != 0) seen.capacity = operation->params[2].tmpref.size;
   fake_teec::requests.push_back(seen);
   fake_teec::answer reply = current(seen);
   *origin = reply.leave_slots ? TEEC_ORIGIN_TEE : TEEC_ORIGIN_TRUSTED_APP;
-  if (!reply.leave_slots) fake_teec::put(reply, operation->paramTypes, operation->params);
+  if (!reply.leave_slots) fake_teec::put(reply, types, operation->params);
   return reply.result;
 }

@@ -15,8 +15,7 @@ struct request {
   uint32_t command;
   uint32_t types;
   uint32_t a = 0;
-  keymaster::client::bytes input = {};  // of its one input buffer
-  size_t capacity = 0;                  // of its one output buffer
+  size_t capacity = 0;  // of its one output buffer
 };
 
 // What the application answers; output goes to slot 2 as far as it fits, output_size is reported.

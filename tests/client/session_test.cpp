@@ -1,5 +1,4 @@
-// What the client sends, and what it makes of good, failed and hostile answers and of the documents
-// in them.
+// What the client makes of good, failed and hostile answers and of the documents in them.
 #include "client/session.h"
 
 #include <gtest/gtest.h>

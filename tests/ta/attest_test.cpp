@@ -12,7 +12,7 @@ namespace {
 using namespace std::string_literals;
 
 constexpr size_t STORED_SIZE = 783;
-constexpr char KEY_DESCRIPTION[] = "1.3.6.1.4.1.11129.2.1.17";
+const int KEY_DESCRIPTION = OBJ_create("1.3.6.1.4.1.11129.2.1.17", "keyDescription", "Attestation");
 
 using certificate = std::unique_ptr<X509, decltype(&X509_free)>;
 
@@ -81,11 +81,9 @@ std::string common_name(const X509_NAME* name) {
   return text_of(X509_NAME_ENTRY_get_data(X509_NAME_get_entry(name, 0)));
 }
 
-// The content octets of extension `id` of a certificate.
-bytes extension_value(const certificate& from, const char* id) {
-  const std::unique_ptr<ASN1_OBJECT, decltype(&ASN1_OBJECT_free)> object(OBJ_txt2obj(id, 1),
-                                                                         ASN1_OBJECT_free);
-  const int index = X509_get_ext_by_OBJ(from.get(), object.get(), -1);
+// The content octets of an extension, by its NID.
+bytes extension_value(const certificate& from, int id) {
+  const int index = X509_get_ext_by_NID(from.get(), id, -1);
   if (index < 0) return {};
   const auto* value = X509_EXTENSION_get_data(X509_get_ext(from.get(), index));
   return client::copy_of(client::as_bytes(text_of(value)));
@@ -124,7 +122,7 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     EXPECT_EQ(ASN1_INTEGER_get(X509_get0_serialNumber(chain[0].get())), 1);
     EXPECT_EQ(text_of(X509_get0_notBefore(chain[0].get())), row.not_before);
     EXPECT_EQ(text_of(X509_get0_notAfter(chain[0].get())), row.not_after);
-    EXPECT_EQ(extension_value(chain[0], "2.5.29.15"), (bytes{3, 2, 0, row.key_usage}));
+    EXPECT_EQ(extension_value(chain[0], NID_key_usage), (bytes{3, 2, 0, row.key_usage}));
     const bytes description = extension_value(chain[0], KEY_DESCRIPTION);
     EXPECT_TRUE(!description.empty() && is_der(description));
     EXPECT_EQ(common_name(X509_get_subject_name(chain[0].get())), "A Keymaster Key\0"s);
