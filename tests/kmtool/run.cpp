@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <cstdlib>
 #include <fstream>
-#include <sstream>
 #include <sys/wait.h>
 
 sandbox::sandbox() {
@@ -59,9 +58,8 @@ void sandbox::expect_all(int exit_code, const std::vector<failing_call>& calls) 
 }
 
 std::string sandbox::read(const std::string& name) const {
-  std::ostringstream content;
-  content << std::ifstream(folder_ / name, std::ios::binary).rdbuf();
-  return content.str();
+  std::ifstream file(folder_ / name, std::ios::binary);
+  return {std::istreambuf_iterator<char>(file), {}};
 }
 
 void sandbox::write(const std::string& name, const std::string& content) const {

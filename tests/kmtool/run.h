@@ -4,8 +4,6 @@
 #include <filesystem>
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
-#include <string>
-#include <vector>
 
 using nlohmann::json;
 using words = std::vector<std::string>;

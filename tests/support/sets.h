@@ -31,6 +31,13 @@ inline client::param_set without(const client::param_set& set, keymaster_tag_t t
   return result;
 }
 
+// bound_to: what binds a key to an application, and what one presents; no data when that is empty.
+inline client::param_set bound_to(std::string_view id, std::string_view data = {}) {
+  client::param_set set;
+  set.add_bytes(KM_TAG_APPLICATION_ID, client::as_bytes(id));
+  return data.empty() ? set : set.add_bytes(KM_TAG_APPLICATION_DATA, client::as_bytes(data));
+}
+
 // hmac_key: a key that may sign and verify, of `bits` or, imported, of its data's size.
 inline client::param_set hmac_key(uint32_t bits = 0, uint32_t digest = KM_DIGEST_SHA_2_256) {
   client::param_set key = one(KM_TAG_ALGORITHM, KM_ALGORITHM_HMAC);

@@ -129,16 +129,13 @@ void ta_under_test::account(const request& what, const reply& answer, const live
   const bool on_live = (id == command::UPDATE || id == command::FINISH || id == command::ABORT) &&
                        live != live_.end() && !what.types && what.b == 0;
   const live_counts after = counts();
-  live_counts expected = before;
-  if (id == command::BEGIN && answer.ok()) {
-    live_[answer.b] = difference(after, before);
-    return;
-  }
-  if (on_live && id == command::UPDATE && answer.ok()) {
-    live->second = difference(after, difference(before, live->second));
+  if (answer.ok() && (id == command::BEGIN || (on_live && id == command::UPDATE))) {
+    live_counts& held = live_[id == command::BEGIN ? answer.b : what.a];
+    held = difference(after, difference(before, held));
     return;
   }
   if (std::exchange(loads_, false)) return;
+  live_counts expected = before;
   if (on_live) {
     expected = difference(before, live->second);
     live_.erase(live);

@@ -75,9 +75,7 @@ class auth : public testing::Test {
       lines += " | begin: Authorization failed";
     }
     EXPECT_EQ(ta.trace().errors(), lines);
-    if (answer.ok()) {
-      EXPECT_TRUE(succeeded(ta.abort(answer.b)));
-    }
+    if (answer.ok()) ta.abort(answer.b);
   }
   void expect_sign(byte_view blob, int32_t error = 0, std::string lines = "",
                    const param_set& more = {}) {
@@ -218,7 +216,7 @@ TEST_F(auth, ninth_counted_key_is_refused_until_the_instance_ends) {
 }
 
 TEST_F(auth, keys_are_told_apart_also_when_their_blobs_are_longer_than_the_log_s_field) {
-  const param_set app = param_set().add_bytes(KM_TAG_APPLICATION_ID, bytes(3000, 7));
+  const param_set app = bound_to(std::string(3000, 'a'));
   const param_set description = signer(KM_TAG_MAX_USES_PER_BOOT, 1).append(app);
   for (const bytes& key : {ta.generate(description), ta.generate(description)}) {
     expect_sign(key, 0, "", app);
@@ -322,14 +320,8 @@ TEST_F(auth, operation_wants_its_own_token_at_every_step) {
 }
 
 TEST_F(auth, application_must_present_what_the_key_is_bound_to) {
-  const auto id = [](const bytes& bound) {
-    return param_set().add_bytes(KM_TAG_APPLICATION_ID, bound);
-  };
-  const auto both = [&](const bytes& bound, const bytes& data) {
-    return id(bound).add_bytes(KM_TAG_APPLICATION_DATA, data);
-  };
-  const param_set bound = both({1, 2, 3}, {4, 5, 6});
-  const param_set twice = id({1, 2, 3}).append(id({1, 2, 3}));
+  const param_set bound = bound_to("abc", "def");
+  const param_set twice = bound_to("abc").append(bound_to("abc"));
   const struct {
     param_set key, given;
     std::string reason;  // empty: granted
@@ -337,10 +329,10 @@ TEST_F(auth, application_must_present_what_the_key_is_bound_to) {
       {bound, bound, ""},
       {{}, bound, ""},
       {bound, {}, "KM_TAG_APPLICATION_ID mismatch"},
-      {bound, both({1, 2, 4}, {4, 5, 6}), "KM_TAG_APPLICATION_ID mismatch"},
-      {bound, both({1, 2}, {4, 5, 6}), "KM_TAG_APPLICATION_ID mismatch"},
-      {bound, id({1, 2, 3}), "KM_TAG_APPLICATION_DATA mismatch"},
-      {bound, both({1, 2, 3}, {4, 5, 6, 7}), "KM_TAG_APPLICATION_DATA mismatch"},
+      {bound, bound_to("abd", "def"), "KM_TAG_APPLICATION_ID mismatch"},
+      {bound, bound_to("ab", "def"), "KM_TAG_APPLICATION_ID mismatch"},
+      {bound, bound_to("abc"), "KM_TAG_APPLICATION_DATA mismatch"},
+      {bound, bound_to("abc", "defg"), "KM_TAG_APPLICATION_DATA mismatch"},
       {twice, twice, "Duplicated KM_TAG_APPLICATION_ID"},
   };
   for (const auto& row : rows) {

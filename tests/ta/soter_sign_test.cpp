@@ -76,12 +76,10 @@ TEST_F(SoterDocument, HoldsWhatTheDeviceKnows) {
   const bytes blob = made();
   report_finger(4294967295);
   const auto first = signed_by(blob, PKCS1, "a/b \"\xc3\xa9\"\n\x01");
-  EXPECT_EQ(first.text(), R"({"raw":"a\/b \")"
-                          "\xc3\xa9"
-                          R"(\"\n)"
-                          "\x01"
-                          R"(","fid":4294967295,"counter":1,"uid":0,)" +
-                              DEVICE);
+  EXPECT_EQ(
+      first.text(),
+      "{\"raw\":\"a\\/b \\\"\xc3\xa9\\\"\\n\x01\",\"fid\":4294967295,\"counter\":1,\"uid\":0," +
+          DEVICE);
   // The zero byte is signed.
   EXPECT_EQ(first.document.back(), 0);
   EXPECT_TRUE(key_1024().verify(PKCS1, first.document, first.signature));

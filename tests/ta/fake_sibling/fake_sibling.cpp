@@ -27,8 +27,7 @@ TEE_Result program(const TEE_Param& slot) {
   fake_answer how;
   memcpy(&how, slot.memref.buffer, sizeof(how));
   stored_answer* answer = answer_to(how.question);
-  if (answer == nullptr) answer = answer_to(0);
-  if (answer == nullptr) return TEE_ERROR_OUT_OF_MEMORY;
+  if (answer == nullptr) answer = answer_to(0);  // a free one: there are three questions
   answer->how = how;
   answer->size = slot.memref.size - sizeof(how);
   memcpy(answer->content, static_cast<const uint8_t*>(slot.memref.buffer) + sizeof(how),
