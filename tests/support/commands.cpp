@@ -14,6 +14,12 @@ bytes two_fields(byte_view first, byte_view second) {
 
 }  // namespace
 
+bytes finished(const reply& answer) {
+  client::finish_result result;
+  if (answer.ok()) client::parse_finished(answer.output(), &result);
+  return result.output;
+}
+
 request configure_request(const param_set& params) {
   return make(command::CONFIGURE, params.marshal());
 }
@@ -59,6 +65,11 @@ reply ta_under_test::send_well(const request& what) {
   return answer;
 }
 
+void ta_under_test::expect_refused(const request& what, int32_t km_error, const std::string& line) {
+  EXPECT_TRUE(refused(send(what), km_error)) << line;
+  EXPECT_TRUE(line.empty() || trace_.has(line)) << line << " is not in: " << trace_.errors();
+}
+
 reply ta_under_test::configure(uint32_t os_version, uint32_t os_patchlevel) {
   return send(configure_request(
       param_set().add(KM_TAG_OS_VERSION, os_version).add(KM_TAG_OS_PATCHLEVEL, os_patchlevel)));
@@ -84,6 +95,12 @@ reply ta_under_test::begin(uint32_t purpose, byte_view blob, const param_set& pa
   return send(begin_request(purpose, blob, params));
 }
 
+reply ta_under_test::try_begin(uint32_t purpose, byte_view blob, const param_set& params) {
+  const reply answer = begin(purpose, blob, params);
+  if (answer.ok()) abort(answer.b);
+  return answer;
+}
+
 uint32_t ta_under_test::begun(uint32_t purpose, byte_view blob, const param_set& params) {
   return send_well(begin_request(purpose, blob, params)).b;
 }
@@ -107,11 +124,15 @@ bytes ta_under_test::run(uint32_t purpose, byte_view blob, const param_set& para
       send_well(step_request(command::UPDATE, handle, input, {}, input.size() + AMPLE));
   EXPECT_EQ(updated.b, input.size());
   bytes output = client::copy_of(updated.output());
-  const reply finished = send_well(step_request(command::FINISH, handle));
-  client::finish_result rest;
-  if (finished.ok()) client::parse_finished(finished.output(), &rest);
-  client::append(&output, rest.output);
+  client::append(&output, finished(send_well(step_request(command::FINISH, handle))));
   return output;
+}
+
+reply ta_under_test::try_run(uint32_t purpose, byte_view blob, const param_set& params,
+                             byte_view input, byte_view last) {
+  const uint32_t handle = begun(purpose, blob, params);
+  EXPECT_TRUE(succeeded(update(handle, input))) << trace_.errors();
+  return finish(handle, last);
 }
 
 }  // namespace keymaster::test

@@ -1,9 +1,14 @@
-// Parameter sets that several tests start from.
+// Purposes and parameter sets that several tests start from.
 #pragma once
 
 #include "client/param_set.h"
 
 namespace keymaster::test {
+
+constexpr uint32_t ENCRYPT = KM_PURPOSE_ENCRYPT;
+constexpr uint32_t DECRYPT = KM_PURPOSE_DECRYPT;
+constexpr uint32_t SIGN = KM_PURPOSE_SIGN;
+constexpr uint32_t VERIFY = KM_PURPOSE_VERIFY;
 
 inline client::param_set one(keymaster_tag_t tag, uint64_t number) {
   return client::param_set().add(tag, number);
@@ -36,6 +41,28 @@ inline client::param_set bound_to(std::string_view id, std::string_view data = {
   client::param_set set;
   set.add_bytes(KM_TAG_APPLICATION_ID, client::as_bytes(id));
   return data.empty() ? set : set.add_bytes(KM_TAG_APPLICATION_DATA, client::as_bytes(data));
+}
+
+// with: `set`, its parameters of that tag replaced by one for each number.
+inline client::param_set with(const client::param_set& set, keymaster_tag_t tag,
+                              std::initializer_list<uint32_t> numbers) {
+  return without(set, tag).append(several(tag, numbers));
+}
+
+// any_use: a key for all that RSA, AES and EC keys can be asked for, and for some that none can.
+constexpr uint32_t UNKNOWN_MODE = 99;
+constexpr uint32_t UNKNOWN_PADDING = 9;
+constexpr uint32_t UNKNOWN_DIGEST = 7;
+inline client::param_set any_use(uint32_t algorithm) {
+  return one(KM_TAG_ALGORITHM, algorithm)
+      .append(several(KM_TAG_PURPOSE, {ENCRYPT, DECRYPT, SIGN, VERIFY}))
+      .append(several(KM_TAG_BLOCK_MODE,
+                      {KM_MODE_ECB, KM_MODE_CBC, KM_MODE_CTR, KM_MODE_GCM, UNKNOWN_MODE}))
+      .append(several(KM_TAG_PADDING, {1, 2, 3, 4, 5, KM_PAD_PKCS7, UNKNOWN_PADDING}))
+      .append(several(KM_TAG_DIGEST, {0, 1, 2, 3, 4, 5, 6, UNKNOWN_DIGEST}))
+      .add(KM_TAG_MIN_MAC_LENGTH, 96)
+      .add_flag(KM_TAG_CALLER_NONCE)
+      .add_flag(KM_TAG_NO_AUTH_REQUIRED);
 }
 
 // hmac_key: a key that may sign and verify, of `bits` or, imported, of its data's size.

@@ -83,6 +83,9 @@ testing::AssertionResult succeeded(const reply& answer);
 testing::AssertionResult refused(const reply& answer, int32_t km_error);
 testing::AssertionResult failed_with(const reply& answer, TEEC_Result res);
 
+// finished: the output of an operation's finish; empty unless done.
+bytes finished(const reply& answer);
+
 // The requests of the commands, in their layouts. A capacity is large enough unless given.
 constexpr size_t AMPLE = 8192;
 request configure_request(const param_set& params);
@@ -120,6 +123,10 @@ class ta_under_test {
   // send_well: the same, and it must succeed.
   reply send_well(const request& what);
 
+  // expect_refused: the same, but with TEE success and this error (0: it is done). Unless the line
+  // is empty, it is traced.
+  void expect_refused(const request& what, int32_t km_error, const std::string& line = "");
+
   // fail_each_call: sends what `make` gives with the n-th platform call failing, n = 1, 2, ...,
   // until a command comes to its end without. `check` sees each answer, and whether a call failed.
   void fail_each_call(TEE_Result fault, const std::function<request()>& make,
@@ -132,6 +139,8 @@ class ta_under_test {
   // The characteristics of a key whose opening must succeed.
   param_set characteristics(byte_view blob, const client::application& app = {});
   reply begin(uint32_t purpose, byte_view blob, const param_set& params = {});
+  // The same, and the operation is aborted if there is one.
+  reply try_begin(uint32_t purpose, byte_view blob, const param_set& params);
   // The handle of a begin that must succeed.
   uint32_t begun(uint32_t purpose, byte_view blob, const param_set& params = {});
   reply update(uint32_t handle, byte_view input, const param_set& params = {});
@@ -140,6 +149,9 @@ class ta_under_test {
   reply upgrade(byte_view blob, const param_set& params = {});
   // begin, update and finish of a use that must succeed; returns the output of both.
   bytes run(uint32_t purpose, byte_view blob, const param_set& params, byte_view input);
+  // begin and update, which must succeed, and the answer of finish, which is given `last`.
+  reply try_run(uint32_t purpose, byte_view blob, const param_set& params, byte_view input,
+                byte_view last = {});
 
   // A token of the device's authenticator.
   bytes token(const client::token_request& what);

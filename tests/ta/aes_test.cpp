@@ -12,26 +12,8 @@ namespace {
 using client::from_hex;
 
 constexpr size_t BLOCK = 16;
-constexpr uint32_t UNKNOWN_MODE = 99;
-constexpr uint32_t ENCRYPT = KM_PURPOSE_ENCRYPT;
-constexpr uint32_t DECRYPT = KM_PURPOSE_DECRYPT;
 
-// A key for both purposes, with every mode and padding, that takes nonces.
-param_set any_use() {
-  return one(KM_TAG_ALGORITHM, KM_ALGORITHM_AES)
-      .append(several(KM_TAG_PURPOSE, {ENCRYPT, DECRYPT}))
-      .append(several(KM_TAG_BLOCK_MODE,
-                      {KM_MODE_ECB, KM_MODE_CBC, KM_MODE_CTR, KM_MODE_GCM, UNKNOWN_MODE}))
-      .append(several(KM_TAG_PADDING, {KM_PAD_NONE, KM_PAD_PKCS7, KM_PAD_RSA_PSS}))
-      .add(KM_TAG_MIN_MAC_LENGTH, 96)
-      .add_flag(KM_TAG_CALLER_NONCE)
-      .add_flag(KM_TAG_NO_AUTH_REQUIRED);
-}
-
-// any_use with the values of one tag replaced.
-param_set any_use_but(keymaster_tag_t tag, std::initializer_list<uint32_t> values) {
-  return without(any_use(), tag).append(several(tag, values));
-}
+const param_set ANY_USE = any_use(KM_ALGORITHM_AES);
 
 // What a begin asks for; 0 and an empty nonce leave the parameter out.
 param_set use(uint32_t mode, uint32_t padding = 0, uint32_t mac_bits = 0, byte_view nonce = {}) {
@@ -46,14 +28,8 @@ param_set associated(byte_view data) {
   return param_set().add_bytes(KM_TAG_ASSOCIATED_DATA, data);
 }
 
-bytes finished(const reply& answer) {
-  client::finish_result result;
-  if (answer.ok()) client::parse_finished(answer.output(), &result);
-  return result.output;
-}
-
 struct stream_vector {
-  const char* name;
+  std::string name;  // and in pieces of how many bytes
   uint32_t mode;
   uint32_t padding;
   uint32_t mac_bits;
@@ -63,6 +39,7 @@ struct stream_vector {
   const char* plaintext;
   const char* ciphertext;  // with the tag behind it
 
+  size_t tag_size() const { return mac_bits / 8; }
   param_set params() const { return use(mode, padding, mac_bits, from_hex(nonce)); }
 };
 
@@ -78,7 +55,9 @@ constexpr char COUNTING_IV[] = "000102030405060708090a0b0c0d0e0f";
 #define GCM_FORTY                                                    \
   "d9313225f88406e5a55909c5aff5269a86a7a9531534f7da2e4c303d8a318a72" \
   "1c3c0c9595680953"
-#define GCM_SIXTY GCM_FORTY "2fcf0e2449a6b525b16aedf5aa0de657ba637b39"
+#define GCM_FORTY_SEALED                                             \
+  "42831ec2217774244b7221b784d0d49ce3aa212f2c02a4e035c17e2329aca12e" \
+  "21d514b25466931c"
 
 // The first four are those of NIST SP 800-38A and of the GCM proposal (test case 4); the 40-byte
 // ones were made with the openssl command and an independent GCM.
@@ -95,25 +74,20 @@ const stream_vector VECTORS[] = {
      "f0f1f2f3f4f5f6f7f8f9fafbfcfdfeff", "", FOUR_BLOCKS,
      "1abc932417521ca24f2b0459fe7e6e0b090339ec0aa6faefd5ccc2c6f4ce8e94"
      "1e36b26bd1ebc670d1bd1d665620abf74f78a7f6d29809585a97daec58c6b050"},
-    {"GCM 128", KM_MODE_GCM, KM_PAD_NONE, 128, GCM_KEY, GCM_NONCE, GCM_AAD, GCM_SIXTY,
-     "42831ec2217774244b7221b784d0d49ce3aa212f2c02a4e035c17e2329aca12e"
-     "21d514b25466931c7d8f6a5aac84aa051ba30b396a0aac973d58e0915bc94fbc3221a5db94fae95ae7121a47"},
+    {"GCM 128", KM_MODE_GCM, KM_PAD_NONE, 128, GCM_KEY, GCM_NONCE, GCM_AAD,
+     GCM_FORTY "2fcf0e2449a6b525b16aedf5aa0de657ba637b39",
+     GCM_FORTY_SEALED "7d8f6a5aac84aa051ba30b396a0aac973d58e0915bc94fbc3221a5db94fae95ae7121a47"},
     {"CBC PKCS7, 40 bytes", KM_MODE_CBC, KM_PAD_PKCS7, 0, KEY_128, COUNTING_IV, "", FORTY_BYTES,
      "7649abac8119b246cee98e9b12e9197d5086cb9b507219ee95db113a917678b2"
      "5caca76145cffc65f7483608c531aef1"},
     {"GCM, 40 bytes, 96-bit tag", KM_MODE_GCM, KM_PAD_NONE, 96, GCM_KEY, GCM_NONCE, GCM_AAD,
-     GCM_FORTY,
-     "42831ec2217774244b7221b784d0d49ce3aa212f2c02a4e035c17e2329aca12e"
-     "21d514b25466931c57c3b9a3a267920b9af8a26d"},
+     GCM_FORTY, GCM_FORTY_SEALED "57c3b9a3a267920b9af8a26d"},
 };
 
 // How many bytes must have come out once `fed` bytes went in, before finish.
 size_t due(const stream_vector& v, uint32_t purpose, size_t fed) {
-  const size_t held = v.mac_bits / 8;
   if (v.mode == KM_MODE_CTR) return fed;
-  if (v.mode == KM_MODE_GCM) {
-    return purpose == ENCRYPT ? fed : fed - std::min(fed, held);
-  }
+  if (v.mode == KM_MODE_GCM) return purpose == ENCRYPT ? fed : fed - std::min(fed, v.tag_size());
   const bool holds_block = purpose == DECRYPT && v.padding == KM_PAD_PKCS7 && fed > 0;
   return (holds_block ? fed - 1 : fed) / BLOCK * BLOCK;
 }
@@ -124,34 +98,28 @@ bytes stream(ta_under_test* ta, const stream_vector& v, uint32_t purpose, byte_v
              byte_view input, size_t piece) {
   const uint32_t handle = ta->begun(purpose, blob, v.params());
   const bytes aad = from_hex(v.associated_data);
-  const byte_view first_half = byte_view(aad).first(aad.size() / 2);
-  if (!aad.empty()) {
-    EXPECT_TRUE(succeeded(ta->update(handle, {}, associated(first_half))));
-  }
+  const byte_view halves[] = {byte_view(aad).first(aad.size() / 2),
+                              byte_view(aad).subspan(aad.size() / 2)};
+  const auto some = [&](byte_view data) { return aad.empty() ? param_set() : associated(data); };
+  EXPECT_TRUE(succeeded(ta->update(handle, {}, some(halves[0]))));
   bytes output;
   for (size_t fed = 0; fed < input.size(); fed += piece) {
     const size_t next = std::min(input.size(), fed + piece);
-    param_set params;
-    if (fed == 0 && !aad.empty()) params = associated(byte_view(aad).subspan(aad.size() / 2));
-    const reply step =
-        ta->send(step_request(command::UPDATE, handle, input.subspan(fed, next - fed), params,
-                              due(v, purpose, next) - due(v, purpose, fed)));
-    EXPECT_TRUE(succeeded(step)) << ta->trace().errors();
-    EXPECT_EQ(step.b, next - fed) << "consumed";
-    output.insert(output.end(), step.output().begin(), step.output().end());
+    const reply step = ta->send_well(step_request(
+        command::UPDATE, handle, input.subspan(fed, next - fed),
+        fed == 0 ? some(halves[1]) : param_set(), due(v, purpose, next) - due(v, purpose, fed)));
+    EXPECT_EQ(step.b, next - fed);
+    client::append(&output, step.output());
     EXPECT_EQ(output.size(), due(v, purpose, next)) << "after " << next << " bytes";
   }
-  const reply last = ta->finish(handle);
-  EXPECT_TRUE(succeeded(last)) << ta->trace().errors();
-  const bytes rest = finished(last);
-  output.insert(output.end(), rest.begin(), rest.end());
+  client::append(&output, finished(ta->send_well(step_request(command::FINISH, handle))));
   return output;
 }
 
 class aes : public testing::Test {
  protected:
   ta_under_test ta;
-  const bytes blob = ta.import(any_use(), from_hex(KEY_128));
+  const bytes blob = ta.import(ANY_USE, from_hex(KEY_128));
   const param_set gcm = use(KM_MODE_GCM, KM_PAD_NONE, 96);
   const param_set padded = use(KM_MODE_CBC, KM_PAD_PKCS7);
 };
@@ -159,11 +127,11 @@ class aes : public testing::Test {
 TEST_F(aes, makes_and_takes_the_vectors_in_pieces_of_every_size) {
   for (const stream_vector& v : VECTORS) {
     ta.watch_secret(from_hex(v.key));
-    const bytes its_blob = ta.import(any_use(), from_hex(v.key));
+    const bytes its_blob = ta.import(ANY_USE, from_hex(v.key));
     const bytes plain = from_hex(v.plaintext);
     const bytes cipher = from_hex(v.ciphertext);
     for (size_t piece = 1; piece <= 65; piece += piece < 20 ? 1 : 45) {
-      SCOPED_TRACE(std::string(v.name).append(" in pieces of ").append(std::to_string(piece)));
+      SCOPED_TRACE(v.name + std::to_string(piece));
       EXPECT_EQ(stream(&ta, v, ENCRYPT, its_blob, plain, piece), cipher);
       EXPECT_EQ(stream(&ta, v, DECRYPT, its_blob, cipher, piece), plain);
     }
@@ -171,47 +139,44 @@ TEST_F(aes, makes_and_takes_the_vectors_in_pieces_of_every_size) {
 }
 
 TEST_F(aes, keys_are_checked) {
-  const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
-  const std::string no_minimum = "No or too many KM_TAG_MIN_MAC_LENGTH";
+  const std::string no_size = "aes_generate_key: No or too many KM_TAG_KEY_SIZE or specified";
+  const std::string no_minimum = "aes_generate_key: No or too many KM_TAG_MIN_MAC_LENGTH";
+  const param_set good = with(ANY_USE, KM_TAG_KEY_SIZE, {128});
   const struct {
     param_set description;
     int32_t error;
-    std::string message;
+    std::string line;
   } rows[] = {
-      {any_use().add(KM_TAG_CREATION_DATETIME, 1), -38,
-       "Shouldn't specify KM_TAG_CREATION_DATETIME"},
-      {any_use(), -38, no_size},
-      {any_use().append(several(KM_TAG_KEY_SIZE, {128, 128})), -38, no_size},
-      {any_use().add(KM_TAG_KEY_SIZE, 160), -6, "Invalid AES key size 160"},
-      {any_use_but(KM_TAG_MIN_MAC_LENGTH, {}).add(KM_TAG_KEY_SIZE, 128), -58, no_minimum},
-      {any_use_but(KM_TAG_MIN_MAC_LENGTH, {96, 96}).add(KM_TAG_KEY_SIZE, 128), -58, no_minimum},
-      {any_use_but(KM_TAG_BLOCK_MODE, {KM_MODE_ECB}).add(KM_TAG_KEY_SIZE, 128), -38,
-       "Found KM_TAG_MIN_MAC_LENGTH without GCM"},
+      {with(good, KM_TAG_CREATION_DATETIME, {1}), -38,
+       "aes_generate_key: Shouldn't specify KM_TAG_CREATION_DATETIME"},
+      {ANY_USE, -38, no_size},
+      {with(good, KM_TAG_KEY_SIZE, {128, 128}), -38, no_size},
+      {with(good, KM_TAG_KEY_SIZE, {160}), -6, "aes_generate_key: Invalid AES key size 160"},
+      {with(good, KM_TAG_MIN_MAC_LENGTH, {}), -58, no_minimum},
+      {with(good, KM_TAG_MIN_MAC_LENGTH, {96, 96}), -58, no_minimum},
+      {with(good, KM_TAG_MIN_MAC_LENGTH, {88}), -59, ""},
+      {with(good, KM_TAG_MIN_MAC_LENGTH, {100}), -59, ""},
+      {with(good, KM_TAG_MIN_MAC_LENGTH, {136}), -59, ""},
+      {with(good, KM_TAG_BLOCK_MODE, {KM_MODE_ECB}), -38,
+       "aes_generate_key: Found KM_TAG_MIN_MAC_LENGTH without GCM"},
   };
-  for (const auto& row : rows) {
-    EXPECT_TRUE(refused(ta.send(generate_request(row.description)), row.error)) << row.message;
-    EXPECT_TRUE(ta.trace().has("aes_generate_key: " + row.message)) << row.message;
-  }
-  for (uint32_t bits : {88, 100, 136}) {
-    const param_set key = any_use_but(KM_TAG_MIN_MAC_LENGTH, {bits}).add(KM_TAG_KEY_SIZE, 128);
-    EXPECT_TRUE(refused(ta.send(generate_request(key)), -59)) << bits;
-  }
-  EXPECT_TRUE(refused(ta.send(import_request(any_use(), bytes(20))), -6));
-  const param_set said = any_use().add(KM_TAG_KEY_SIZE, 128);
-  EXPECT_TRUE(refused(ta.send(import_request(said, bytes(32))), -44));
-  EXPECT_TRUE(ta.trace().has("aes_import_key: Key size mismatch (given 128, guessed 256)"));
+  for (const auto& [description, error, line] : rows)
+    ta.expect_refused(generate_request(description), error, line);
+  ta.expect_refused(import_request(ANY_USE, bytes(20)), -6);
+  ta.expect_refused(import_request(good, bytes(32)), -44,
+                    "aes_import_key: Key size mismatch (given 128, guessed 256)");
 }
 
 TEST_F(aes, new_keys_say_where_they_come_from_and_stay_inside) {
-  const bytes imported = ta.import(any_use(), bytes(24, 7));
-  const bytes generated = ta.generate(any_use().add(KM_TAG_KEY_SIZE, 256));
+  const bytes imported = ta.import(ANY_USE, bytes(24, 7));
+  const bytes generated = ta.generate(with(ANY_USE, KM_TAG_KEY_SIZE, {256}));
   for (const auto& [made, origin, bits] :
        {std::tuple(imported, KM_ORIGIN_IMPORTED, 192u), {generated, KM_ORIGIN_GENERATED, 256u}}) {
     const param_set found = ta.characteristics(made);
     EXPECT_EQ(found.number(KM_TAG_KEY_SIZE), bits);
     EXPECT_EQ(found.number(KM_TAG_ORIGIN), origin);
     EXPECT_EQ(found.number(KM_TAG_CREATION_DATETIME), START_REE_MS / 1000 * 1000);
-    EXPECT_TRUE(refused(ta.send(key_request(command::EXPORT_KEY, made)), -17));
+    ta.expect_refused(key_request(command::EXPORT_KEY, made), -17);
   }
   const bytes text(48, 9);
   const bytes sealed = ta.run(ENCRYPT, generated, use(KM_MODE_ECB), text);
@@ -241,30 +206,26 @@ TEST_F(aes, begin_refuses) {
       {use(KM_MODE_GCM, KM_PAD_NONE, 128, block), -38, ""},
   };
   for (const auto& row : rows) {
-    for (const auto& [purpose, create] :
-         {std::pair(ENCRYPT, "create_aes_encrypt: "), {DECRYPT, "create_aes_decrypt: "}}) {
-      SCOPED_TRACE(std::string(create) + row.message + std::to_string(row.error));
-      EXPECT_TRUE(refused(ta.begin(purpose, blob, row.params), row.error));
-      EXPECT_TRUE(*row.message == 0 || ta.trace().has(std::string(create) + row.message));
-      EXPECT_TRUE(ta.trace().has("begin: Create operation failed"));
+    for (const uint32_t purpose : {ENCRYPT, DECRYPT}) {
+      const std::string create =
+          purpose == ENCRYPT ? "create_aes_encrypt: " : "create_aes_decrypt: ";
+      ta.expect_refused(begin_request(purpose, blob, row.params), row.error,
+                        *row.message == 0 ? "" : create + row.message);
+      EXPECT_TRUE(ta.trace().has("begin: Create operation failed")) << row.error;
     }
   }
-  EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, use(KM_MODE_ECB)), -2));
+  ta.expect_refused(begin_request(SIGN, blob, use(KM_MODE_ECB)), -2);
   // Padding that is absent or repeated is NONE, for authorisation as well.
   const bytes only_padded =
-      ta.import(any_use_but(KM_TAG_PADDING, {KM_PAD_PKCS7}), from_hex(KEY_128));
-  for (const param_set& none :
-       {use(KM_MODE_ECB), use(KM_MODE_ECB, KM_PAD_PKCS7).add(KM_TAG_PADDING, KM_PAD_PKCS7)}) {
-    EXPECT_TRUE(refused(ta.begin(ENCRYPT, only_padded, none), -11));
-  }
+      ta.import(with(ANY_USE, KM_TAG_PADDING, {KM_PAD_PKCS7}), from_hex(KEY_128));
+  const param_set twice = use(KM_MODE_ECB, KM_PAD_PKCS7).append(one(KM_TAG_PADDING, KM_PAD_PKCS7));
+  ta.expect_refused(begin_request(ENCRYPT, only_padded, use(KM_MODE_ECB)), -11);
+  ta.expect_refused(begin_request(ENCRYPT, only_padded, twice), -11);
 }
 
 TEST_F(aes, nonces_are_put_out_given_or_drawn_also_for_decryption) {
   const auto nonce_of = [&](uint32_t purpose, const param_set& params) {
-    const reply begun = ta.begin(purpose, blob, params);
-    EXPECT_TRUE(succeeded(begun));
-    EXPECT_TRUE(succeeded(ta.abort(begun.b)));
-    const param_set out = param_set::parse(begun.output());
+    const param_set out = param_set::parse(ta.try_begin(purpose, blob, params).output());
     return out.contains(KM_TAG_NONCE) ? out.find(KM_TAG_NONCE)->data : bytes();
   };
   const bytes given(BLOCK, 5);
@@ -331,15 +292,14 @@ TEST_F(aes, streams_must_end_where_they_can) {
       {DECRYPT, gcm, 12, -30},
   };
   for (const auto& row : rows) {
-    const uint32_t handle = ta.begun(row.purpose, blob, row.params);
-    EXPECT_TRUE(succeeded(ta.update(handle, bytes(row.length, 3))));
-    EXPECT_TRUE(refused(ta.finish(handle), row.error)) << row.length << " bytes";
+    EXPECT_TRUE(refused(ta.try_run(row.purpose, blob, row.params, bytes(row.length, 3)), row.error))
+        << row.length << " bytes";
   }
 }
 
 TEST_F(aes, gcm_decryption_puts_out_text_and_refuses_its_tag_at_the_end) {
   const stream_vector& v = VECTORS[3];
-  const bytes its_blob = ta.import(any_use(), from_hex(v.key));
+  const bytes its_blob = ta.import(ANY_USE, from_hex(v.key));
   const bytes good = from_hex(v.ciphertext);
   for (size_t altered : {size_t{0}, good.size() - 17, good.size() - 16, good.size() - 1}) {
     bytes input = good;
@@ -364,9 +324,7 @@ TEST_F(aes, padding_has_only_an_upper_bound) {
     block[BLOCK - 2] = row.before_last;
     block[BLOCK - 1] = row.last;
     const bytes sealed = ta.run(ENCRYPT, blob, use(KM_MODE_ECB), block);
-    const uint32_t handle = ta.begun(DECRYPT, blob, use(KM_MODE_ECB, KM_PAD_PKCS7));
-    EXPECT_TRUE(succeeded(ta.update(handle, sealed)));
-    const reply last = ta.finish(handle);
+    const reply last = ta.try_run(DECRYPT, blob, use(KM_MODE_ECB, KM_PAD_PKCS7), sealed);
     EXPECT_TRUE(refused(last, row.error)) << "last byte " << int{row.last};
     EXPECT_EQ(last.ok(), !ta.trace().has("aes_decrypt_finish: Illegal padding"));
     block.resize(row.length);

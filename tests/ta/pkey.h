@@ -7,6 +7,7 @@
 #include <openssl/evp.h>
 #include <openssl/rsa.h>
 
+#include "support/sets.h"
 #include "support/ta_under_test.h"
 
 namespace keymaster::test {
@@ -16,6 +17,12 @@ struct scheme {
   uint32_t padding;
   uint32_t digest;
 };
+
+// use: what a begin of it asks for.
+inline param_set use(scheme how) {
+  const param_set params = one(KM_TAG_DIGEST, how.digest);
+  return how.padding == 0 ? params : param_set(params).add(KM_TAG_PADDING, how.padding);
+}
 
 // pkey: a key pair or public key. Failures of libcrypto throw.
 class pkey {
