@@ -1,8 +1,5 @@
 // AES through the command interface: published vectors, streams in pieces of every size, and what
 // is refused.
-#include <algorithm>
-#include <string>
-
 #include "support/sets.h"
 #include "support/ta_under_test.h"
 
@@ -10,6 +7,7 @@ namespace keymaster::test {
 namespace {
 
 using client::from_hex;
+using namespace std::string_literals;
 
 constexpr size_t BLOCK = 16;
 
@@ -206,9 +204,8 @@ TEST_F(aes, begin_refuses) {
       {use(KM_MODE_GCM, KM_PAD_NONE, 128, block), -38, ""},
   };
   for (const auto& row : rows) {
-    for (const uint32_t purpose : {ENCRYPT, DECRYPT}) {
-      const std::string create =
-          purpose == ENCRYPT ? "create_aes_encrypt: " : "create_aes_decrypt: ";
+    for (const auto& [purpose, create] :
+         {std::pair(ENCRYPT, "create_aes_encrypt: "s), {DECRYPT, "create_aes_decrypt: "s}}) {
       ta.expect_refused(begin_request(purpose, blob, row.params), row.error,
                         *row.message == 0 ? "" : create + row.message);
       EXPECT_TRUE(ta.trace().has("begin: Create operation failed")) << row.error;
@@ -275,25 +272,17 @@ TEST_F(aes, updates_refuse) {
 }
 
 TEST_F(aes, streams_must_end_where_they_can) {
-  const struct {
-    uint32_t purpose;
-    param_set params;
-    size_t length;
-    int32_t error;
-  } rows[] = {
-      {ENCRYPT, use(KM_MODE_ECB), 15, -21},
-      {ENCRYPT, use(KM_MODE_CBC), 17, -21},
-      {ENCRYPT, use(KM_MODE_CBC), 0, 0},
-      {DECRYPT, use(KM_MODE_ECB), 15, -21},
-      {DECRYPT, padded, 17, -21},
-      {DECRYPT, padded, 0, -21},
-      {DECRYPT, gcm, 0, -30},
-      {DECRYPT, gcm, 11, -30},
-      {DECRYPT, gcm, 12, -30},
-  };
-  for (const auto& row : rows) {
-    EXPECT_TRUE(refused(ta.try_run(row.purpose, blob, row.params, bytes(row.length, 3)), row.error))
-        << row.length << " bytes";
+  for (const auto& [purpose, params, length, error] :
+       {std::tuple(ENCRYPT, use(KM_MODE_ECB), 15u, -21),
+        {ENCRYPT, use(KM_MODE_CBC), 17, -21},
+        {ENCRYPT, use(KM_MODE_CBC), 0, 0},
+        {DECRYPT, use(KM_MODE_ECB), 15, -21},
+        {DECRYPT, padded, 17, -21},
+        {DECRYPT, padded, 0, -21},
+        {DECRYPT, gcm, 0, -30},
+        {DECRYPT, gcm, 11, -30},
+        {DECRYPT, gcm, 12, -30}}) {
+    EXPECT_TRUE(refused(ta.try_run(purpose, blob, params, bytes(length, 3)), error)) << length;
   }
 }
 

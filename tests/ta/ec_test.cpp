@@ -1,7 +1,5 @@
 // EC keys and ECDSA through the command interface: every curve and digest against libcrypto, and
 // what is refused.
-#include "support/sets.h"
-#include "support/ta_under_test.h"
 #include "ta/pkey.h"
 
 namespace keymaster::test {
@@ -9,8 +7,6 @@ namespace {
 
 using client::as_bytes;
 using client::from_hex;
-
-constexpr uint32_t UNKNOWN_DIGEST = 7;
 
 struct curve_row {
   uint32_t bits;
@@ -24,19 +20,7 @@ const curve_row CURVES[] = {{224, KM_EC_CURVE_P_224},
                             {384, KM_EC_CURVE_P_384},
                             {521, KM_EC_CURVE_P_521}};
 
-param_set any_use() {
-  param_set key = one(KM_TAG_ALGORITHM, KM_ALGORITHM_EC)
-                      .add(KM_TAG_PURPOSE, KM_PURPOSE_SIGN)
-                      .add(KM_TAG_PURPOSE, KM_PURPOSE_VERIFY)
-                      .add_flag(KM_TAG_NO_AUTH_REQUIRED);
-  for (uint32_t digest = KM_DIGEST_NONE; digest <= UNKNOWN_DIGEST; digest++)
-    key.add(KM_TAG_DIGEST, digest);
-  return key;
-}
-
-param_set new_key(uint64_t bits) {
-  return any_use().add(KM_TAG_KEY_SIZE, bits);
-}
+const param_set ANY_USE = any_use(KM_ALGORITHM_EC);
 
 param_set use(uint32_t digest) {
   return one(KM_TAG_DIGEST, digest);
@@ -44,10 +28,9 @@ param_set use(uint32_t digest) {
 
 class Ec : public testing::Test {
  protected:
+  bytes imported(const curve_row& row) { return ta.import(ANY_USE, row.key.import_data()); }
   reply verify(byte_view blob, uint32_t digest, byte_view message, byte_view signature) {
-    const uint32_t handle = ta.begun(KM_PURPOSE_VERIFY, blob, use(digest));
-    EXPECT_TRUE(succeeded(ta.update(handle, message))) << ta.trace().errors();
-    return ta.finish(handle, signature);
+    return ta.try_run(VERIFY, blob, use(digest), message, signature);
   }
 
   ta_under_test ta;
@@ -56,7 +39,7 @@ class Ec : public testing::Test {
 TEST_F(Ec, NoOtherSignatureVerifies) {
   const scheme how = {0, KM_DIGEST_SHA_2_256};
   for (const curve_row& row : CURVES) {
-    const bytes blob = ta.import(any_use(), row.key.import_data());
+    const bytes blob = imported(row);
     const bytes signature = row.key.sign(how, as_bytes("sample"));
     const auto expect_invalid = [&](const bytes& other) {
       EXPECT_TRUE(refused(verify(blob, how.digest, as_bytes("sample"), other), -30)) << row.bits;
@@ -79,43 +62,38 @@ TEST_F(Ec, NoOtherSignatureVerifies) {
 TEST_F(Ec, SignaturesAreThoseOfTheStandards) {
   for (const curve_row& row : CURVES) {
     const pkey& key = row.key;
-    const bytes blob = ta.import(any_use(), key.import_data());
+    const bytes blob = imported(row);
     for (uint32_t digest = KM_DIGEST_NONE; digest <= UNKNOWN_DIGEST; digest++) {
       SCOPED_TRACE(std::to_string(row.bits) + " bits, digest " + std::to_string(digest));
       if (digest == KM_DIGEST_MD5 || digest == UNKNOWN_DIGEST) {
         const int32_t error = digest == KM_DIGEST_MD5 ? -13 : -12;
-        EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, use(digest)), error));
-        EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_VERIFY, blob, use(digest)), error));
+        ta.expect_refused(begin_request(SIGN, blob, use(digest)), error);
+        ta.expect_refused(begin_request(VERIFY, blob, use(digest)), error);
         continue;
       }
       // What is not hashed may be shorter than the curve, and is no longer than it.
       const bytes message(digest == KM_DIGEST_NONE ? row.size() : 200, 0xA7);
       for (int i = 0; i < 4; i++) {
-        const bytes made = ta.run(KM_PURPOSE_SIGN, blob, use(digest), message);
+        const bytes made = ta.run(SIGN, blob, use(digest), message);
         EXPECT_TRUE(key.verify({0, digest}, message, made));
-        const bytes foreign = key.sign({0, digest}, message);
-        EXPECT_TRUE(succeeded(verify(blob, digest, message, foreign)));
+        EXPECT_TRUE(succeeded(verify(blob, digest, message, key.sign({0, digest}, message))));
       }
       const byte_view part = byte_view(message).first(11);
-      EXPECT_TRUE(key.verify({0, digest}, part, ta.run(KM_PURPOSE_SIGN, blob, use(digest), part)));
+      EXPECT_TRUE(key.verify({0, digest}, part, ta.run(SIGN, blob, use(digest), part)));
     }
   }
 }
 
 TEST_F(Ec, DataThatIsNotHashedIsCutToTheCurve) {
   for (const curve_row& row : CURVES) {
-    const pkey& key = row.key;
-    const bytes blob = ta.import(any_use(), key.import_data());
-    const uint32_t handle = ta.begun(KM_PURPOSE_SIGN, blob, use(KM_DIGEST_NONE));
+    const bytes blob = imported(row);
+    const uint32_t handle = ta.begun(SIGN, blob, use(KM_DIGEST_NONE));
     const bytes message(100, 0xC5);
     EXPECT_EQ(ta.update(handle, byte_view(message).first(20)).b, 20U);
     EXPECT_EQ(ta.update(handle, byte_view(message).subspan(20)).b, row.size() - 20);
     EXPECT_EQ(ta.update(handle, message).b, 0U);
-    const reply last = ta.finish(handle, message);  // whose data is not signed either
-    ASSERT_TRUE(succeeded(last));
-    client::finish_result result;
-    client::parse_finished(last.output(), &result);
-    EXPECT_TRUE(key.verify({0, 0}, byte_view(message).first(row.size()), result.output));
+    const bytes made = finished(ta.finish(handle, message));  // whose data is not signed either
+    EXPECT_TRUE(row.key.verify({0, 0}, byte_view(message).first(row.size()), made));
   }
 }
 
@@ -124,40 +102,40 @@ TEST_F(Ec, NewKeysAreChecked) {
   bytes small = data;
   small[0] = 192;  // of a size field of 256
   small[1] = 0;
+  const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
+  const auto size = [](uint32_t bits) { return with(ANY_USE, KM_TAG_KEY_SIZE, {bits}); };
   const struct {
     param_set description;
-    const bytes* data;  // null: generate
+    bytes data;  // none: generate
     int32_t error;
     std::string message;
   } rows[] = {
-      {any_use(), nullptr, -38, "No or too many KM_TAG_KEY_SIZE or specified"},
-      {new_key(256).add(KM_TAG_KEY_SIZE, 256), nullptr, -38,
-       "No or too many KM_TAG_KEY_SIZE or specified"},
+      {ANY_USE, {}, -38, no_size},
+      {with(ANY_USE, KM_TAG_KEY_SIZE, {256, 256}), {}, -38, no_size},
       // The size comes first, whatever else is wrong.
-      {new_key(192).add(KM_TAG_ORIGIN, 0), nullptr, -6, "Invalid EC key size 192"},
-      {new_key(256).add(KM_TAG_ORIGIN, 0), nullptr, -38, "Shouldn't specify KM_TAG_ORIGIN"},
-      {new_key(256).add(KM_TAG_EC_CURVE, 1), nullptr, -38, "Shouldn't specify KM_TAG_EC_CURVE"},
-      {new_key(384), &data, -44, "Key size mismatch (given 384, guessed 256)"},
-      {any_use(), &small, -6, "Invalid EC key size 192"},
-      {any_use().add(KM_TAG_CREATION_DATETIME, 1), &data, -38,
+      {size(192).add(KM_TAG_ORIGIN, 0), {}, -6, "Invalid EC key size 192"},
+      {size(256).add(KM_TAG_ORIGIN, 0), {}, -38, "Shouldn't specify KM_TAG_ORIGIN"},
+      {size(256).add(KM_TAG_EC_CURVE, 1), {}, -38, "Shouldn't specify KM_TAG_EC_CURVE"},
+      {size(384), data, -44, "Key size mismatch (given 384, guessed 256)"},
+      {ANY_USE, small, -6, "Invalid EC key size 192"},
+      {with(ANY_USE, KM_TAG_CREATION_DATETIME, {1}), data, -38,
        "Shouldn't specify KM_TAG_CREATION_DATETIME"},
-      {any_use().add(KM_TAG_EC_CURVE, 1), &data, -38, "Shouldn't specify KM_TAG_EC_CURVE"},
+      {with(ANY_USE, KM_TAG_EC_CURVE, {1}), data, -38, "Shouldn't specify KM_TAG_EC_CURVE"},
   };
   for (const auto& row : rows) {
-    const reply answer = ta.send(row.data == nullptr ? generate_request(row.description)
-                                                     : import_request(row.description, *row.data));
-    EXPECT_TRUE(refused(answer, row.error)) << row.message;
-    const std::string function = row.data == nullptr ? "ec_generate_key: " : "ec_import_key: ";
-    EXPECT_TRUE(ta.trace().has(function + row.message)) << ta.trace().errors();
+    const bool generates = row.data.empty();
+    ta.expect_refused(
+        generates ? generate_request(row.description) : import_request(row.description, row.data),
+        row.error, (generates ? "ec_generate_key: " : "ec_import_key: ") + row.message);
   }
 }
 
 TEST_F(Ec, KeysAreDescribedAndExported) {
   for (const curve_row& row : CURVES) {
-    const bytes generated = ta.generate(new_key(row.bits));
+    const bytes generated = ta.generate(with(ANY_USE, KM_TAG_KEY_SIZE, {row.bits}));
     bytes trailing = row.key.import_data();
     trailing.push_back(9);
-    const bytes taken = ta.import(any_use(), trailing);
+    const bytes taken = ta.import(ANY_USE, trailing);
     EXPECT_EQ(generated.size(), taken.size()) << "records of one size";
     for (const auto& [blob, origin] :
          {std::pair(generated, KM_ORIGIN_GENERATED), {taken, KM_ORIGIN_IMPORTED}}) {
@@ -166,10 +144,9 @@ TEST_F(Ec, KeysAreDescribedAndExported) {
       EXPECT_EQ(found.number(KM_TAG_EC_CURVE), row.km_curve);
       EXPECT_EQ(found.number(KM_TAG_ORIGIN), origin);
       EXPECT_EQ(found.number(KM_TAG_CREATION_DATETIME), START_REE_MS / 1000 * 1000);
-      const reply exported = ta.send(key_request(command::EXPORT_KEY, blob));
-      ASSERT_TRUE(succeeded(exported));
+      const reply exported = ta.send_well(key_request(command::EXPORT_KEY, blob));
       const pkey key = pkey::ec_public(exported.output());
-      const bytes signature = ta.run(KM_PURPOSE_SIGN, blob, use(KM_DIGEST_SHA1), as_bytes("a"));
+      const bytes signature = ta.run(SIGN, blob, use(KM_DIGEST_SHA1), as_bytes("a"));
       EXPECT_TRUE(key.verify({0, KM_DIGEST_SHA1}, as_bytes("a"), signature));
     }
   }
@@ -177,15 +154,10 @@ TEST_F(Ec, KeysAreDescribedAndExported) {
 
 TEST_F(Ec, NumbersThatAreNoKeyAreRefusedWhenUsed) {
   const bytes good = CURVES[1].key.import_data();
-  client::field_reader in(good);
-  EXPECT_EQ(in.u32(), 256u);
-  const auto next = [&] {
-    const byte_view field = in.field();
-    return bytes(field.begin(), field.end());
-  };
-  const bytes x = next();
-  const bytes y = next();
-  const bytes d = next();
+  client::field_reader in(byte_view(good).subspan(4));
+  const bytes x = client::copy_of(in.field());
+  const bytes y = client::copy_of(in.field());
+  const bytes d = client::copy_of(in.field());
   const bytes order = from_hex("ffffffff00000000ffffffffffffffffbce6faada7179e84f3b9cac2fc632551");
   const bytes too_long(80, 0x11);
   const bytes zero(32);
@@ -197,16 +169,16 @@ TEST_F(Ec, NumbersThatAreNoKeyAreRefusedWhenUsed) {
   for (const auto& row : rows) {
     client::field_writer out;
     out.u32(256).field(row.x).field(row.y).field(row.d);
-    const bytes blob = ta.import(any_use(), out.take());
-    EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, use(KM_DIGEST_SHA1)), -1000));
-    EXPECT_TRUE(ta.trace().has("create_ec_sign: Resolve key data failed"));
+    const bytes blob = ta.import(ANY_USE, out.take());
+    ta.expect_refused(begin_request(SIGN, blob, use(KM_DIGEST_SHA1)), -1000,
+                      "create_ec_sign: Resolve key data failed");
   }
-  const bytes blob = ta.import(any_use(), good);
-  for (const param_set& params : {param_set(), use(4).add(KM_TAG_DIGEST, 4)}) {
-    EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_VERIFY, blob, params), -38));
-    EXPECT_TRUE(ta.trace().has("create_ec_verify: No or too many KM_TAG_DIGEST"));
+  const bytes blob = ta.import(ANY_USE, good);
+  for (const param_set& params : {param_set(), several(KM_TAG_DIGEST, {4, 4})}) {
+    ta.expect_refused(begin_request(VERIFY, blob, params), -38,
+                      "create_ec_verify: No or too many KM_TAG_DIGEST");
   }
-  EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_ENCRYPT, blob, use(4)), -2));
+  ta.expect_refused(begin_request(ENCRYPT, blob, use(4)), -2);
 }
 
 }  // namespace

@@ -1,6 +1,4 @@
 // HMAC keys and operations: published MACs through import and sign, and what is refused.
-#include <gtest/gtest.h>
-
 #include "support/blob_forge.h"
 #include "support/sets.h"
 #include "support/ta_under_test.h"
@@ -10,8 +8,7 @@ namespace {
 
 using client::as_bytes;
 using client::to_hex;
-
-constexpr uint32_t SIGN = KM_PURPOSE_SIGN;
+using namespace std::string_literals;
 
 // RFC 2202 (SHA-1) and RFC 4231 (SHA-2) with keys of one repeated byte. The last was
 // computed with the openssl command.
@@ -66,26 +63,18 @@ TEST(Hmac, TakesDataInAnyPiecesAndNothingAtFinish) {
 }
 
 TEST(Hmac, MacLengthIsMeasuredAtTheEnd) {
-  const std::string too_long =
-      "hmac_sign_finish: Too short output of HMAC operation, expect at least ";
-  const struct {
-    uint32_t bits;
-    size_t length;  // 0: refused
-    std::string errors;
-  } cases[] = {
-      {64, 8, ""},
-      {100, 12, ""},  // whole bytes are given
-      {256, 32, ""},
-      {264, 0, too_long + "33B, got 32B | finish: Finish failed"},
-      {0xFFFFFFFF, 0, too_long + "536870911B, got 32B | finish: Finish failed"},
-  };
   ta_under_test ta;
   const bytes blob = ta.generate(hmac_key(256));
-  for (const auto& c : cases) {
-    const reply done = ta.finish(ta.begun(SIGN, blob, mac_use(c.bits)));
-    EXPECT_TRUE(refused(done, c.length == 0 ? KM_ERROR_UNKNOWN_ERROR : 0)) << c.bits;
-    EXPECT_EQ(done.output_size, c.length == 0 ? 0 : 4 + c.length + 8) << c.bits;
-    EXPECT_EQ(ta.trace().errors(), c.errors);
+  for (const auto& [bits, length] : {std::pair(64u, 8u), {100, 12}, {256, 32}}) {  // whole bytes
+    EXPECT_EQ(ta.run(SIGN, blob, mac_use(bits), {}).size(), length);
+  }
+  for (const auto& [bits, need] : {std::pair(264u, "33"), {0xFFFFFFFF, "536870911"}}) {
+    const reply done = ta.try_run(SIGN, blob, mac_use(bits), {});
+    EXPECT_TRUE(refused(done, KM_ERROR_UNKNOWN_ERROR)) << bits;
+    EXPECT_EQ(done.output_size, 0u);
+    EXPECT_EQ(ta.trace().errors(),
+              "hmac_sign_finish: Too short output of HMAC operation, expect at least "s + need +
+                  "B, got 32B | finish: Finish failed");
   }
 }
 
@@ -94,50 +83,45 @@ TEST(Hmac, VerifyAlwaysEndsOutOfMemory) {
   ta_under_test ta;
   const bytes blob = ta.generate(hmac_key(256));
   const bytes mac = ta.run(SIGN, blob, mac_use(128), as_bytes("data"));
-  const uint32_t handle = ta.begun(KM_PURPOSE_VERIFY, blob, mac_use(128));
-  EXPECT_EQ(ta.update(handle, as_bytes("data")).b, 4u);
-  EXPECT_TRUE(refused(ta.finish(handle, mac), KM_ERROR_MEMORY_ALLOCATION_FAILED));
+  EXPECT_TRUE(refused(ta.try_run(VERIFY, blob, mac_use(128), as_bytes("data"), mac),
+                      KM_ERROR_MEMORY_ALLOCATION_FAILED));
   EXPECT_TRUE(ta.trace().has("hmac_verify_finish: Out of memory, need 16B"));
 }
 
 TEST(Hmac, RefusesDescriptionsInOrder) {
   const param_set good = hmac_key(256);
-  const auto with = [&](keymaster_tag_t tag, uint64_t number) {
-    return without(good, tag).add(tag, number);
-  };
+  const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
+  const std::string no_minimum = "No or too many KM_TAG_MIN_MAC_LENGTH or specified";
   const struct {
     param_set key;
     int32_t error;
-    const char* errors;  // empty: no line
+    std::string message;  // empty: no line
   } cases[] = {
-      {with(KM_TAG_MIN_MAC_LENGTH, 56).add(KM_TAG_ORIGIN, 0), -38,
+      {with(good, KM_TAG_MIN_MAC_LENGTH, {56}).add(KM_TAG_ORIGIN, 0), -38,
        "Shouldn't specify KM_TAG_ORIGIN"},
-      {with(KM_TAG_OS_VERSION, 1), -38, "Shouldn't specify KM_TAG_OS_VERSION"},
-      {with(KM_TAG_OS_PATCHLEVEL, 1), -38, "Shouldn't specify KM_TAG_OS_PATCHLEVEL"},
-      {with(KM_TAG_CREATION_DATETIME, 1), -38, "Shouldn't specify KM_TAG_CREATION_DATETIME"},
-      {hmac_key(), -38, "No or too many KM_TAG_KEY_SIZE or specified"},
-      {param_set(good).add(KM_TAG_KEY_SIZE, 256), -38,
-       "No or too many KM_TAG_KEY_SIZE or specified"},
-      {with(KM_TAG_KEY_SIZE, 0), -6, "Invalid hmac key size 0"},
-      {with(KM_TAG_KEY_SIZE, 12), -6, "Invalid hmac key size 12"},
-      {with(KM_TAG_KEY_SIZE, 1032), -6, "Invalid hmac key size 1032"},
-      {without(good, KM_TAG_MIN_MAC_LENGTH), -38,
-       "No or too many KM_TAG_MIN_MAC_LENGTH or specified"},
-      {param_set(good).add(KM_TAG_MIN_MAC_LENGTH, 64), -38,
-       "No or too many KM_TAG_MIN_MAC_LENGTH or specified"},
-      {with(KM_TAG_MIN_MAC_LENGTH, 56), -59, "Invalid KM_TAG_MIN_MAC_LENGTH 56"},
-      {with(KM_TAG_MIN_MAC_LENGTH, 129), -59, "Invalid KM_TAG_MIN_MAC_LENGTH 129"},
+      {with(good, KM_TAG_OS_VERSION, {1}), -38, "Shouldn't specify KM_TAG_OS_VERSION"},
+      {with(good, KM_TAG_OS_PATCHLEVEL, {1}), -38, "Shouldn't specify KM_TAG_OS_PATCHLEVEL"},
+      {with(good, KM_TAG_CREATION_DATETIME, {1}), -38,
+       "Shouldn't specify KM_TAG_CREATION_DATETIME"},
+      {hmac_key(), -38, no_size},
+      {with(good, KM_TAG_KEY_SIZE, {256, 256}), -38, no_size},
+      {with(good, KM_TAG_KEY_SIZE, {0}), -6, "Invalid hmac key size 0"},
+      {with(good, KM_TAG_KEY_SIZE, {12}), -6, "Invalid hmac key size 12"},
+      {with(good, KM_TAG_KEY_SIZE, {1032}), -6, "Invalid hmac key size 1032"},
+      {without(good, KM_TAG_MIN_MAC_LENGTH), -38, no_minimum},
+      {with(good, KM_TAG_MIN_MAC_LENGTH, {64, 64}), -38, no_minimum},
+      {with(good, KM_TAG_MIN_MAC_LENGTH, {56}), -59, "Invalid KM_TAG_MIN_MAC_LENGTH 56"},
+      {with(good, KM_TAG_MIN_MAC_LENGTH, {129}), -59, "Invalid KM_TAG_MIN_MAC_LENGTH 129"},
       {without(good, KM_TAG_DIGEST), -12, "No or too many KM_TAG_DIGEST"},
-      {param_set(good).add(KM_TAG_DIGEST, 4), -12, "No or too many KM_TAG_DIGEST"},
-      {with(KM_TAG_DIGEST, KM_DIGEST_NONE), -12, ""},
-      {with(KM_TAG_DIGEST, KM_DIGEST_MD5), -12, ""},
-      {with(KM_TAG_DIGEST, 7), -12, ""},
+      {with(good, KM_TAG_DIGEST, {4, 4}), -12, "No or too many KM_TAG_DIGEST"},
+      {with(good, KM_TAG_DIGEST, {KM_DIGEST_NONE}), -12, ""},
+      {with(good, KM_TAG_DIGEST, {KM_DIGEST_MD5}), -12, ""},
+      {with(good, KM_TAG_DIGEST, {UNKNOWN_DIGEST}), -12, ""},
   };
   ta_under_test ta;
-  for (const auto& c : cases) {
-    EXPECT_TRUE(refused(ta.send(generate_request(c.key)), c.error)) << c.errors;
-    const std::string line = c.errors;
-    EXPECT_EQ(ta.trace().errors(), line.empty() ? "" : "hmac_generate_key: " + line);
+  for (const auto& [key, error, message] : cases) {
+    EXPECT_TRUE(refused(ta.send(generate_request(key)), error)) << message;
+    EXPECT_EQ(ta.trace().errors(), message.empty() ? "" : "hmac_generate_key: " + message);
   }
 }
 
@@ -145,30 +129,21 @@ TEST(Hmac, RefusesDescriptionsInOrder) {
 TEST(Hmac, MinimumMacLengthEndsAtTheDigests) {
   ta_under_test ta;
   for (const auto& [digest, bits] : {std::pair{2u, 160u}, {3, 224}, {4, 256}, {5, 384}, {6, 512}}) {
-    const param_set key = without(hmac_key(1024, digest), KM_TAG_MIN_MAC_LENGTH);
-    const bytes blob = ta.generate(param_set(key).add(KM_TAG_MIN_MAC_LENGTH, bits));
+    const param_set key = hmac_key(1024, digest);
+    const bytes blob = ta.generate(with(key, KM_TAG_MIN_MAC_LENGTH, {bits}));
     EXPECT_EQ(ta.run(SIGN, blob, mac_use(bits, digest), {}).size(), bits / 8);
-    const param_set beyond = param_set(key).add(KM_TAG_MIN_MAC_LENGTH, bits + 8);
-    EXPECT_TRUE(refused(ta.send(generate_request(beyond)), -59)) << digest;
+    ta.expect_refused(generate_request(with(key, KM_TAG_MIN_MAC_LENGTH, {bits + 8})), -59);
   }
 }
 
 TEST(Hmac, ImportTakesItsSizeFromTheData) {
-  const struct {
-    uint32_t bits;
-    size_t size;
-    int32_t error;
-    const char* errors;
-  } cases[] = {
-      {160, 20, 0, ""},
-      {128, 20, -44, "hmac_import_key: Key size mismatch (given 128, guessed 160)"},
-      {0, 0, -6, "hmac_import_key: Invalid hmac key size 0"},
-      {0, 129, -6, "hmac_import_key: Invalid hmac key size 1032"},
-  };
   ta_under_test ta;
-  for (const auto& c : cases) {
-    EXPECT_TRUE(refused(ta.send(import_request(hmac_key(c.bits), bytes(c.size, 1))), c.error));
-    EXPECT_EQ(ta.trace().errors(), c.errors);
+  for (const auto& [bits, size, error, errors] :
+       {std::tuple(160u, 20u, 0, ""),
+        {128, 20, -44, "hmac_import_key: Key size mismatch (given 128, guessed 160)"},
+        {0, 0, -6, "hmac_import_key: Invalid hmac key size 0"},
+        {0, 129, -6, "hmac_import_key: Invalid hmac key size 1032"}}) {
+    ta.expect_refused(import_request(hmac_key(bits), bytes(size, 1)), error, errors);
   }
   // A repeated size counts as absent, and one more is added.
   const bytes blob = ta.import(hmac_key(128).add(KM_TAG_KEY_SIZE, 128), bytes(20, 1));
@@ -196,10 +171,8 @@ TEST(Hmac, BeginRefusesRequestsAndRecords) {
       {seal(blob_plaintext(record, made)), mac_use(), -1000,
        "hmac_resolve_key_data: Too short input"},
   };
-  for (const auto& c : cases) {
-    EXPECT_TRUE(refused(ta.begin(SIGN, c.blob, c.use), c.error)) << c.line;
-    EXPECT_TRUE(ta.trace().has(c.line)) << ta.trace().errors();
-  }
+  for (const auto& c : cases)
+    ta.expect_refused(begin_request(SIGN, c.blob, c.use), c.error, c.line);
 }
 
 }  // namespace

@@ -1,6 +1,4 @@
 // begin, update, finish and _abort: what each refuses, and what ends an operation.
-#include <gtest/gtest.h>
-
 #include "support/blob_forge.h"
 #include "support/sets.h"
 #include "support/ta_under_test.h"
@@ -9,8 +7,6 @@ namespace keymaster::test {
 namespace {
 
 using client::as_bytes;
-
-constexpr uint32_t SIGN = KM_PURPOSE_SIGN;
 
 class Operations : public testing::Test {
  protected:
