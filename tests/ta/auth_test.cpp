@@ -162,11 +162,11 @@ TEST_F(auth, clock_follows_system_time_alone) {
 }
 
 TEST_F(auth, rate_limit_counts_whole_seconds_and_includes_the_limit) {
-  // A record that only counts uses is no use before the first.
+  // A limit beyond the device's uptime: a record that only counts uses is no use at time 0.
   const bytes key =
-      ta.generate(signer(KM_TAG_MAX_USES_PER_BOOT, 9).add(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 10));
+      ta.generate(signer(KM_TAG_MAX_USES_PER_BOOT, 9).add(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 10'000));
   expect_sign(key);
-  ta.advance(10'749);  // begun a quarter into a second: the last millisecond of the tenth
+  ta.advance(10'000'749);  // begun a quarter into a second: the last millisecond of the limit's
   expect_sign(key, -54, TOO_SOON);
   ta.advance(1);
   expect_sign(key);
