@@ -1,6 +1,4 @@
 // The commands that make, describe, export, upgrade and delete keys.
-#include <gtest/gtest.h>
-
 #include "support/blob_forge.h"
 #include "support/sets.h"
 #include "support/ta_under_test.h"
@@ -17,73 +15,68 @@ client::application app(std::string_view id, std::string_view data) {
 }
 
 param_set bound() {
-  return hmac_key(256)
-      .add_bytes(KM_TAG_APPLICATION_ID, as_bytes("id"))
-      .add_bytes(KM_TAG_APPLICATION_DATA, as_bytes("data"));
+  return hmac_key(256).append(bound_to("id", "data"));
 }
 
 TEST(MakeKey, RefusesAndClearsItsOutput) {
-  const param_set none = without(hmac_key(256), KM_TAG_ALGORITHM);
-  const param_set usage = one(KM_TAG_BLOB_USAGE_REQUIREMENTS, 0);
+  const param_set good = hmac_key(256);
   const struct {
     param_set key;
     int32_t error;
-    const char* generate_errors;
-    const char* import_errors;
+    std::string generate_errors;
+    std::string import_errors;
   } cases[] = {
-      {none, -38, "generate_key: No KM_TAG_ALGORITHM or many KM_TAG_ALGORITHM",
-       "import_key: No or too many KM_TAG_ALGORITHM"},
-      {hmac_key(256).add(KM_TAG_ALGORITHM, KM_ALGORITHM_HMAC), -38,
+      {without(good, KM_TAG_ALGORITHM), -38,
        "generate_key: No KM_TAG_ALGORITHM or many KM_TAG_ALGORITHM",
        "import_key: No or too many KM_TAG_ALGORITHM"},
-      {param_set(none).add(KM_TAG_ALGORITHM, 2), -4, "",
+      {with(good, KM_TAG_ALGORITHM, {KM_ALGORITHM_HMAC, KM_ALGORITHM_HMAC}), -38,
+       "generate_key: No KM_TAG_ALGORITHM or many KM_TAG_ALGORITHM",
+       "import_key: No or too many KM_TAG_ALGORITHM"},
+      {with(good, KM_TAG_ALGORITHM, {2}), -4, "",
        "import_key: Unsupport import_key for algorithm  (2)"},
-      {hmac_key(256).add(KM_TAG_ORIGIN, 0), -38,
-       "hmac_generate_key: Shouldn't specify KM_TAG_ORIGIN",
+      {with(good, KM_TAG_ORIGIN, {0}), -38, "hmac_generate_key: Shouldn't specify KM_TAG_ORIGIN",
        "hmac_import_key: Shouldn't specify KM_TAG_ORIGIN"},
-      {hmac_key(256).append(usage).append(usage), -40,
+      {with(good, KM_TAG_BLOB_USAGE_REQUIREMENTS, {0, 0}), -40,
        "generate_key: Too many KM_TAG_BLOB_USAGE_REQUIREMENTS specified",
        "import_key: Too many KM_TAG_BLOB_USAGE_REQUIREMENTS specified"},
   };
   ta_under_test ta;
   for (const auto& c : cases) {
-    const reply generated = ta.send(generate_request(c.key, 600));
-    EXPECT_TRUE(refused(generated, c.error));
-    EXPECT_EQ(ta.trace().errors(), c.generate_errors);
-    EXPECT_EQ(generated.buffer, bytes(600)) << c.generate_errors;
-    EXPECT_EQ(generated.output_size, 0u);
-    const reply imported = ta.send(import_request(c.key, KEY, 600));
-    EXPECT_TRUE(refused(imported, c.error));
-    EXPECT_EQ(ta.trace().errors(), c.import_errors);
-    EXPECT_EQ(imported.buffer, bytes(600)) << c.import_errors;
-    EXPECT_EQ(imported.output_size, 600u);  // left as it was
+    for (const bool generates : {true, false}) {
+      SCOPED_TRACE(generates ? c.generate_errors : c.import_errors);
+      const reply answer =
+          ta.send(generates ? generate_request(c.key, 600) : import_request(c.key, KEY, 600));
+      EXPECT_TRUE(refused(answer, c.error));
+      EXPECT_EQ(ta.trace().errors(), generates ? c.generate_errors : c.import_errors);
+      EXPECT_EQ(answer.buffer, bytes(600));
+      EXPECT_EQ(answer.output_size, generates ? 0u : 600u);  // left as it was
+    }
   }
 }
 
 TEST(MakeKey, NamesWhatIsWrongWithItsBuffers) {
   const bytes good = import_request(hmac_key(), KEY).input;
+  const std::string no_set = "unmarshal: Too short input | ";
   const struct {
-    request what;
+    uint32_t id;
+    bytes input;
+    size_t capacity;
     TEEC_Result res;
-    const char* errors;
+    std::string errors;
   } cases[] = {
-      {{.id = 13, .input = {1, 0, 0, 0}, .capacity = 10},
-       0xFFFF0006,
-       "unmarshal: Too short input | generate_key: Unmarshal failed"},
-      {{.id = 19, .input = {4, 0, 0, 0, 1, 0, 0, 0}, .capacity = 10},
-       0xFFFF0006,
-       "unmarshal: Too short input | import_key: Unmarshal failed"},
-      {{.id = 19, .input = {4, 0, 0, 0, 1, 0, 0}}, 0xFFFF0000, "import_key: Too short input"},
-      {{.id = 19, .input = bytes(8, 0xFF)}, 0xFFFF0000, "import_key: Too short input"},
-      {{.id = 19, .input = good}, 0xFFFF0000, "import_key: Too short buffer"},
-      {{.id = 19, .input = good, .capacity = 7}, 0xFFFF0000, "import_key: Too short buffer"},
-      {{.id = 19, .input = good, .capacity = 8},
-       0xFFFF0010,
+      {13, {1, 0, 0, 0}, 10, 0xFFFF0006, no_set + "generate_key: Unmarshal failed"},
+      {19, {4, 0, 0, 0, 1, 0, 0, 0}, 10, 0xFFFF0006, no_set + "import_key: Unmarshal failed"},
+      {19, {4, 0, 0, 0, 1, 0, 0}, 0, 0xFFFF0000, "import_key: Too short input"},
+      {19, bytes(8, 0xFF), 0, 0xFFFF0000, "import_key: Too short input"},
+      {19, good, 0, 0xFFFF0000, "import_key: Too short buffer"},
+      {19, good, 7, 0xFFFF0000, "import_key: Too short buffer"},
+      {19, good, 8, 0xFFFF0010,
        "save_key: Too short key blob | import_key: Can't save key to TEE storage"},
   };
   ta_under_test ta;
   for (const auto& c : cases) {
-    EXPECT_TRUE(failed_with(ta.send(c.what), c.res)) << c.errors;
+    const request what = {.id = c.id, .input = c.input, .capacity = c.capacity};
+    EXPECT_TRUE(failed_with(ta.send(what), c.res)) << c.errors;
     EXPECT_EQ(ta.trace().errors(), c.errors);
   }
 }
@@ -148,7 +141,7 @@ TEST(OpenKey, TellsShortBlobsApart) {
     }
     EXPECT_TRUE(refused(ta.send(key_request(command::EXPORT_KEY, blob)), -62)) << size;
     EXPECT_EQ(ta.trace().errors(), "open_key: Too short key blob | export_key: Open key failed");
-    EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, blob, mac_use()), -62)) << size;
+    EXPECT_TRUE(refused(ta.begin(SIGN, blob, mac_use()), -62)) << size;
     EXPECT_TRUE(refused(ta.send({.id = 21, .input = blob}), size < 2 ? -33 : 0)) << size;
     // upgrade_key goes on to the earlier TA, of which this device has none.
     EXPECT_TRUE(failed_with(ta.upgrade(blob), 0xFFFF0008)) << size;
@@ -175,9 +168,7 @@ TEST(Version, KeysOpenUnderTheirOwnAlone) {
     }
     EXPECT_TRUE(refused(ta.send(key_request(command::EXPORT_KEY, blob)),
                         c.open_error == 0 ? KM_ERROR_UNSUPPORTED_KEY_FORMAT : c.open_error));
-    const reply begun = ta.begin(KM_PURPOSE_SIGN, blob, mac_use());
-    EXPECT_TRUE(refused(begun, c.open_error)) << c.version;
-    if (begun.ok()) ta.abort(begun.b);
+    EXPECT_TRUE(refused(ta.try_begin(SIGN, blob, mac_use()), c.open_error)) << c.version;
 
     const reply upgraded = ta.upgrade(blob);
     EXPECT_TRUE(refused(upgraded, c.upgrade_error)) << c.version << " " << c.patchlevel;
@@ -196,7 +187,7 @@ TEST(Version, UpgradeAddsMissingTagsAndRefusesRepeatedOnes) {
   ta_under_test ta({.rpmb = false});
   const bytes record = hmac_material(KEY);
   const bytes bare = seal(blob_plaintext(record, hmac_key(256)));
-  EXPECT_TRUE(refused(ta.begin(KM_PURPOSE_SIGN, bare, mac_use()), -62));
+  EXPECT_TRUE(refused(ta.begin(SIGN, bare, mac_use()), -62));
   const param_set upgraded =
       hmac_key(256).add(KM_TAG_OS_VERSION, OS_VERSION).add(KM_TAG_OS_PATCHLEVEL, OS_PATCHLEVEL);
   EXPECT_EQ(unseal(ta.upgrade(bare).output()), blob_plaintext(record, upgraded));

@@ -1,11 +1,6 @@
 // Every command's good request, swept: every platform call of it fails once, its input ends at
 // every byte and has a bit of every byte changed, its output has every size. The harness looks
 // after each command that nothing stays alive.
-#include <functional>
-#include <gtest/gtest.h>
-
-#include "support/sets.h"
-#include "support/ta_under_test.h"
 #include "ta/pkey.h"
 #include "tee/device/object_store.h"
 
@@ -13,6 +8,7 @@ namespace keymaster::test {
 namespace {
 
 using client::as_bytes;
+using namespace std::string_literals;
 
 constexpr TEE_Result FAULT = TEE_ERROR_OUT_OF_MEMORY;
 
@@ -32,28 +28,23 @@ struct good_request {
 
 // A key and one whole use of it.
 struct good_use {
-  const char* name;
+  std::string name;
   bytes blob;
   uint32_t purpose;
   param_set begin;
   bytes data = bytes(40, 0x77);
-  param_set update = {};
   bytes last = {};  // what finish is given
+  param_set update = {};
 };
 
-param_set key_of(uint32_t algorithm, uint32_t bits, const param_set& more) {
-  param_set key = one(KM_TAG_ALGORITHM, algorithm).add(KM_TAG_KEY_SIZE, bits).append(more);
-  for (uint32_t purpose = KM_PURPOSE_ENCRYPT; purpose <= KM_PURPOSE_VERIFY; purpose++)
-    key.add(KM_TAG_PURPOSE, purpose);
-  return key.add_flag(KM_TAG_NO_AUTH_REQUIRED);
-}
-
-param_set rsa_use(scheme how) {
-  return one(KM_TAG_PADDING, how.padding).add(KM_TAG_DIGEST, how.digest);
-}
-
+constexpr scheme RAW = {KM_PAD_NONE, KM_DIGEST_NONE};
+constexpr scheme PKCS1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_NONE};
 constexpr scheme PKCS1_SHA1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA1};
 constexpr scheme EC_SHA1 = {0, KM_DIGEST_SHA1};
+
+param_set aes_use(uint32_t mode, uint32_t padding) {
+  return one(KM_TAG_BLOCK_MODE, mode).add(KM_TAG_PADDING, padding);
+}
 
 class Sweep : public testing::Test {
  protected:
@@ -63,64 +54,42 @@ class Sweep : public testing::Test {
     ta.watch_secret(ec.number(OSSL_PKEY_PARAM_PRIV_KEY));
     ta.watch_secret(bytes(16, 0xAE));
     add_key_commands();
-    const bytes rsa_blob = ta.import(rsa_key, rsa.import_data());
-    const bytes ec_blob = ta.import(ec_key, ec.import_data());
-    const bytes aes_blob = ta.import(aes_key, bytes(16, 0xAE));
-    const auto padded = aes_use(KM_MODE_CBC, KM_PAD_PKCS7);
-    const bytes sealed =
-        ta.run(KM_PURPOSE_ENCRYPT, aes_blob, aes_use(KM_MODE_ECB, KM_PAD_PKCS7), bytes(40, 0x77));
-    const auto associated = param_set().add_bytes(KM_TAG_ASSOCIATED_DATA, as_bytes("aad"));
+    const bytes hmac_blob = add_key("HMAC", key, bytes(20, 0x0b));
+    const bytes aes_blob =
+        add_key("AES", with(any_use(KM_ALGORITHM_AES), KM_TAG_KEY_SIZE, {128}), bytes(16, 0xAE));
+    const bytes rsa_blob = add_key("RSA",
+                                   with(any_use(KM_ALGORITHM_RSA), KM_TAG_KEY_SIZE, {512})
+                                       .add(KM_TAG_RSA_PUBLIC_EXPONENT, 65537),
+                                   rsa.import_data());
+    const bytes ec_blob =
+        add_key("EC", with(any_use(KM_ALGORITHM_EC), KM_TAG_KEY_SIZE, {521}), ec.import_data());
+    for (const auto& [name, its_blob] : {std::pair("RSA"s, rsa_blob), {"EC"s, ec_blob}}) {
+      add("export_key, " + name, [=] { return key_request(command::EXPORT_KEY, its_blob); });
+      add("attest_key, " + name, [=, this] { return attest_request(its_blob, challenge); });
+    }
+
+    const param_set gcm = aes_use(KM_MODE_GCM, KM_PAD_NONE).add(KM_TAG_MAC_LENGTH, 128);
+    const param_set padded = aes_use(KM_MODE_ECB, KM_PAD_PKCS7);
+    const bytes sealed = ta.run(ENCRYPT, aes_blob, padded, bytes(40, 0x77));
+    const param_set aad = param_set().add_bytes(KM_TAG_ASSOCIATED_DATA, as_bytes("aad"));
     const bytes block(64, 1);
     const good_use uses[] = {
-        {"HMAC sign", blob, KM_PURPOSE_SIGN, use},
-        {"AES GCM", aes_blob, KM_PURPOSE_ENCRYPT,
-         aes_use(KM_MODE_GCM, KM_PAD_NONE).add(KM_TAG_MAC_LENGTH, 128), bytes(40), associated},
-        {"AES CBC", aes_blob, KM_PURPOSE_ENCRYPT, padded},
-        {"AES ECB decrypt", aes_blob, KM_PURPOSE_DECRYPT, aes_use(KM_MODE_ECB, KM_PAD_PKCS7),
-         sealed},
-        {"RSA PSS", rsa_blob, KM_PURPOSE_SIGN, rsa_use({KM_PAD_RSA_PSS, KM_DIGEST_SHA1})},
-        {"RSA raw sign", rsa_blob, KM_PURPOSE_SIGN, rsa_use({KM_PAD_NONE, KM_DIGEST_NONE})},
-        {"RSA verify",
-         rsa_blob,
-         KM_PURPOSE_VERIFY,
-         rsa_use(PKCS1_SHA1),
-         block,
-         {},
-         rsa.sign(PKCS1_SHA1, block)},
-        {"RSA verify, no digest",
-         rsa_blob,
-         KM_PURPOSE_VERIFY,
-         rsa_use({KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_NONE}),
-         bytes(8),
-         {},
-         rsa.sign({KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_NONE}, bytes(8))},
-        {"RSA encrypt", rsa_blob, KM_PURPOSE_ENCRYPT,
-         rsa_use({KM_PAD_RSA_PKCS1_1_5_ENCRYPT, KM_DIGEST_NONE})},
-        {"RSA raw decrypt", rsa_blob, KM_PURPOSE_DECRYPT, rsa_use({KM_PAD_NONE, KM_DIGEST_NONE})},
-        {"EC sign", ec_blob, KM_PURPOSE_SIGN, one(KM_TAG_DIGEST, KM_DIGEST_SHA1)},
-        {"EC raw sign", ec_blob, KM_PURPOSE_SIGN, one(KM_TAG_DIGEST, KM_DIGEST_NONE)},
-        {"EC verify",
-         ec_blob,
-         KM_PURPOSE_VERIFY,
-         one(KM_TAG_DIGEST, KM_DIGEST_SHA1),
-         block,
-         {},
-         ec.sign(EC_SHA1, block)},
+        {"HMAC sign", hmac_blob, SIGN, use_hmac},
+        {"AES GCM", aes_blob, ENCRYPT, gcm, bytes(40), {}, aad},
+        {"AES CBC", aes_blob, ENCRYPT, aes_use(KM_MODE_CBC, KM_PAD_PKCS7)},
+        {"AES ECB decrypt", aes_blob, DECRYPT, padded, sealed},
+        {"RSA PSS", rsa_blob, SIGN, use({KM_PAD_RSA_PSS, KM_DIGEST_SHA1})},
+        {"RSA raw sign", rsa_blob, SIGN, use(RAW)},
+        {"RSA verify", rsa_blob, VERIFY, use(PKCS1_SHA1), block, rsa.sign(PKCS1_SHA1, block)},
+        {"RSA verify, no digest", rsa_blob, VERIFY, use(PKCS1), {8}, rsa.sign(PKCS1, bytes{8})},
+        {"RSA encrypt", rsa_blob, ENCRYPT, use({KM_PAD_RSA_PKCS1_1_5_ENCRYPT, KM_DIGEST_NONE})},
+        {"RSA raw decrypt", rsa_blob, DECRYPT, use(RAW)},
+        {"EC sign", ec_blob, SIGN, use(EC_SHA1)},
+        {"EC raw sign", ec_blob, SIGN, use({0, KM_DIGEST_NONE})},
+        {"EC verify", ec_blob, VERIFY, use(EC_SHA1), block, ec.sign(EC_SHA1, block)},
     };
     for (const good_use& row : uses)
       add_use(row);
-    for (const auto& [name, its_blob] : {std::pair("RSA", rsa_blob), {"EC", ec_blob}}) {
-      const std::string of = std::string(", ") + name;
-      add("export_key" + of, [=] { return key_request(command::EXPORT_KEY, its_blob); });
-      add("attest_key" + of, [=] { return attest_request(its_blob, challenge()); });
-    }
-  }
-
-  static param_set challenge() {
-    return param_set().add_bytes(KM_TAG_ATTESTATION_CHALLENGE, as_bytes("challenge"));
-  }
-  static param_set aes_use(uint32_t mode, uint32_t padding) {
-    return one(KM_TAG_BLOCK_MODE, mode).add(KM_TAG_PADDING, padding);
   }
 
   void add(const std::string& name, std::function<request()> make, left_behind on_failure = {},
@@ -128,94 +97,66 @@ class Sweep : public testing::Test {
     good.push_back({name, std::move(make), on_failure, enough});
   }
 
+  // Adds the making of a key in both ways, and returns the blob of the one with this data.
+  bytes add_key(const std::string& name, const param_set& made, const bytes& data) {
+    add("import_key, " + name, [=] { return import_request(made, data); }, {true, 0});
+    add("generate_key, " + name, [=] { return generate_request(made); }, {false, 0});
+    good.back().output_is_fixed = name != "RSA";  // its numbers are as long as they are
+    return ta.import(made, data);
+  }
+
   void add_key_commands() {
     add("configure", [] {
       return configure_request(
           one(KM_TAG_OS_VERSION, OS_VERSION).add(KM_TAG_OS_PATCHLEVEL, OS_PATCHLEVEL));
     });
-    for (const param_set& made : {key, aes_key, rsa_key, ec_key}) {
-      const std::string of = ", algorithm " + std::to_string(*made.number(KM_TAG_ALGORITHM));
-      add("generate_key" + of, [=] { return generate_request(made); }, {false, 0});
-      // The numbers of an RSA key are as long as they are.
-      good.back().output_is_fixed = made.number(KM_TAG_ALGORITHM) != KM_ALGORITHM_RSA;
-    }
-    const std::tuple<const char*, param_set, bytes> imports[] = {
-        {"import_key, HMAC", key, bytes(20, 0x0b)},
-        {"import_key, AES", aes_key, bytes(16, 0xAE)},
-        {"import_key, RSA", rsa_key, rsa.import_data()},
-        {"import_key, EC", ec_key, ec.import_data()}};
-    for (const auto& [name, made, data] : imports)
-      add(name, [made = made, data = data] { return import_request(made, data); }, {true, 0});
     add("get_key_character_size",
         [&] { return key_request(command::GET_KEY_CHARACTER_SIZE, blob, app, 0); });
     add("get_key_character", [&] { return key_request(command::GET_KEY_CHARACTER, blob, app); });
     add("upgrade_key", [&] { return upgrade_request(blob, binding); }, {true, UNTOUCHED});
-    add("_abort", [&] { return abort_request(ta.begun(KM_PURPOSE_SIGN, blob, use)); });
+    add("_abort", [&] { return abort_request(ta.begun(SIGN, blob, use_hmac)); });
     add(
         "delete_key", [&] { return request{.id = 21, .input = blob}; }, {}, 2);
     add("delete_all_key", [] { return request{.id = 22}; });
   }
 
   void add_use(const good_use& row) {
-    const std::string of = std::string(", ") + row.name;
-    add("begin" + of, [=] { return begin_request(row.purpose, row.blob, row.begin); });
-    add("update" + of, [=, this] {
+    add("begin, " + row.name, [=] { return begin_request(row.purpose, row.blob, row.begin); });
+    add("update, " + row.name, [=, this] {
       const uint32_t handle = ta.begun(row.purpose, row.blob, row.begin);
       return step_request(command::UPDATE, handle, row.data, row.update);
     });
-    add("finish" + of, [=, this] {
+    add("finish, " + row.name, [=, this] {
       const uint32_t handle = ta.begun(row.purpose, row.blob, row.begin);
       EXPECT_TRUE(succeeded(ta.update(handle, row.data, row.update))) << row.name;
       return step_request(command::FINISH, handle, row.last);
     });
-    good.back().output_is_fixed = of.find("EC") == std::string::npos;
+    good.back().output_is_fixed = !row.name.starts_with("EC");
   }
 
-  // Whatever it was that was begun or fed is not needed any more.
   reply send(const request& what) {
     const reply answer = ta.send(what);
-    errors = ta.trace().errors();
+    abandon(what, answer);
+    return answer;
+  }
+  // Whatever it was that was begun or fed is not needed any more.
+  void abandon(const request& what, const reply& answer) {
     if (what.id == 16 && answer.ok()) ta.abort(answer.b);
     if (what.id == 17 && answer.ok()) ta.abort(what.a);
-    return answer;
   }
 
   ta_under_test ta;
-  std::string errors;
   std::vector<good_request> good;
   const pkey rsa = pkey::rsa(512);
   const pkey ec = pkey::ec(521);
   const client::application app = {{'i', 'd'}, {'d', 'a', 't', 'a'}};
-  const param_set binding = param_set()
-                                .add_bytes(KM_TAG_APPLICATION_ID, app.id)
-                                .add_bytes(KM_TAG_APPLICATION_DATA, app.data);
+  const param_set binding = bound_to("id", "data");
   const param_set key = hmac_key(160).append(binding);
-  const param_set use = mac_use().append(binding);
-  const param_set aes_key =
-      key_of(KM_ALGORITHM_AES, 128,
-             several(KM_TAG_BLOCK_MODE, {KM_MODE_GCM, KM_MODE_CBC, KM_MODE_ECB})
-                 .append(several(KM_TAG_PADDING, {KM_PAD_NONE, KM_PAD_PKCS7}))
-                 .add(KM_TAG_MIN_MAC_LENGTH, 128));
-  const param_set rsa_key = key_of(
-      KM_ALGORITHM_RSA, 512,
-      several(KM_TAG_DIGEST, {KM_DIGEST_NONE, KM_DIGEST_SHA1})
-          .append(several(KM_TAG_PADDING, {KM_PAD_NONE, KM_PAD_RSA_PSS, KM_PAD_RSA_PKCS1_1_5_SIGN,
-                                           KM_PAD_RSA_PKCS1_1_5_ENCRYPT}))
-          .add(KM_TAG_RSA_PUBLIC_EXPONENT, 65537));
-  const param_set ec_key =
-      key_of(KM_ALGORITHM_EC, 521, several(KM_TAG_DIGEST, {KM_DIGEST_NONE, KM_DIGEST_SHA1}));
+  const param_set use_hmac = mac_use().append(binding);
+  const param_set challenge =
+      param_set().add_bytes(KM_TAG_ATTESTATION_CHALLENGE, as_bytes("challenge"));
   const bytes blob = ta.generate(key);
 };
-
-// Arms the n-th call from now, n = 1, 2, ..., for each turn until one comes to its end without it.
-void for_each_fault(const std::function<void(uint64_t n)>& turn) {
-  bool fired = true;
-  for (uint64_t n = 1; fired; n++) {
-    turn(n);
-    fired = tee::host::fault_fired();
-    tee::host::clear_fault();
-  }
-}
 
 // Of the middle of long inputs, which is a blob or a number, one byte in seven is enough.
 bool is_swept(size_t at, size_t size) {
@@ -224,13 +165,16 @@ bool is_swept(size_t at, size_t size) {
 
 TEST_F(Sweep, EveryFailedPlatformCallIsReported) {
   for (const good_request& row : good) {
-    for_each_fault([&](uint64_t n) {
-      EXPECT_TRUE(succeeded(send(row.make()))) << row.name << ", before call " << n;
-      const request what = row.make();
-      tee::host::fail_nth_call(n, FAULT);
-      const reply answer = send(what);
-      EXPECT_EQ(answer.ok(), !tee::host::fault_fired()) << row.name << ", call " << n;
-      EXPECT_EQ(errors.empty(), answer.ok()) << row.name << ", call " << n;
+    SCOPED_TRACE(row.name);
+    request what;
+    const auto make = [&] {
+      EXPECT_TRUE(succeeded(send(row.make())));
+      return what = row.make();
+    };
+    ta.fail_each_call(FAULT, make, [&](const reply& answer, bool fired) {
+      EXPECT_EQ(answer.ok(), !fired);
+      EXPECT_EQ(ta.trace().errors().empty(), answer.ok());
+      abandon(what, answer);
     });
   }
 }
@@ -253,7 +197,7 @@ TEST_F(Sweep, ChangedInputsLeaveNothingBehind) {
     const request sample = row.make();
     EXPECT_TRUE(succeeded(send(sample))) << row.name;
     // A changed size may be that of a key which takes minutes to make.
-    if (row.name == "generate_key, algorithm " + std::to_string(KM_ALGORITHM_RSA)) continue;
+    if (row.name == "generate_key, RSA") continue;
     for (size_t i = 0; i < sample.input.size(); i++) {
       if (!is_swept(i, sample.input.size())) continue;
       request what = row.make();
@@ -294,18 +238,21 @@ TEST_F(Sweep, OutputsOfEverySizeAreRespected) {
 TEST(SweepCreation, EveryFailedPlatformCallIsReported) {
   ta_under_test ta({.configured = false});
   for (const bool first_start : {false, true}) {
-    for_each_fault([&](uint64_t n) {
+    bool fired = true;
+    for (uint64_t n = 1; fired; n++) {
       ta.restart();
       ta.stop();
       if (first_start) tee::device::open(ta.path())->objects().remove(KSK_OBJECT);
       tee::host::fail_nth_call(n, FAULT);
       const TEEC_Result res = ta.start();
+      fired = tee::host::fault_fired();
+      tee::host::clear_fault();
       // Without replay-protected storage the TA does without it.
       const bool tolerated = ta.trace().has("key_store_init: no RPMB for ksk");
-      EXPECT_EQ(res, tee::host::fault_fired() && !tolerated ? FAULT : TEEC_SUCCESS) << n;
+      EXPECT_EQ(res, fired && !tolerated ? FAULT : TEEC_SUCCESS) << n;
       tee::host::live_counts counts;
       EXPECT_EQ(tee::host::counts_of(KEYMASTER_TA, &counts), res == TEEC_SUCCESS) << n;
-    });
+    }
   }
 }
 
