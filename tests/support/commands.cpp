@@ -70,6 +70,15 @@ void ta_under_test::expect_refused(const request& what, int32_t km_error, const 
   EXPECT_TRUE(line.empty() || trace_.has(line)) << line << " is not in: " << trace_.errors();
 }
 
+void ta_under_test::expect_refused_keys(const std::string& algorithm,
+                                        std::span<const bad_key> keys) {
+  for (const auto& [description, km_error, message, data] : keys) {
+    const std::string function = algorithm + (data ? "_import_key: " : "_generate_key: ");
+    expect_refused(data ? import_request(description, *data) : generate_request(description),
+                   km_error, message.empty() ? "" : function + message);
+  }
+}
+
 reply ta_under_test::configure(uint32_t os_version, uint32_t os_patchlevel) {
   return send(configure_request(
       param_set().add(KM_TAG_OS_VERSION, os_version).add(KM_TAG_OS_PATCHLEVEL, os_patchlevel)));

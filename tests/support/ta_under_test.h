@@ -103,6 +103,15 @@ request step_request(command id, uint32_t handle, byte_view input = {},
 request abort_request(uint32_t handle);
 request attest_request(byte_view blob, const param_set& params = {}, size_t capacity = AMPLE);
 
+// bad_key: a description of a key that is not made. Its data: none, and it is generated. The traced
+// message: empty, and none is looked for.
+struct bad_key {
+  param_set description;
+  int32_t km_error;
+  std::string message;
+  std::optional<bytes> data = std::nullopt;
+};
+
 struct options {
   bool rpmb = true;
   bool configured = true;  // configure after every start
@@ -126,6 +135,9 @@ class ta_under_test {
   // expect_refused: the same, but with TEE success and this error (0: it is done). Unless the line
   // is empty, it is traced.
   void expect_refused(const request& what, int32_t km_error, const std::string& line = "");
+
+  // expect_refused_keys: each, with its message from "ALGORITHM_generate_key" or "_import_key".
+  void expect_refused_keys(const std::string& algorithm, std::span<const bad_key> keys);
 
   // fail_each_call: sends what `make` gives with the n-th platform call failing, n = 1, 2, ...,
   // until a command comes to its end without. `check` sees each answer, and whether a call failed.

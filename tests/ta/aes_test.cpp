@@ -137,32 +137,26 @@ TEST_F(aes, makes_and_takes_the_vectors_in_pieces_of_every_size) {
 }
 
 TEST_F(aes, keys_are_checked) {
-  const std::string no_size = "aes_generate_key: No or too many KM_TAG_KEY_SIZE or specified";
-  const std::string no_minimum = "aes_generate_key: No or too many KM_TAG_MIN_MAC_LENGTH";
+  const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
+  const std::string no_minimum = "No or too many KM_TAG_MIN_MAC_LENGTH";
   const param_set good = with(ANY_USE, KM_TAG_KEY_SIZE, {128});
-  const struct {
-    param_set description;
-    int32_t error;
-    std::string line;
-  } rows[] = {
+  const bad_key rows[] = {
       {with(good, KM_TAG_CREATION_DATETIME, {1}), -38,
-       "aes_generate_key: Shouldn't specify KM_TAG_CREATION_DATETIME"},
+       "Shouldn't specify KM_TAG_CREATION_DATETIME"},
       {ANY_USE, -38, no_size},
       {with(good, KM_TAG_KEY_SIZE, {128, 128}), -38, no_size},
-      {with(good, KM_TAG_KEY_SIZE, {160}), -6, "aes_generate_key: Invalid AES key size 160"},
+      {with(good, KM_TAG_KEY_SIZE, {160}), -6, "Invalid AES key size 160"},
       {with(good, KM_TAG_MIN_MAC_LENGTH, {}), -58, no_minimum},
       {with(good, KM_TAG_MIN_MAC_LENGTH, {96, 96}), -58, no_minimum},
       {with(good, KM_TAG_MIN_MAC_LENGTH, {88}), -59, ""},
       {with(good, KM_TAG_MIN_MAC_LENGTH, {100}), -59, ""},
       {with(good, KM_TAG_MIN_MAC_LENGTH, {136}), -59, ""},
       {with(good, KM_TAG_BLOCK_MODE, {KM_MODE_ECB}), -38,
-       "aes_generate_key: Found KM_TAG_MIN_MAC_LENGTH without GCM"},
+       "Found KM_TAG_MIN_MAC_LENGTH without GCM"},
+      {ANY_USE, -6, "", bytes(20)},
+      {good, -44, "Key size mismatch (given 128, guessed 256)", bytes(32)},
   };
-  for (const auto& [description, error, line] : rows)
-    ta.expect_refused(generate_request(description), error, line);
-  ta.expect_refused(import_request(ANY_USE, bytes(20)), -6);
-  ta.expect_refused(import_request(good, bytes(32)), -44,
-                    "aes_import_key: Key size mismatch (given 128, guessed 256)");
+  ta.expect_refused_keys("aes", rows);
 }
 
 TEST_F(aes, new_keys_say_where_they_come_from_and_stay_inside) {

@@ -1,7 +1,5 @@
 // Key blobs and the keys that they are sealed under: stored bytes, blobs that are taken apart and
 // made apart from the TA, damage, and what happens to the key in the replay-protected storage.
-#include <gtest/gtest.h>
-
 #include "support/blob_forge.h"
 #include "support/sets.h"
 #include "support/ta_under_test.h"
@@ -13,7 +11,6 @@ namespace {
 
 using client::from_hex;
 
-constexpr uint32_t SIGN = KM_PURPOSE_SIGN;
 constexpr TEEC_Result KSK_DELETED = 0xF0100001;
 
 // The device must be stopped.
@@ -23,9 +20,8 @@ void store_ksk(const ta_under_test& ta, byte_view ksk) {
   tee::device::open(ta.path())->objects().save(KSK_OBJECT, tee::encode(object));
 }
 
-bytes fixed_ksk() {
-  return from_hex("000102030405060708090a0b0c0d0e0f101112131415161718191a1b1c1d1e1f");
-}
+const bytes FIXED_KSK =
+    from_hex("000102030405060708090a0b0c0d0e0f101112131415161718191a1b1c1d1e1f");
 
 reply open(ta_under_test* ta, byte_view blob) {
   return ta->send(key_request(command::GET_KEY_CHARACTER, blob));
@@ -65,7 +61,7 @@ constexpr char FROZEN_RPMB[] =
 TEST(Blob, FrozenOnesOpenForEver) {
   ta_under_test ta;
   ta.stop();
-  store_ksk(ta, fixed_ksk());
+  store_ksk(ta, FIXED_KSK);
   ta.restart();
   for (const char* frozen : {FROZEN_DERIVED, FROZEN_RPMB}) {
     expect_signs(&ta, from_hex(frozen));
@@ -79,23 +75,23 @@ TEST(Blob, FrozenOnesOpenForEver) {
   }
   const bytes first = make(&ta);
   const bytes second = make(&ta);
-  EXPECT_EQ(unseal(first, fixed_ksk()), unseal(second, fixed_ksk()));
+  EXPECT_EQ(unseal(first, FIXED_KSK), unseal(second, FIXED_KSK));
   // Salt, nonce and tag are all new.
   for (const auto& [from, to] : {std::pair{1, 65}, {65, 77}, {77, 93}}) {
     EXPECT_NE(bytes(first.begin() + from, first.begin() + to),
               bytes(second.begin() + from, second.begin() + to));
   }
-  expect_signs(&ta, seal(unseal(first, fixed_ksk()), fixed_ksk(), 1));
+  expect_signs(&ta, seal(unseal(first, FIXED_KSK), FIXED_KSK, 1));
 }
 
 // Whatever is wrong with a blob, its opening is answered alike; the reason is traced.
 TEST(Blob, ThatDoNotOpenAskForAnUpgrade) {
   ta_under_test ta({.rpmb = false});
   const bytes good = unseal(make(&ta));  // the key's length at 0, its set's length at 32
-  const auto with = [&](size_t offset, uint8_t value) {
-    bytes changed = good;
-    changed.at(offset) = value;
-    return seal(changed);
+  const auto changed = [&](size_t offset, int value) {
+    bytes plaintext = good;
+    plaintext.at(offset) = static_cast<uint8_t>(value);
+    return seal(plaintext);
   };
   bytes trailing = good;
   trailing.push_back(0x99);
@@ -111,15 +107,15 @@ TEST(Blob, ThatDoNotOpenAskForAnUpgrade) {
       {"nothing inside", seal({}), "open_key: Too short key blob"},
       {"one byte inside", seal(bytes(1)), too_short},
       {"an empty key and nothing else", seal(bytes(4)), too_short},
-      {"key length", with(1, 0xFF), too_short},
-      {"characteristics length", with(32, static_cast<uint8_t>(good[32] + 1)), too_short},
-      {"characteristics length of 4 GiB", with(35, 0xFF), too_short},
-      {"characteristics", with(36, static_cast<uint8_t>(good[36] + 1)), no_set},
+      {"key length", changed(1, 0xFF), too_short},
+      {"characteristics length", changed(32, good[32] + 1), too_short},
+      {"characteristics length of 4 GiB", changed(35, 0xFF), too_short},
+      {"characteristics", changed(36, good[36] + 1), no_set},
       {"no characteristics", seal(bytes(8)), no_set},
       {"protection 2", seal(good, derived_ksk(), 2), "open_key: Unknown key protection"},
       {"protection 255", seal(good, derived_ksk(), 255), "open_key: Unknown key protection"},
       {"protection 1", seal(good, derived_ksk(), 1), "open_key: RPMB KSK died, fail to open key"},
-      {"another key", seal(good, fixed_ksk()), "open_key: AEDecryptFinal failed with 0xffff3071"},
+      {"another key", seal(good, FIXED_KSK), "open_key: AEDecryptFinal failed with 0xffff3071"},
   };
   for (const auto& c : cases) {
     EXPECT_TRUE(refused(open(&ta, c.blob), c.reason.empty() ? 0 : -62)) << c.what;

@@ -104,30 +104,20 @@ TEST_F(Ec, NewKeysAreChecked) {
   small[1] = 0;
   const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
   const auto size = [](uint32_t bits) { return with(ANY_USE, KM_TAG_KEY_SIZE, {bits}); };
-  const struct {
-    param_set description;
-    bytes data;  // none: generate
-    int32_t error;
-    std::string message;
-  } rows[] = {
-      {ANY_USE, {}, -38, no_size},
-      {with(ANY_USE, KM_TAG_KEY_SIZE, {256, 256}), {}, -38, no_size},
+  const bad_key rows[] = {
+      {ANY_USE, -38, no_size},
+      {with(ANY_USE, KM_TAG_KEY_SIZE, {256, 256}), -38, no_size},
       // The size comes first, whatever else is wrong.
-      {size(192).add(KM_TAG_ORIGIN, 0), {}, -6, "Invalid EC key size 192"},
-      {size(256).add(KM_TAG_ORIGIN, 0), {}, -38, "Shouldn't specify KM_TAG_ORIGIN"},
-      {size(256).add(KM_TAG_EC_CURVE, 1), {}, -38, "Shouldn't specify KM_TAG_EC_CURVE"},
-      {size(384), data, -44, "Key size mismatch (given 384, guessed 256)"},
-      {ANY_USE, small, -6, "Invalid EC key size 192"},
-      {with(ANY_USE, KM_TAG_CREATION_DATETIME, {1}), data, -38,
-       "Shouldn't specify KM_TAG_CREATION_DATETIME"},
-      {with(ANY_USE, KM_TAG_EC_CURVE, {1}), data, -38, "Shouldn't specify KM_TAG_EC_CURVE"},
+      {size(192).add(KM_TAG_ORIGIN, 0), -6, "Invalid EC key size 192"},
+      {size(256).add(KM_TAG_ORIGIN, 0), -38, "Shouldn't specify KM_TAG_ORIGIN"},
+      {size(256).add(KM_TAG_EC_CURVE, 1), -38, "Shouldn't specify KM_TAG_EC_CURVE"},
+      {size(384), -44, "Key size mismatch (given 384, guessed 256)", data},
+      {ANY_USE, -6, "Invalid EC key size 192", small},
+      {with(ANY_USE, KM_TAG_CREATION_DATETIME, {1}), -38,
+       "Shouldn't specify KM_TAG_CREATION_DATETIME", data},
+      {with(ANY_USE, KM_TAG_EC_CURVE, {1}), -38, "Shouldn't specify KM_TAG_EC_CURVE", data},
   };
-  for (const auto& row : rows) {
-    const bool generates = row.data.empty();
-    ta.expect_refused(
-        generates ? generate_request(row.description) : import_request(row.description, row.data),
-        row.error, (generates ? "ec_generate_key: " : "ec_import_key: ") + row.message);
-  }
+  ta.expect_refused_keys("ec", rows);
 }
 
 TEST_F(Ec, KeysAreDescribedAndExported) {

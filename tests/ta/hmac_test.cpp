@@ -1,5 +1,4 @@
 // HMAC keys and operations: published MACs through import and sign, and what is refused.
-#include "support/blob_forge.h"
 #include "support/sets.h"
 #include "support/ta_under_test.h"
 
@@ -92,11 +91,7 @@ TEST(Hmac, RefusesDescriptionsInOrder) {
   const param_set good = hmac_key(256);
   const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
   const std::string no_minimum = "No or too many KM_TAG_MIN_MAC_LENGTH or specified";
-  const struct {
-    param_set key;
-    int32_t error;
-    std::string message;  // empty: no line
-  } cases[] = {
+  const bad_key keys[] = {
       {with(good, KM_TAG_MIN_MAC_LENGTH, {56}).add(KM_TAG_ORIGIN, 0), -38,
        "Shouldn't specify KM_TAG_ORIGIN"},
       {with(good, KM_TAG_OS_VERSION, {1}), -38, "Shouldn't specify KM_TAG_OS_VERSION"},
@@ -117,12 +112,16 @@ TEST(Hmac, RefusesDescriptionsInOrder) {
       {with(good, KM_TAG_DIGEST, {KM_DIGEST_NONE}), -12, ""},
       {with(good, KM_TAG_DIGEST, {KM_DIGEST_MD5}), -12, ""},
       {with(good, KM_TAG_DIGEST, {UNKNOWN_DIGEST}), -12, ""},
+      {hmac_key(128), -44, "Key size mismatch (given 128, guessed 160)", bytes(20)},
+      {hmac_key(), -6, "Invalid hmac key size 0", bytes()},
+      {hmac_key(), -6, "Invalid hmac key size 1032", bytes(129)},
   };
   ta_under_test ta;
-  for (const auto& [key, error, message] : cases) {
-    EXPECT_TRUE(refused(ta.send(generate_request(key)), error)) << message;
-    EXPECT_EQ(ta.trace().errors(), message.empty() ? "" : "hmac_generate_key: " + message);
-  }
+  ta.expect_refused_keys("hmac", keys);
+  // A repeated size counts as absent when a key is imported, and one more is added.
+  const bytes blob = ta.import(hmac_key(128).add(KM_TAG_KEY_SIZE, 128), bytes(20, 1));
+  EXPECT_EQ(ta.characteristics(blob).numbers(KM_TAG_KEY_SIZE),
+            (std::vector<uint64_t>{128, 128, 160}));
 }
 
 // The largest minimum that each digest reaches, and 8 bits more.
@@ -134,45 +133,6 @@ TEST(Hmac, MinimumMacLengthEndsAtTheDigests) {
     EXPECT_EQ(ta.run(SIGN, blob, mac_use(bits, digest), {}).size(), bits / 8);
     ta.expect_refused(generate_request(with(key, KM_TAG_MIN_MAC_LENGTH, {bits + 8})), -59);
   }
-}
-
-TEST(Hmac, ImportTakesItsSizeFromTheData) {
-  ta_under_test ta;
-  for (const auto& [bits, size, error, errors] :
-       {std::tuple(160u, 20u, 0, ""),
-        {128, 20, -44, "hmac_import_key: Key size mismatch (given 128, guessed 160)"},
-        {0, 0, -6, "hmac_import_key: Invalid hmac key size 0"},
-        {0, 129, -6, "hmac_import_key: Invalid hmac key size 1032"}}) {
-    ta.expect_refused(import_request(hmac_key(bits), bytes(size, 1)), error, errors);
-  }
-  // A repeated size counts as absent, and one more is added.
-  const bytes blob = ta.import(hmac_key(128).add(KM_TAG_KEY_SIZE, 128), bytes(20, 1));
-  EXPECT_EQ(ta.characteristics(blob).numbers(KM_TAG_KEY_SIZE),
-            (std::vector<uint64_t>{128, 128, 160}));
-}
-
-TEST(Hmac, BeginRefusesRequestsAndRecords) {
-  ta_under_test ta({.rpmb = false});
-  const bytes good = ta.generate(hmac_key(256));
-  const param_set made = ta.characteristics(good);
-  bytes record = hmac_material(bytes(32, 1));
-  record.pop_back();
-  const struct {
-    bytes blob;
-    param_set use;
-    int32_t error;
-    const char* line;
-  } cases[] = {
-      {good, one(KM_TAG_DIGEST, 4), -38, "create_hmac_sign: No or too many KM_TAG_MAC_LENGTH"},
-      {good, mac_use().add(KM_TAG_MAC_LENGTH, 64), -38,
-       "create_hmac_sign: No or too many KM_TAG_MAC_LENGTH"},
-      {seal(blob_plaintext(hmac_material(bytes(32, 1), 0xA0000001), made)), mac_use(), -41,
-       "create_hmac_sign: Resolve key data failed"},
-      {seal(blob_plaintext(record, made)), mac_use(), -1000,
-       "hmac_resolve_key_data: Too short input"},
-  };
-  for (const auto& c : cases)
-    ta.expect_refused(begin_request(SIGN, c.blob, c.use), c.error, c.line);
 }
 
 }  // namespace

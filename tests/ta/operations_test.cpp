@@ -22,11 +22,17 @@ class Operations : public testing::Test {
 TEST_F(Operations, BeginLeavesNoOperationWhenItFails) {
   request garbage = begin_request(SIGN, blob, mac_use());
   garbage.input[4 + blob.size() + 4] = 3;  // announces one parameter more than there is
+  const param_set made = ta.characteristics(blob);
   const bytes record = hmac_material(bytes(20, 0x0b));
-  const param_set nameless = without(ta.characteristics(blob), KM_TAG_ALGORITHM);
-  const bytes none = seal(blob_plaintext(record, nameless));
-  const bytes unknown = seal(blob_plaintext(record, param_set(nameless).add(KM_TAG_ALGORITHM, 2)));
-  const std::string refused = " not implemented | begin: Authorization failed";
+  const bytes sha1 = seal(blob_plaintext(hmac_material(bytes(20, 0x0b), 0xA0000001), made));
+  const bytes cut = seal(blob_plaintext(byte_view(record).first(record.size() - 1), made));
+  const bytes none = seal(blob_plaintext(record, without(made, KM_TAG_ALGORITHM)));
+  const bytes unknown = seal(blob_plaintext(record, with(made, KM_TAG_ALGORITHM, {2})));
+  const std::string unauthorized = " | begin: Authorization failed";
+  const std::string refused = " not implemented" + unauthorized;
+  const std::string not_created = " | begin: Create operation failed";
+  const std::string no_length = "create_hmac_sign: No or too many KM_TAG_MAC_LENGTH" + not_created;
+  const std::string no_key = "create_hmac_sign: Resolve key data failed" + not_created;
   const std::string no_room = "marshal: Too short marshalling buffer | begin: Marshal failed";
   const struct {
     request begin;
@@ -39,15 +45,17 @@ TEST_F(Operations, BeginLeavesNoOperationWhenItFails) {
       {begin_request(4, blob, mac_use()), 0, -2, "begin: Algorithm HMAC purpose 4" + refused},
       {begin_request(~0u, blob, mac_use()), 0, -2, "begin: Algorithm HMAC purpose -1" + refused},
       {begin_request(SIGN, none, mac_use()), 0, -33,
-       "authorize_begin: No or too many KM_TAG_ALGORITHM in key_params | begin: Authorization "
-       "failed"},
+       "authorize_begin: No or too many KM_TAG_ALGORITHM in key_params" + unauthorized},
       {begin_request(SIGN, unknown, mac_use()), 0, -4, "begin: Algorithm 2" + refused},
-      {begin_request(SIGN, blob, one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256)), 0, -38,
-       "create_hmac_sign: No or too many KM_TAG_MAC_LENGTH | begin: Create operation failed"},
+      {begin_request(SIGN, blob, one(KM_TAG_DIGEST, 4)), 0, -38, no_length},
+      {begin_request(SIGN, blob, mac_use().add(KM_TAG_MAC_LENGTH, 64)), 0, -38, no_length},
+      {begin_request(SIGN, sha1, mac_use()), 0, -41, no_key},
+      {begin_request(SIGN, cut, mac_use()), 0, -1000,
+       "hmac_resolve_key_data: Too short input | " + no_key},
       {begin_request(SIGN, blob, mac_use(), 3), 0xFFFF0010, 0, no_room},
       {begin_request(SIGN, blob, mac_use(), 0), 0xFFFF0010, 0, no_room},
   };
-  for (int round = 0; round < 2; round++) {  // 18 in all: more than the pool holds
+  for (int round = 0; round < 2; round++) {  // 24 in all: more than the pool holds
     for (const auto& c : cases) {
       const reply answer = ta.send(c.begin);
       EXPECT_TRUE(failed_with(answer, c.res)) << c.errors;
@@ -63,12 +71,13 @@ TEST_F(Operations, UnknownHandlesAreRefused) {
   const uint32_t ended = begun();
   EXPECT_TRUE(succeeded(ta.abort(ended)));
   for (const uint32_t handle : {0u, ended, ~begun()}) {
-    for (const reply& answer : {ta.update(handle, as_bytes("data")), ta.finish(handle),
-                                ta.send({.id = 17, .a = handle, .input = {1}}), ta.abort(handle)}) {
+    for (const command id : {command::UPDATE, command::FINISH, command::ABORT}) {
+      // Whose input would be refused, too.
+      const reply answer = ta.send({.id = static_cast<uint32_t>(id), .a = handle, .input = {1}});
       EXPECT_TRUE(refused(answer, KM_ERROR_INVALID_OPERATION_HANDLE));
       EXPECT_EQ(answer.b, 0u);
+      EXPECT_EQ(ta.trace().errors(), "operation_pool_get: Operation handle not found");
     }
-    EXPECT_EQ(ta.trace().errors(), "operation_pool_get: Operation handle not found");
   }
 }
 

@@ -24,42 +24,33 @@ constexpr const char* RSA_NUMBERS[] = {
 constexpr const char* EC_NUMBERS[] = {OSSL_PKEY_PARAM_EC_PUB_X, OSSL_PKEY_PARAM_EC_PUB_Y,
                                       OSSL_PKEY_PARAM_PRIV_KEY};
 
-const char* curve_name(uint32_t bits) {
-  if (bits == 521) return "secp521r1";
-  if (bits == 384) return "secp384r1";
-  return bits == 256 ? "prime256v1" : "secp224r1";
-}
-
 const EVP_MD* digest_of(uint32_t digest) {
   constexpr const char* NAMES[] = {nullptr, "MD5", "SHA1", "SHA224", "SHA256", "SHA384", "SHA512"};
   return digest == KM_DIGEST_NONE ? nullptr : EVP_get_digestbyname(NAMES[digest]);
 }
 
-void set_padding(EVP_PKEY_CTX* context, scheme how, int salt) {
-  int padding = RSA_PKCS1_PADDING;
-  if (how.padding == 0) return;
-  if (how.padding == KM_PAD_NONE) padding = RSA_NO_PADDING;
-  if (how.padding == KM_PAD_RSA_OAEP) padding = RSA_PKCS1_OAEP_PADDING;
-  if (how.padding == KM_PAD_RSA_PSS) padding = RSA_PKCS1_PSS_PADDING;
-  must(EVP_PKEY_CTX_set_rsa_padding(context, padding) == 1, "set_rsa_padding");
-  if (how.padding == KM_PAD_RSA_PSS) {
-    must(EVP_PKEY_CTX_set_rsa_pss_saltlen(context, salt) == 1, "set_rsa_pss_saltlen");
-  }
-  if (how.padding == KM_PAD_RSA_OAEP) {
-    must(EVP_PKEY_CTX_set_rsa_oaep_md(context, digest_of(how.digest)) == 1, "set_rsa_oaep_md");
-  }
-}
-
 using init_call = int (*)(EVP_PKEY_CTX*);
 
-owned_context prepared(EVP_PKEY* key, init_call init, scheme how, int salt) {
+owned_context prepared(EVP_PKEY* key, init_call init, scheme how, int salt = 0) {
+  // By KM_PAD_*.
+  constexpr int PADDINGS[] = {0,
+                              RSA_NO_PADDING,
+                              RSA_PKCS1_OAEP_PADDING,
+                              RSA_PKCS1_PSS_PADDING,
+                              RSA_PKCS1_PADDING,
+                              RSA_PKCS1_PADDING};
   owned_context made(EVP_PKEY_CTX_new_from_pkey(nullptr, key, nullptr));
   must(init(made.get()) == 1, "init");
-  set_padding(made.get(), how, salt);
-  const bool signs = init == EVP_PKEY_sign_init || init == EVP_PKEY_verify_init;
-  if (signs && how.digest != KM_DIGEST_NONE) {
-    must(EVP_PKEY_CTX_set_signature_md(made.get(), digest_of(how.digest)) == 1, "signature_md");
+  if (how.padding != 0) {
+    must(EVP_PKEY_CTX_set_rsa_padding(made.get(), PADDINGS[how.padding]) == 1, "set_rsa_padding");
   }
+  if (how.padding == KM_PAD_RSA_PSS) {
+    must(EVP_PKEY_CTX_set_rsa_pss_saltlen(made.get(), salt) == 1, "set_rsa_pss_saltlen");
+  }
+  const auto set_digest =
+      how.padding == KM_PAD_RSA_OAEP ? EVP_PKEY_CTX_set_rsa_oaep_md : EVP_PKEY_CTX_set_signature_md;
+  must(how.digest == KM_DIGEST_NONE || set_digest(made.get(), digest_of(how.digest)) == 1,
+       "set_md");
   return made;
 }
 
@@ -93,7 +84,7 @@ pkey pkey::rsa(uint32_t bits) {
 }
 
 pkey pkey::ec(uint32_t bits) {
-  return pkey(EVP_EC_gen(curve_name(bits)));
+  return pkey(EVP_EC_gen(("P-" + std::to_string(bits)).c_str()));
 }
 
 pkey pkey::rsa_public(byte_view spki) {
@@ -110,20 +101,12 @@ pkey pkey::ec_public(byte_view raw) {
   for (int i = 0; i < 2; i++) {
     const byte_view coordinate = in.field();
     must(coordinate.size() == (bits + 7) / 8, "a coordinate of full length");
-    point.insert(point.end(), coordinate.begin(), coordinate.end());
+    client::append(&point, coordinate);
   }
   must(in.left() == 0, "the end of the record");
-  OSSL_PARAM parts[] = {
-      OSSL_PARAM_construct_utf8_string(OSSL_PKEY_PARAM_GROUP_NAME,
-                                       const_cast<char*>(curve_name(bits)), 0),
-      OSSL_PARAM_construct_octet_string(OSSL_PKEY_PARAM_PUB_KEY, point.data(), point.size()),
-      OSSL_PARAM_construct_end()};
-  const owned_context maker(EVP_PKEY_CTX_new_from_name(nullptr, "EC", nullptr));
-  EVP_PKEY* key = nullptr;
-  must(EVP_PKEY_fromdata_init(maker.get()) == 1 &&
-           EVP_PKEY_fromdata(maker.get(), &key, EVP_PKEY_PUBLIC_KEY, parts) == 1,
-       "EVP_PKEY_fromdata");
-  return pkey(key);
+  pkey key = ec(bits);
+  must(EVP_PKEY_set1_encoded_public_key(key.key_.get(), point.data(), point.size()) == 1, "point");
+  return key;
 }
 
 bytes pkey::import_data() const {
@@ -163,11 +146,11 @@ bool pkey::verify(scheme how, byte_view message, byte_view signature, int salt) 
 }
 
 bytes pkey::encrypt(scheme how, byte_view message) const {
-  return run(EVP_PKEY_encrypt, prepared(key_.get(), EVP_PKEY_encrypt_init, how, 0).get(), message);
+  return run(EVP_PKEY_encrypt, prepared(key_.get(), EVP_PKEY_encrypt_init, how).get(), message);
 }
 
 bytes pkey::decrypt(scheme how, byte_view message) const {
-  return run(EVP_PKEY_decrypt, prepared(key_.get(), EVP_PKEY_decrypt_init, how, 0).get(), message);
+  return run(EVP_PKEY_decrypt, prepared(key_.get(), EVP_PKEY_decrypt_init, how).get(), message);
 }
 
 bytes right_aligned(bytes data, size_t size) {

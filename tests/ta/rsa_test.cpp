@@ -266,11 +266,7 @@ TEST_F(Rsa, NewKeysAreChecked) {
   const std::string no_exponent = "No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified";
   const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
   const param_set good = new_key(512, 65537);
-  const struct {
-    param_set description;
-    int32_t error;
-    std::string message;
-  } rows[] = {
+  const bad_key rows[] = {
       {param_set(good).add(KM_TAG_ORIGIN, 0), -38, "Shouldn't specify KM_TAG_ORIGIN"},
       {param_set(good).add(KM_TAG_CREATION_DATETIME, 1), -38,
        "Shouldn't specify KM_TAG_CREATION_DATETIME"},
@@ -281,8 +277,7 @@ TEST_F(Rsa, NewKeysAreChecked) {
       {new_key(8200, 65537), -6, "Invalid RSA key size 8200"},
       {new_key(513, 65537), -6, "Invalid RSA key size 513"},
   };
-  for (const auto& [description, error, message] : rows)
-    ta.expect_refused(generate_request(description), error, "rsa_generate_key: " + message);
+  ta.expect_refused_keys("rsa", rows);
   // What the platform cannot do is its own code and an unknown error together.
   for (const auto& [bits, exponent, code] : {std::tuple(504, 65537, TEEC_ERROR_NOT_SUPPORTED),
                                              {512, 4, TEEC_ERROR_BAD_PARAMETERS},
@@ -344,22 +339,16 @@ TEST_F(Rsa, ImportsTellTheirSizeAndExponent) {
   }
   const bytes dated = ta.import(with(ANY_USE, KM_TAG_CREATION_DATETIME, {77}), good);
   EXPECT_EQ(ta.characteristics(dated).number(KM_TAG_CREATION_DATETIME), 77U);
-  const struct {
-    param_set description;
-    bytes data;
-    int32_t error;
-    std::string message;
-  } rejected[] = {
-      {e_3, good, -44, "Public exponent mismatch"},
-      {e_65537, nine, -44, "Public exponent mismatch"},
-      {ANY_USE, altered(EXPONENT, bytes(9, 1)), -44, "Public exponent mismatch"},
-      {with(ANY_USE, KM_TAG_KEY_SIZE, {511}), good, -44,
-       "Key size mismatch (given 511, guessed 512)"},
-      {ANY_USE, altered(MODULUS, bytes(1025, 1)), -6, "Invalid RSA key size 8200"},
-      {with(ANY_USE, KM_TAG_OS_VERSION, {1}), good, -38, "Shouldn't specify KM_TAG_OS_VERSION"},
+  const bad_key rejected[] = {
+      {e_3, -44, "Public exponent mismatch", good},
+      {e_65537, -44, "Public exponent mismatch", nine},
+      {ANY_USE, -44, "Public exponent mismatch", altered(EXPONENT, bytes(9, 1))},
+      {with(ANY_USE, KM_TAG_KEY_SIZE, {511}), -44, "Key size mismatch (given 511, guessed 512)",
+       good},
+      {ANY_USE, -6, "Invalid RSA key size 8200", altered(MODULUS, bytes(1025, 1))},
+      {with(ANY_USE, KM_TAG_OS_VERSION, {1}), -38, "Shouldn't specify KM_TAG_OS_VERSION", good},
   };
-  for (const auto& [description, data, error, message] : rejected)
-    ta.expect_refused(import_request(description, data), error, "rsa_import_key: " + message);
+  ta.expect_refused_keys("rsa", rejected);
 }
 
 TEST_F(Rsa, ImportsOfUnusualFormAreUsed) {
