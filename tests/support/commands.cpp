@@ -65,17 +65,22 @@ reply ta_under_test::send_well(const request& what) {
   return answer;
 }
 
-void ta_under_test::expect_refused(const request& what, int32_t km_error, const std::string& line) {
-  EXPECT_TRUE(refused(send(what), km_error)) << line;
+reply ta_under_test::expect_refused(const request& what, int32_t km_error,
+                                    const std::string& line) {
+  reply answer = send(what);
+  EXPECT_TRUE(refused(answer, km_error)) << line;
   EXPECT_TRUE(line.empty() || trace_.has(line)) << line << " is not in: " << trace_.errors();
+  return answer;
 }
 
-void ta_under_test::expect_refused_keys(const std::string& algorithm,
-                                        std::span<const bad_key> keys) {
+void ta_under_test::expect_refused_keys(const std::string& prefix, std::span<const bad_key> keys) {
   for (const auto& [description, km_error, message, data] : keys) {
-    const std::string function = algorithm + (data ? "_import_key: " : "_generate_key: ");
-    expect_refused(data ? import_request(description, *data) : generate_request(description),
-                   km_error, message.empty() ? "" : function + message);
+    const std::string line = prefix + (data ? "import_key: " : "generate_key: ") + message;
+    const reply answer =
+        expect_refused(data ? import_request(description, *data) : generate_request(description),
+                       km_error, message.empty() ? "" : line);
+    EXPECT_EQ(answer.buffer, bytes(AMPLE)) << line;
+    EXPECT_EQ(answer.output_size, data ? AMPLE : 0) << line;
   }
 }
 

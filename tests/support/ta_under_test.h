@@ -134,10 +134,10 @@ class ta_under_test {
 
   // expect_refused: the same, but with TEE success and this error (0: it is done). Unless the line
   // is empty, it is traced.
-  void expect_refused(const request& what, int32_t km_error, const std::string& line = "");
-
-  // expect_refused_keys: each, with its message from "ALGORITHM_generate_key" or "_import_key".
-  void expect_refused_keys(const std::string& algorithm, std::span<const bad_key> keys);
+  reply expect_refused(const request& what, int32_t km_error, const std::string& line = "");
+  // expect_refused_keys: each, with its message from "PREFIXgenerate_key" or "PREFIXimport_key".
+  // The output is cleared; import_key leaves its size.
+  void expect_refused_keys(const std::string& prefix, std::span<const bad_key> keys);
 
   // fail_each_call: sends what `make` gives with the n-th platform call failing, n = 1, 2, ...,
   // until a command comes to its end without. `check` sees each answer, and whether a call failed.

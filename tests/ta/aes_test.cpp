@@ -156,7 +156,7 @@ TEST_F(aes, keys_are_checked) {
       {ANY_USE, -6, "", bytes(20)},
       {good, -44, "Key size mismatch (given 128, guessed 256)", bytes(32)},
   };
-  ta.expect_refused_keys("aes", rows);
+  ta.expect_refused_keys("aes_", rows);
 }
 
 TEST_F(aes, new_keys_say_where_they_come_from_and_stay_inside) {

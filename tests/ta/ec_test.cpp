@@ -8,17 +8,12 @@ namespace {
 using client::as_bytes;
 using client::from_hex;
 
-struct curve_row {
-  uint32_t bits;
-  uint32_t km_curve;
-  pkey key = pkey::ec(bits);
+const pkey CURVES[] = {pkey::ec(224), pkey::ec(256), pkey::ec(384), pkey::ec(521)};
 
-  size_t size() const { return (bits + 7) / 8; }
-};
-const curve_row CURVES[] = {{224, KM_EC_CURVE_P_224},
-                            {256, KM_EC_CURVE_P_256},
-                            {384, KM_EC_CURVE_P_384},
-                            {521, KM_EC_CURVE_P_521}};
+// The length of a number of the key in bytes.
+size_t width(const pkey& key) {
+  return (key.bits() + 7) / 8;
+}
 
 const param_set ANY_USE = any_use(KM_ALGORITHM_EC);
 
@@ -28,7 +23,7 @@ param_set use(uint32_t digest) {
 
 class Ec : public testing::Test {
  protected:
-  bytes imported(const curve_row& row) { return ta.import(ANY_USE, row.key.import_data()); }
+  bytes imported(const pkey& key) { return ta.import(ANY_USE, key.import_data()); }
   reply verify(byte_view blob, uint32_t digest, byte_view message, byte_view signature) {
     return ta.try_run(VERIFY, blob, use(digest), message, signature);
   }
@@ -38,13 +33,13 @@ class Ec : public testing::Test {
 
 TEST_F(Ec, NoOtherSignatureVerifies) {
   const scheme how = {0, KM_DIGEST_SHA_2_256};
-  for (const curve_row& row : CURVES) {
-    const bytes blob = imported(row);
-    const bytes signature = row.key.sign(how, as_bytes("sample"));
+  for (const pkey& key : CURVES) {
+    const bytes blob = imported(key);
+    const bytes signature = key.sign(how, as_bytes("sample"));
     const auto expect_invalid = [&](const bytes& other) {
-      EXPECT_TRUE(refused(verify(blob, how.digest, as_bytes("sample"), other), -30)) << row.bits;
+      EXPECT_TRUE(refused(verify(blob, how.digest, as_bytes("sample"), other), -30)) << key.bits();
     };
-    EXPECT_TRUE(succeeded(verify(blob, how.digest, as_bytes("sample"), signature))) << row.bits;
+    EXPECT_TRUE(succeeded(verify(blob, how.digest, as_bytes("sample"), signature))) << key.bits();
     EXPECT_TRUE(refused(verify(blob, how.digest, as_bytes("simple"), signature), -30));
     for (size_t bit = 0; bit < signature.size() * 8; bit += 5) {
       bytes other = signature;
@@ -60,11 +55,10 @@ TEST_F(Ec, NoOtherSignatureVerifies) {
 }
 
 TEST_F(Ec, SignaturesAreThoseOfTheStandards) {
-  for (const curve_row& row : CURVES) {
-    const pkey& key = row.key;
-    const bytes blob = imported(row);
+  for (const pkey& key : CURVES) {
+    const bytes blob = imported(key);
     for (uint32_t digest = KM_DIGEST_NONE; digest <= UNKNOWN_DIGEST; digest++) {
-      SCOPED_TRACE(std::to_string(row.bits) + " bits, digest " + std::to_string(digest));
+      SCOPED_TRACE(std::to_string(key.bits()) + " bits, digest " + std::to_string(digest));
       if (digest == KM_DIGEST_MD5 || digest == UNKNOWN_DIGEST) {
         const int32_t error = digest == KM_DIGEST_MD5 ? -13 : -12;
         ta.expect_refused(begin_request(SIGN, blob, use(digest)), error);
@@ -72,7 +66,7 @@ TEST_F(Ec, SignaturesAreThoseOfTheStandards) {
         continue;
       }
       // What is not hashed may be shorter than the curve, and is no longer than it.
-      const bytes message(digest == KM_DIGEST_NONE ? row.size() : 200, 0xA7);
+      const bytes message(digest == KM_DIGEST_NONE ? width(key) : 200, 0xA7);
       for (int i = 0; i < 4; i++) {
         const bytes made = ta.run(SIGN, blob, use(digest), message);
         EXPECT_TRUE(key.verify({0, digest}, message, made));
@@ -85,20 +79,20 @@ TEST_F(Ec, SignaturesAreThoseOfTheStandards) {
 }
 
 TEST_F(Ec, DataThatIsNotHashedIsCutToTheCurve) {
-  for (const curve_row& row : CURVES) {
-    const bytes blob = imported(row);
+  for (const pkey& key : CURVES) {
+    const bytes blob = imported(key);
     const uint32_t handle = ta.begun(SIGN, blob, use(KM_DIGEST_NONE));
     const bytes message(100, 0xC5);
     EXPECT_EQ(ta.update(handle, byte_view(message).first(20)).b, 20U);
-    EXPECT_EQ(ta.update(handle, byte_view(message).subspan(20)).b, row.size() - 20);
+    EXPECT_EQ(ta.update(handle, byte_view(message).subspan(20)).b, width(key) - 20);
     EXPECT_EQ(ta.update(handle, message).b, 0U);
     const bytes made = finished(ta.finish(handle, message));  // whose data is not signed either
-    EXPECT_TRUE(row.key.verify({0, 0}, byte_view(message).first(row.size()), made));
+    EXPECT_TRUE(key.verify({0, 0}, byte_view(message).first(width(key)), made));
   }
 }
 
 TEST_F(Ec, NewKeysAreChecked) {
-  const bytes data = CURVES[1].key.import_data();
+  const bytes data = CURVES[1].import_data();
   bytes small = data;
   small[0] = 192;  // of a size field of 256
   small[1] = 0;
@@ -117,58 +111,52 @@ TEST_F(Ec, NewKeysAreChecked) {
        "Shouldn't specify KM_TAG_CREATION_DATETIME", data},
       {with(ANY_USE, KM_TAG_EC_CURVE, {1}), -38, "Shouldn't specify KM_TAG_EC_CURVE", data},
   };
-  ta.expect_refused_keys("ec", rows);
+  ta.expect_refused_keys("ec_", rows);
 }
 
 TEST_F(Ec, KeysAreDescribedAndExported) {
-  for (const curve_row& row : CURVES) {
-    const bytes generated = ta.generate(with(ANY_USE, KM_TAG_KEY_SIZE, {row.bits}));
-    bytes trailing = row.key.import_data();
+  for (const pkey& key : CURVES) {
+    const bytes generated = ta.generate(with(ANY_USE, KM_TAG_KEY_SIZE, {key.bits()}));
+    bytes trailing = key.import_data();
     trailing.push_back(9);
     const bytes taken = ta.import(ANY_USE, trailing);
     EXPECT_EQ(generated.size(), taken.size()) << "records of one size";
     for (const auto& [blob, origin] :
          {std::pair(generated, KM_ORIGIN_GENERATED), {taken, KM_ORIGIN_IMPORTED}}) {
       const param_set found = ta.characteristics(blob);
-      EXPECT_EQ(found.number(KM_TAG_KEY_SIZE), row.bits);
-      EXPECT_EQ(found.number(KM_TAG_EC_CURVE), row.km_curve);
+      EXPECT_EQ(found.number(KM_TAG_KEY_SIZE), key.bits());
+      EXPECT_EQ(found.number(KM_TAG_EC_CURVE), &key - CURVES);  // KM_EC_CURVE_P_224 is 0
       EXPECT_EQ(found.number(KM_TAG_ORIGIN), origin);
       EXPECT_EQ(found.number(KM_TAG_CREATION_DATETIME), START_REE_MS / 1000 * 1000);
       const reply exported = ta.send_well(key_request(command::EXPORT_KEY, blob));
-      const pkey key = pkey::ec_public(exported.output());
+      const pkey found_key = pkey::ec_public(exported.output());
       const bytes signature = ta.run(SIGN, blob, use(KM_DIGEST_SHA1), as_bytes("a"));
-      EXPECT_TRUE(key.verify({0, KM_DIGEST_SHA1}, as_bytes("a"), signature));
+      EXPECT_TRUE(found_key.verify({0, KM_DIGEST_SHA1}, as_bytes("a"), signature));
     }
   }
 }
 
 TEST_F(Ec, NumbersThatAreNoKeyAreRefusedWhenUsed) {
-  const bytes good = CURVES[1].key.import_data();
-  client::field_reader in(byte_view(good).subspan(4));
-  const bytes x = client::copy_of(in.field());
-  const bytes y = client::copy_of(in.field());
-  const bytes d = client::copy_of(in.field());
+  const pkey& key = CURVES[1];
+  const bytes x = key.number(OSSL_PKEY_PARAM_EC_PUB_X);
+  const bytes y = key.number(OSSL_PKEY_PARAM_EC_PUB_Y);
   const bytes order = from_hex("ffffffff00000000ffffffffffffffffbce6faada7179e84f3b9cac2fc632551");
   const bytes too_long(80, 0x11);
   const bytes zero(32);
-  const struct {
-    bytes x, y, d;
-  } rows[] = {{y, x, d},        {x, y, x},        {x, y, zero}, {x, y, order},
-              {{}, y, d},       {x, {}, d},       {x, y, {}},   {too_long, y, d},
-              {x, too_long, d}, {x, y, too_long}, {zero, y, d}, {zero, zero, d}};
-  for (const auto& row : rows) {
-    client::field_writer out;
-    out.u32(256).field(row.x).field(row.y).field(row.d);
-    const bytes blob = ta.import(ANY_USE, out.take());
+  const std::map<size_t, bytes> broken[] = {
+      {{0, y}, {1, x}}, {{2, x}},        {{2, zero}}, {{2, order}},
+      {{0, {}}},        {{1, {}}},       {{2, {}}},   {{0, too_long}},
+      {{1, too_long}},  {{2, too_long}}, {{0, zero}}, {{0, zero}, {1, zero}}};
+  for (const auto& replaced : broken) {
+    const bytes blob = ta.import(ANY_USE, key.import_data(replaced));
     ta.expect_refused(begin_request(SIGN, blob, use(KM_DIGEST_SHA1)), -1000,
                       "create_ec_sign: Resolve key data failed");
   }
-  const bytes blob = ta.import(ANY_USE, good);
   for (const param_set& params : {param_set(), several(KM_TAG_DIGEST, {4, 4})}) {
-    ta.expect_refused(begin_request(VERIFY, blob, params), -38,
+    ta.expect_refused(begin_request(VERIFY, imported(key), params), -38,
                       "create_ec_verify: No or too many KM_TAG_DIGEST");
   }
-  ta.expect_refused(begin_request(ENCRYPT, blob, use(4)), -2);
+  ta.expect_refused(begin_request(ENCRYPT, imported(key), use(4)), -2);
 }
 
 }  // namespace

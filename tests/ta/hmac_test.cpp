@@ -117,7 +117,7 @@ TEST(Hmac, RefusesDescriptionsInOrder) {
       {hmac_key(), -6, "Invalid hmac key size 1032", bytes(129)},
   };
   ta_under_test ta;
-  ta.expect_refused_keys("hmac", keys);
+  ta.expect_refused_keys("hmac_", keys);
   // A repeated size counts as absent when a key is imported, and one more is added.
   const bytes blob = ta.import(hmac_key(128).add(KM_TAG_KEY_SIZE, 128), bytes(20, 1));
   EXPECT_EQ(ta.characteristics(blob).numbers(KM_TAG_KEY_SIZE),

@@ -109,16 +109,18 @@ pkey pkey::ec_public(byte_view raw) {
   return key;
 }
 
-bytes pkey::import_data() const {
+bytes pkey::import_data(const std::map<size_t, bytes>& replaced) const {
+  const bool is_rsa = EVP_PKEY_is_a(key_.get(), "RSA") == 1;
   client::field_writer out;
-  if (EVP_PKEY_is_a(key_.get(), "RSA")) {
-    for (const char* name : RSA_NUMBERS)
-      out.field(number(name));
-    return out.take();
+  if (!is_rsa) out.u32(bits());
+  for (size_t i = 0; i < (is_rsa ? std::size(RSA_NUMBERS) : std::size(EC_NUMBERS)); i++) {
+    if (replaced.contains(i)) {
+      out.field(replaced.at(i));
+    } else {
+      out.field(is_rsa ? number(RSA_NUMBERS[i])
+                       : right_aligned(number(EC_NUMBERS[i]), (bits() + 7) / 8));
+    }
   }
-  out.u32(bits());
-  for (const char* name : EC_NUMBERS)
-    out.field(right_aligned(number(name), (bits() + 7) / 8));
   return out.take();
 }
 

@@ -34,8 +34,9 @@ class pkey {
   static pkey rsa_public(byte_view spki);
   static pkey ec_public(byte_view raw);
 
-  // In the form that import_key takes.
-  bytes import_data() const;
+  // In the form that import_key takes, with some of the numbers (n, e, d, p, q, dP, dQ, qInv or
+  // X, Y, d) replaced.
+  bytes import_data(const std::map<size_t, bytes>& replaced = {}) const;
   // A number of the key, OSSL_PKEY_PARAM_*, without leading zeros.
   bytes number(const char* name) const;
   size_t size() const { return static_cast<size_t>(EVP_PKEY_get_size(key_.get())); }
