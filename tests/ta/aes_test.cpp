@@ -179,30 +179,25 @@ TEST_F(aes, new_keys_say_where_they_come_from_and_stay_inside) {
 TEST_F(aes, begin_refuses) {
   const bytes twelve(12, 1);
   const bytes block(BLOCK, 1);
-  const struct {
-    param_set params;
-    int32_t error;
-    const char* message;  // of create; empty when it has none
-  } rows[] = {
-      {one(KM_TAG_PADDING, KM_PAD_NONE), -38, "No or too many KM_TAG_BLOCK_MODE"},
-      {use(KM_MODE_GCM), -38, "No or too many KM_TAG_MAC_LENGTH"},
-      {use(KM_MODE_GCM, KM_PAD_NONE, 136), -9, "Unsupported mac length 136"},
-      {use(KM_MODE_GCM, KM_PAD_NONE, 100), -9, "Unsupported mac length 100"},
-      {use(KM_MODE_GCM, KM_PAD_PKCS7, 128), -11, ""},
-      {use(KM_MODE_CTR, KM_PAD_PKCS7), -11, ""},
-      {use(KM_MODE_CBC, KM_PAD_RSA_PSS), -11, ""},
-      {use(UNKNOWN_MODE), -7, ""},
-      {use(KM_MODE_ECB, KM_PAD_NONE, 0, block), -40, ""},
-      {use(KM_MODE_CBC, KM_PAD_NONE, 0, twelve), -38, ""},
-      {use(KM_MODE_CTR).add_bytes(KM_TAG_NONCE, {}), -38, ""},
-      {use(KM_MODE_GCM, KM_PAD_NONE, 128, block), -38, ""},
-  };
-  for (const auto& row : rows) {
+  // What create traces, if anything.
+  for (const auto& [params, error, message] :
+       {std::tuple(one(KM_TAG_PADDING, KM_PAD_NONE), -38, "No or too many KM_TAG_BLOCK_MODE"),
+        {use(KM_MODE_GCM), -38, "No or too many KM_TAG_MAC_LENGTH"},
+        {use(KM_MODE_GCM, KM_PAD_NONE, 136), -9, "Unsupported mac length 136"},
+        {use(KM_MODE_GCM, KM_PAD_NONE, 100), -9, "Unsupported mac length 100"},
+        {use(KM_MODE_GCM, KM_PAD_PKCS7, 128), -11, ""},
+        {use(KM_MODE_CTR, KM_PAD_PKCS7), -11, ""},
+        {use(KM_MODE_CBC, KM_PAD_RSA_PSS), -11, ""},
+        {use(UNKNOWN_MODE), -7, ""},
+        {use(KM_MODE_ECB, KM_PAD_NONE, 0, block), -40, ""},
+        {use(KM_MODE_CBC, KM_PAD_NONE, 0, twelve), -38, ""},
+        {use(KM_MODE_CTR).add_bytes(KM_TAG_NONCE, {}), -38, ""},
+        {use(KM_MODE_GCM, KM_PAD_NONE, 128, block), -38, ""}}) {
     for (const auto& [purpose, create] :
          {std::pair(ENCRYPT, "create_aes_encrypt: "s), {DECRYPT, "create_aes_decrypt: "s}}) {
-      ta.expect_refused(begin_request(purpose, blob, row.params), row.error,
-                        *row.message == 0 ? "" : create + row.message);
-      EXPECT_TRUE(ta.trace().has("begin: Create operation failed")) << row.error;
+      ta.expect_refused(begin_request(purpose, blob, params), error,
+                        *message == 0 ? "" : create + message);
+      EXPECT_TRUE(ta.trace().has("begin: Create operation failed")) << error;
     }
   }
   ta.expect_refused(begin_request(SIGN, blob, use(KM_MODE_ECB)), -2);
@@ -295,23 +290,23 @@ TEST_F(aes, gcm_decryption_puts_out_text_and_refuses_its_tag_at_the_end) {
 }
 
 TEST_F(aes, padding_has_only_an_upper_bound) {
-  constexpr struct {
-    uint8_t last;
-    uint8_t before_last;
-    int32_t error;
-    size_t length;  // of the text, when it is accepted
-  } ROWS[] = {{0, 9, 0, 16},  {1, 9, 0, 15},    {2, 2, 0, 14},     {2, 9, -38, 0},
-              {16, 16, 0, 0}, {17, 17, -38, 0}, {255, 255, -38, 0}};
-  for (const auto& row : ROWS) {
-    bytes block(BLOCK, row.last < BLOCK ? 9 : row.last);
-    block[BLOCK - 2] = row.before_last;
-    block[BLOCK - 1] = row.last;
+  // The last two bytes, the answer, and the length of a text that is accepted.
+  for (const auto& [before_last, last, error, length] : {std::tuple(9, 0, 0, 16u),
+                                                         {9, 1, 0, 15},
+                                                         {2, 2, 0, 14},
+                                                         {9, 2, -38, 0},
+                                                         {16, 16, 0, 0},
+                                                         {17, 17, -38, 0},
+                                                         {255, 255, -38, 0}}) {
+    bytes block(BLOCK, static_cast<uint8_t>(last < 16 ? 9 : last));
+    block[BLOCK - 2] = static_cast<uint8_t>(before_last);
+    block[BLOCK - 1] = static_cast<uint8_t>(last);
     const bytes sealed = ta.run(ENCRYPT, blob, use(KM_MODE_ECB), block);
-    const reply last = ta.try_run(DECRYPT, blob, use(KM_MODE_ECB, KM_PAD_PKCS7), sealed);
-    EXPECT_TRUE(refused(last, row.error)) << "last byte " << int{row.last};
-    EXPECT_EQ(last.ok(), !ta.trace().has("aes_decrypt_finish: Illegal padding"));
-    block.resize(row.length);
-    EXPECT_EQ(finished(last), block);
+    const reply opened = ta.try_run(DECRYPT, blob, use(KM_MODE_ECB, KM_PAD_PKCS7), sealed);
+    EXPECT_TRUE(refused(opened, error)) << "last byte " << last;
+    EXPECT_EQ(opened.ok(), !ta.trace().has("aes_decrypt_finish: Illegal padding"));
+    block.resize(length);
+    EXPECT_EQ(finished(opened), block);
   }
 }
 

@@ -8,6 +8,10 @@ namespace {
 using client::as_bytes;
 using client::from_hex;
 
+constexpr scheme SHA1 = {0, KM_DIGEST_SHA1};
+constexpr scheme SHA256 = {0, KM_DIGEST_SHA_2_256};
+constexpr scheme NO_DIGEST = {0, KM_DIGEST_NONE};
+
 const pkey CURVES[] = {pkey::ec(224), pkey::ec(256), pkey::ec(384), pkey::ec(521)};
 
 // The length of a number of the key in bytes.
@@ -17,30 +21,25 @@ size_t width(const pkey& key) {
 
 const param_set ANY_USE = any_use(KM_ALGORITHM_EC);
 
-param_set use(uint32_t digest) {
-  return one(KM_TAG_DIGEST, digest);
-}
-
 class Ec : public testing::Test {
  protected:
   bytes imported(const pkey& key) { return ta.import(ANY_USE, key.import_data()); }
-  reply verify(byte_view blob, uint32_t digest, byte_view message, byte_view signature) {
-    return ta.try_run(VERIFY, blob, use(digest), message, signature);
+  reply verify(byte_view blob, scheme how, byte_view message, byte_view signature) {
+    return ta.try_run(VERIFY, blob, use(how), message, signature);
   }
 
   ta_under_test ta;
 };
 
 TEST_F(Ec, NoOtherSignatureVerifies) {
-  const scheme how = {0, KM_DIGEST_SHA_2_256};
   for (const pkey& key : CURVES) {
     const bytes blob = imported(key);
-    const bytes signature = key.sign(how, as_bytes("sample"));
+    const bytes signature = key.sign(SHA256, as_bytes("sample"));
     const auto expect_invalid = [&](const bytes& other) {
-      EXPECT_TRUE(refused(verify(blob, how.digest, as_bytes("sample"), other), -30)) << key.bits();
+      EXPECT_TRUE(refused(verify(blob, SHA256, as_bytes("sample"), other), -30)) << key.bits();
     };
-    EXPECT_TRUE(succeeded(verify(blob, how.digest, as_bytes("sample"), signature))) << key.bits();
-    EXPECT_TRUE(refused(verify(blob, how.digest, as_bytes("simple"), signature), -30));
+    EXPECT_TRUE(succeeded(verify(blob, SHA256, as_bytes("sample"), signature))) << key.bits();
+    EXPECT_TRUE(refused(verify(blob, SHA256, as_bytes("simple"), signature), -30));
     for (size_t bit = 0; bit < signature.size() * 8; bit += 5) {
       bytes other = signature;
       other[bit / 8] = static_cast<uint8_t>(other[bit / 8] ^ 1 << bit % 8);
@@ -58,22 +57,23 @@ TEST_F(Ec, SignaturesAreThoseOfTheStandards) {
   for (const pkey& key : CURVES) {
     const bytes blob = imported(key);
     for (uint32_t digest = KM_DIGEST_NONE; digest <= UNKNOWN_DIGEST; digest++) {
+      const scheme how = {0, digest};
       SCOPED_TRACE(std::to_string(key.bits()) + " bits, digest " + std::to_string(digest));
       if (digest == KM_DIGEST_MD5 || digest == UNKNOWN_DIGEST) {
         const int32_t error = digest == KM_DIGEST_MD5 ? -13 : -12;
-        ta.expect_refused(begin_request(SIGN, blob, use(digest)), error);
-        ta.expect_refused(begin_request(VERIFY, blob, use(digest)), error);
+        ta.expect_refused(begin_request(SIGN, blob, use(how)), error);
+        ta.expect_refused(begin_request(VERIFY, blob, use(how)), error);
         continue;
       }
       // What is not hashed may be shorter than the curve, and is no longer than it.
       const bytes message(digest == KM_DIGEST_NONE ? width(key) : 200, 0xA7);
       for (int i = 0; i < 4; i++) {
-        const bytes made = ta.run(SIGN, blob, use(digest), message);
-        EXPECT_TRUE(key.verify({0, digest}, message, made));
-        EXPECT_TRUE(succeeded(verify(blob, digest, message, key.sign({0, digest}, message))));
+        const bytes made = ta.run(SIGN, blob, use(how), message);
+        EXPECT_TRUE(key.verify(how, message, made));
+        EXPECT_TRUE(succeeded(verify(blob, how, message, key.sign(how, message))));
       }
       const byte_view part = byte_view(message).first(11);
-      EXPECT_TRUE(key.verify({0, digest}, part, ta.run(SIGN, blob, use(digest), part)));
+      EXPECT_TRUE(key.verify(how, part, ta.run(SIGN, blob, use(how), part)));
     }
   }
 }
@@ -81,13 +81,13 @@ TEST_F(Ec, SignaturesAreThoseOfTheStandards) {
 TEST_F(Ec, DataThatIsNotHashedIsCutToTheCurve) {
   for (const pkey& key : CURVES) {
     const bytes blob = imported(key);
-    const uint32_t handle = ta.begun(SIGN, blob, use(KM_DIGEST_NONE));
+    const uint32_t handle = ta.begun(SIGN, blob, use(NO_DIGEST));
     const bytes message(100, 0xC5);
     EXPECT_EQ(ta.update(handle, byte_view(message).first(20)).b, 20U);
     EXPECT_EQ(ta.update(handle, byte_view(message).subspan(20)).b, width(key) - 20);
     EXPECT_EQ(ta.update(handle, message).b, 0U);
     const bytes made = finished(ta.finish(handle, message));  // whose data is not signed either
-    EXPECT_TRUE(key.verify({0, 0}, byte_view(message).first(width(key)), made));
+    EXPECT_TRUE(key.verify(NO_DIGEST, byte_view(message).first(width(key)), made));
   }
 }
 
@@ -130,8 +130,8 @@ TEST_F(Ec, KeysAreDescribedAndExported) {
       EXPECT_EQ(found.number(KM_TAG_CREATION_DATETIME), START_REE_MS / 1000 * 1000);
       const reply exported = ta.send_well(key_request(command::EXPORT_KEY, blob));
       const pkey found_key = pkey::ec_public(exported.output());
-      const bytes signature = ta.run(SIGN, blob, use(KM_DIGEST_SHA1), as_bytes("a"));
-      EXPECT_TRUE(found_key.verify({0, KM_DIGEST_SHA1}, as_bytes("a"), signature));
+      const bytes signature = ta.run(SIGN, blob, use(SHA1), as_bytes("a"));
+      EXPECT_TRUE(found_key.verify(SHA1, as_bytes("a"), signature));
     }
   }
 }
@@ -149,14 +149,14 @@ TEST_F(Ec, NumbersThatAreNoKeyAreRefusedWhenUsed) {
       {{1, too_long}},  {{2, too_long}}, {{0, zero}}, {{0, zero}, {1, zero}}};
   for (const auto& replaced : broken) {
     const bytes blob = ta.import(ANY_USE, key.import_data(replaced));
-    ta.expect_refused(begin_request(SIGN, blob, use(KM_DIGEST_SHA1)), -1000,
+    ta.expect_refused(begin_request(SIGN, blob, use(SHA1)), -1000,
                       "create_ec_sign: Resolve key data failed");
   }
   for (const param_set& params : {param_set(), several(KM_TAG_DIGEST, {4, 4})}) {
     ta.expect_refused(begin_request(VERIFY, imported(key), params), -38,
                       "create_ec_verify: No or too many KM_TAG_DIGEST");
   }
-  ta.expect_refused(begin_request(ENCRYPT, imported(key), use(4)), -2);
+  ta.expect_refused(begin_request(ENCRYPT, imported(key), use(SHA256)), -2);
 }
 
 }  // namespace

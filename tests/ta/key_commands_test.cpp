@@ -130,36 +130,32 @@ TEST(OpenKey, TellsShortBlobsApart) {
 }
 
 TEST(Version, KeysOpenUnderTheirOwnAlone) {
-  const struct {
-    uint32_t version, patchlevel;
-    int32_t open_error, upgrade_error;
-  } cases[] = {
-      {OS_VERSION, OS_PATCHLEVEL, 0, 0},         {OS_VERSION + 1, OS_PATCHLEVEL, -62, 0},
-      {OS_VERSION, OS_PATCHLEVEL + 1, -62, 0},   {OS_VERSION - 1, OS_PATCHLEVEL, -33, -38},
-      {OS_VERSION, OS_PATCHLEVEL - 1, -33, -38}, {OS_VERSION + 1, OS_PATCHLEVEL - 1, -62, -38},
-      {0x80000000, OS_PATCHLEVEL, -62, 0},  // compared without sign
-      {OS_VERSION, 0x80000000, -62, 0},          {0, 0, -33, -38},
-  };
   ta_under_test ta;
   const bytes blob = ta.generate(hmac_key(256));
-  for (const auto& c : cases) {
-    ta.configure(c.version, c.patchlevel);
+  for (const auto& [version, patchlevel, open_error, upgrade_error] :
+       {std::tuple(OS_VERSION, OS_PATCHLEVEL, 0, 0),
+        {OS_VERSION + 1, OS_PATCHLEVEL, -62, 0},
+        {OS_VERSION, OS_PATCHLEVEL + 1, -62, 0},
+        {OS_VERSION - 1, OS_PATCHLEVEL, -33, -38},
+        {OS_VERSION, OS_PATCHLEVEL - 1, -33, -38},
+        {OS_VERSION + 1, OS_PATCHLEVEL - 1, -62, -38},
+        {0x80000000, OS_PATCHLEVEL, -62, 0},  // compared without sign
+        {OS_VERSION, 0x80000000, -62, 0},
+        {0, 0, -33, -38}}) {
+    SCOPED_TRACE(std::to_string(version) + ", " + std::to_string(patchlevel));
+    ta.configure(version, patchlevel);
     for (const command id : {command::GET_KEY_CHARACTER_SIZE, command::GET_KEY_CHARACTER}) {
-      EXPECT_TRUE(refused(ta.send(key_request(id, blob)), c.open_error)) << c.version;
+      ta.expect_refused(key_request(id, blob), open_error);
     }
-    EXPECT_TRUE(refused(ta.send(key_request(command::EXPORT_KEY, blob)),
-                        c.open_error == 0 ? KM_ERROR_UNSUPPORTED_KEY_FORMAT : c.open_error));
-    EXPECT_TRUE(refused(ta.try_begin(SIGN, blob, mac_use()), c.open_error)) << c.version;
-
-    const reply upgraded = ta.upgrade(blob);
-    EXPECT_TRUE(refused(upgraded, c.upgrade_error)) << c.version << " " << c.patchlevel;
-    if (c.upgrade_error != 0) {
-      EXPECT_EQ(ta.trace().errors(), "upgrade_key: Can't upgrade key params");
-      continue;
-    }
+    ta.expect_refused(key_request(command::EXPORT_KEY, blob), open_error == 0 ? -17 : open_error);
+    EXPECT_TRUE(refused(ta.try_begin(SIGN, blob, mac_use()), open_error));
+    const reply upgraded =
+        ta.expect_refused(upgrade_request(blob), upgrade_error,
+                          upgrade_error == 0 ? "" : "upgrade_key: Can't upgrade key params");
+    if (upgrade_error != 0) continue;
     const param_set made = ta.characteristics(upgraded.output());
-    EXPECT_EQ(made.numbers(KM_TAG_OS_VERSION), std::vector<uint64_t>{c.version});
-    EXPECT_EQ(made.numbers(KM_TAG_OS_PATCHLEVEL), std::vector<uint64_t>{c.patchlevel});
+    EXPECT_EQ(made.numbers(KM_TAG_OS_VERSION), std::vector<uint64_t>{version});
+    EXPECT_EQ(made.numbers(KM_TAG_OS_PATCHLEVEL), std::vector<uint64_t>{patchlevel});
   }
 }
 

@@ -29,16 +29,17 @@ const EVP_MD* digest_of(uint32_t digest) {
   return digest == KM_DIGEST_NONE ? nullptr : EVP_get_digestbyname(NAMES[digest]);
 }
 
+// By KM_PAD_*.
+constexpr int PADDINGS[] = {0,
+                            RSA_NO_PADDING,
+                            RSA_PKCS1_OAEP_PADDING,
+                            RSA_PKCS1_PSS_PADDING,
+                            RSA_PKCS1_PADDING,
+                            RSA_PKCS1_PADDING};
+
 using init_call = int (*)(EVP_PKEY_CTX*);
 
 owned_context prepared(EVP_PKEY* key, init_call init, scheme how, int salt = 0) {
-  // By KM_PAD_*.
-  constexpr int PADDINGS[] = {0,
-                              RSA_NO_PADDING,
-                              RSA_PKCS1_OAEP_PADDING,
-                              RSA_PKCS1_PSS_PADDING,
-                              RSA_PKCS1_PADDING,
-                              RSA_PKCS1_PADDING};
   owned_context made(EVP_PKEY_CTX_new_from_pkey(nullptr, key, nullptr));
   must(init(made.get()) == 1, "init");
   if (how.padding != 0) {

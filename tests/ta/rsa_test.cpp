@@ -5,6 +5,8 @@
 namespace keymaster::test {
 namespace {
 
+using namespace std::string_literals;
+
 constexpr scheme RAW = {KM_PAD_NONE, KM_DIGEST_NONE};
 constexpr scheme PKCS1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_NONE};
 constexpr scheme PKCS1_SHA1 = {KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA1};
@@ -118,21 +120,14 @@ TEST_F(Rsa, CiphertextsAreThoseOfTheStandards) {
 
 TEST_F(Rsa, MessagesHaveLimits) {
   const bytes blob = imported(KEY_2048);
-  const struct {
-    uint32_t purpose;
-    scheme how;
-    size_t longest;
-    std::string verb;  // of update's refusal of what is longer; empty: it is finish that refuses
-  } rows[] = {
-      {SIGN, PKCS1, 245, "sign"},
-      {VERIFY, PKCS1, 245, "verify"},
-      {SIGN, RAW, 256, "sign"},
-      {ENCRYPT, RAW, 256, "encrypt"},
-      {DECRYPT, PKCS1_ENCRYPT, 256, "decrypt"},
-      {ENCRYPT, PKCS1_ENCRYPT, 245, ""},
-      {ENCRYPT, OAEP_SHA256, 190, ""},
-  };
-  for (const auto& [purpose, how, longest, verb] : rows) {
+  // What update says when it refuses what is longer; else it is finish that refuses.
+  for (const auto& [purpose, how, longest, verb] : {std::tuple(SIGN, PKCS1, 245u, "sign"s),
+                                                    {VERIFY, PKCS1, 245, "verify"},
+                                                    {SIGN, RAW, 256, "sign"},
+                                                    {ENCRYPT, RAW, 256, "encrypt"},
+                                                    {DECRYPT, PKCS1_ENCRYPT, 256, "decrypt"},
+                                                    {ENCRYPT, PKCS1_ENCRYPT, 245, ""},
+                                                    {ENCRYPT, OAEP_SHA256, 190, ""}}) {
     const std::string max = std::to_string(longest) + "B, got ";
     const std::string message = (verb.empty() ? "Message too long, max " + max
                                               : "too long to " + verb + ", key_size 2048, input ") +
@@ -232,7 +227,7 @@ TEST_F(Rsa, BeginWantsOnePaddingAndOneDigest) {
        {std::pair(KM_TAG_PADDING, "KM_TAG_PADDING"), {KM_TAG_DIGEST, "KM_TAG_DIGEST"}}) {
     for (const param_set& params : {without(use(PKCS1), tag), use(PKCS1).add(tag, 5)}) {
       ta.expect_refused(begin_request(VERIFY, blob, params), -38,
-                        std::string("create_rsa_verify: No or too many ") + name);
+                        "create_rsa_verify: No or too many "s + name);
     }
   }
   // Digests that nothing knows, in a key that allows them.
