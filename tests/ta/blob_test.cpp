@@ -97,11 +97,8 @@ TEST(Blob, ThatDoNotOpenAskForAnUpgrade) {
   trailing.push_back(0x99);
   const std::string too_short = "open_key: Too short input";
   const std::string no_set = "unmarshal: Too short input | open_key: Unmarshal failed";
-  const struct {
-    const char* what;
-    bytes blob;
-    std::string reason;  // empty: it opens
-  } cases[] = {
+  // What is wrong, and the reason; without one the blob opens.
+  const std::tuple<const char*, bytes, std::string> cases[] = {
       {"good", seal(good), ""},
       {"bytes behind the characteristics", seal(trailing), ""},
       {"nothing inside", seal({}), "open_key: Too short key blob"},
@@ -117,10 +114,10 @@ TEST(Blob, ThatDoNotOpenAskForAnUpgrade) {
       {"protection 1", seal(good, derived_ksk(), 1), "open_key: RPMB KSK died, fail to open key"},
       {"another key", seal(good, FIXED_KSK), "open_key: AEDecryptFinal failed with 0xffff3071"},
   };
-  for (const auto& c : cases) {
-    EXPECT_TRUE(refused(open(&ta, c.blob), c.reason.empty() ? 0 : -62)) << c.what;
-    const std::string end = c.reason.empty() ? "" : " | get_key_character: Open key failed";
-    EXPECT_EQ(ta.trace().errors(), c.reason + end) << c.what;
+  for (const auto& [what, blob, reason] : cases) {
+    EXPECT_TRUE(refused(open(&ta, blob), reason.empty() ? 0 : -62)) << what;
+    const std::string end = reason.empty() ? "" : " | get_key_character: Open key failed";
+    EXPECT_EQ(ta.trace().errors(), reason + end) << what;
   }
 }
 

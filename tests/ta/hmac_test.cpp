@@ -33,20 +33,23 @@ const struct {
     {0xaa, 100, "Hi There", 4, "4e9638590f2780370491dacfd8e20c85600da0ded385d8b4f68b00425d4518f2"},
 };
 
-TEST(Hmac, ComputesPublishedMacsAndForgetsTheKeys) {
+class Hmac : public testing::Test {
+ protected:
   ta_under_test ta;
+  const bytes blob = ta.import(hmac_key(), bytes(20, 0x0b));
+};
+
+TEST_F(Hmac, ComputesPublishedMacsAndForgetsTheKeys) {
   for (const auto& v : VECTORS) {
     const bytes key(v.key_size, v.key_byte);
     ta.watch_secret(key);
-    const bytes blob = ta.import(hmac_key(0, v.digest), key);
+    const bytes its_blob = ta.import(hmac_key(0, v.digest), key);
     const auto bits = static_cast<uint32_t>(4 * std::string_view(v.mac).size());
-    EXPECT_EQ(to_hex(ta.run(SIGN, blob, mac_use(bits, v.digest), as_bytes(v.data))), v.mac);
+    EXPECT_EQ(to_hex(ta.run(SIGN, its_blob, mac_use(bits, v.digest), as_bytes(v.data))), v.mac);
   }
 }
 
-TEST(Hmac, TakesDataInAnyPiecesAndNothingAtFinish) {
-  ta_under_test ta;
-  const bytes blob = ta.import(hmac_key(), bytes(20, 0x0b));
+TEST_F(Hmac, TakesDataInAnyPiecesAndNothingAtFinish) {
   const byte_view data = as_bytes("Hi There");
   for (size_t cut = 0; cut <= data.size(); cut++) {
     const uint32_t handle = ta.begun(SIGN, blob, mac_use());
@@ -61,9 +64,7 @@ TEST(Hmac, TakesDataInAnyPiecesAndNothingAtFinish) {
             "0400000000000000");
 }
 
-TEST(Hmac, MacLengthIsMeasuredAtTheEnd) {
-  ta_under_test ta;
-  const bytes blob = ta.generate(hmac_key(256));
+TEST_F(Hmac, MacLengthIsMeasuredAtTheEnd) {
   for (const auto& [bits, length] : {std::pair(64u, 8u), {100, 12}, {256, 32}}) {  // whole bytes
     EXPECT_EQ(ta.run(SIGN, blob, mac_use(bits), {}).size(), length);
   }
@@ -78,16 +79,14 @@ TEST(Hmac, MacLengthIsMeasuredAtTheEnd) {
 }
 
 // Verification can be begun and fed; it never succeeds.
-TEST(Hmac, VerifyAlwaysEndsOutOfMemory) {
-  ta_under_test ta;
-  const bytes blob = ta.generate(hmac_key(256));
+TEST_F(Hmac, VerifyAlwaysEndsOutOfMemory) {
   const bytes mac = ta.run(SIGN, blob, mac_use(128), as_bytes("data"));
   EXPECT_TRUE(refused(ta.try_run(VERIFY, blob, mac_use(128), as_bytes("data"), mac),
                       KM_ERROR_MEMORY_ALLOCATION_FAILED));
   EXPECT_TRUE(ta.trace().has("hmac_verify_finish: Out of memory, need 16B"));
 }
 
-TEST(Hmac, RefusesDescriptionsInOrder) {
+TEST_F(Hmac, RefusesDescriptionsInOrder) {
   const param_set good = hmac_key(256);
   const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
   const std::string no_minimum = "No or too many KM_TAG_MIN_MAC_LENGTH or specified";
@@ -116,21 +115,19 @@ TEST(Hmac, RefusesDescriptionsInOrder) {
       {hmac_key(), -6, "Invalid hmac key size 0", bytes()},
       {hmac_key(), -6, "Invalid hmac key size 1032", bytes(129)},
   };
-  ta_under_test ta;
   ta.expect_refused_keys("hmac_", keys);
   // A repeated size counts as absent when a key is imported, and one more is added.
-  const bytes blob = ta.import(hmac_key(128).add(KM_TAG_KEY_SIZE, 128), bytes(20, 1));
-  EXPECT_EQ(ta.characteristics(blob).numbers(KM_TAG_KEY_SIZE),
+  const bytes sized = ta.import(hmac_key(128).add(KM_TAG_KEY_SIZE, 128), bytes(20, 1));
+  EXPECT_EQ(ta.characteristics(sized).numbers(KM_TAG_KEY_SIZE),
             (std::vector<uint64_t>{128, 128, 160}));
 }
 
 // The largest minimum that each digest reaches, and 8 bits more.
-TEST(Hmac, MinimumMacLengthEndsAtTheDigests) {
-  ta_under_test ta;
+TEST_F(Hmac, MinimumMacLengthEndsAtTheDigests) {
   for (const auto& [digest, bits] : {std::pair{2u, 160u}, {3, 224}, {4, 256}, {5, 384}, {6, 512}}) {
     const param_set key = hmac_key(1024, digest);
-    const bytes blob = ta.generate(with(key, KM_TAG_MIN_MAC_LENGTH, {bits}));
-    EXPECT_EQ(ta.run(SIGN, blob, mac_use(bits, digest), {}).size(), bits / 8);
+    const bytes its_blob = ta.generate(with(key, KM_TAG_MIN_MAC_LENGTH, {bits}));
+    EXPECT_EQ(ta.run(SIGN, its_blob, mac_use(bits, digest), {}).size(), bits / 8);
     ta.expect_refused(generate_request(with(key, KM_TAG_MIN_MAC_LENGTH, {bits + 8})), -59);
   }
 }

@@ -38,13 +38,7 @@ TEST(MakeKey, RefusesDescriptions) {
 TEST(MakeKey, NamesWhatIsWrongWithItsBuffers) {
   const bytes good = import_request(hmac_key(), KEY).input;
   const std::string no_set = "unmarshal: Too short input | ";
-  const struct {
-    uint32_t id;
-    bytes input;
-    size_t capacity;
-    TEEC_Result res;
-    std::string errors;
-  } cases[] = {
+  const std::tuple<uint32_t, bytes, size_t, TEEC_Result, std::string> cases[] = {
       {13, {1, 0, 0, 0}, 10, 0xFFFF0006, no_set + "generate_key: Unmarshal failed"},
       {19, {4, 0, 0, 0, 1, 0, 0, 0}, 10, 0xFFFF0006, no_set + "import_key: Unmarshal failed"},
       {19, {4, 0, 0, 0, 1, 0, 0}, 0, 0xFFFF0000, "import_key: Too short input"},
@@ -55,10 +49,10 @@ TEST(MakeKey, NamesWhatIsWrongWithItsBuffers) {
        "save_key: Too short key blob | import_key: Can't save key to TEE storage"},
   };
   ta_under_test ta;
-  for (const auto& c : cases) {
-    const request what = {.id = c.id, .input = c.input, .capacity = c.capacity};
-    EXPECT_TRUE(failed_with(ta.send(what), c.res)) << c.errors;
-    EXPECT_EQ(ta.trace().errors(), c.errors);
+  for (const auto& [id, input, capacity, res, errors] : cases) {
+    const reply answer = ta.send({.id = id, .input = input, .capacity = capacity});
+    EXPECT_TRUE(failed_with(answer, res)) << errors;
+    EXPECT_EQ(ta.trace().errors(), errors);
   }
 }
 

@@ -34,12 +34,7 @@ TEST_F(Operations, BeginLeavesNoOperationWhenItFails) {
   const std::string no_length = "create_hmac_sign: No or too many KM_TAG_MAC_LENGTH" + not_created;
   const std::string no_key = "create_hmac_sign: Resolve key data failed" + not_created;
   const std::string no_room = "marshal: Too short marshalling buffer | begin: Marshal failed";
-  const struct {
-    request begin;
-    TEEC_Result res;
-    int32_t error;
-    std::string errors;
-  } cases[] = {
+  const std::tuple<request, TEEC_Result, int32_t, std::string> cases[] = {
       {garbage, 0xFFFF0006, 0, "unmarshal: Too short input | begin: Unmarshal failed"},
       {begin_request(0, blob, mac_use()), 0, -2, "begin: Algorithm HMAC purpose 0" + refused},
       {begin_request(4, blob, mac_use()), 0, -2, "begin: Algorithm HMAC purpose 4" + refused},
@@ -56,11 +51,11 @@ TEST_F(Operations, BeginLeavesNoOperationWhenItFails) {
       {begin_request(SIGN, blob, mac_use(), 0), 0xFFFF0010, 0, no_room},
   };
   for (int round = 0; round < 2; round++) {  // 24 in all: more than the pool holds
-    for (const auto& c : cases) {
-      const reply answer = ta.send(c.begin);
-      EXPECT_TRUE(failed_with(answer, c.res)) << c.errors;
-      EXPECT_EQ(answer.km_error, c.error) << c.errors;
-      EXPECT_EQ(ta.trace().errors(), c.errors);
+    for (const auto& [begin, res, error, errors] : cases) {
+      const reply answer = ta.send(begin);
+      EXPECT_TRUE(failed_with(answer, res)) << errors;
+      EXPECT_EQ(answer.km_error, error) << errors;
+      EXPECT_EQ(ta.trace().errors(), errors);
       expect_gone(answer.b);
     }
   }
