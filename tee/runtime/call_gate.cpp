@@ -17,6 +17,7 @@ namespace {
 struct gate_state {
   std::mutex mutex;
   std::condition_variable left;
+  size_t waiting = 0;
 };
 
 gate_state& gates() {
@@ -46,7 +47,9 @@ bool call_gate::enter() {
   while (holder_ != nullptr) {
     if (waits_for(chain)) return false;
     chain.awaited = this;
+    ++gates().waiting;
     gates().left.wait(lock);
+    --gates().waiting;
     chain.awaited = nullptr;
   }
   holder_ = &chain;
@@ -56,7 +59,7 @@ bool call_gate::enter() {
 void call_gate::leave() {
   std::lock_guard lock(gates().mutex);
   holder_ = nullptr;
-  gates().left.notify_all();
+  if (gates().waiting > 0) gates().left.notify_all();
 }
 
 }  // namespace tee

@@ -50,9 +50,10 @@ heap::~heap() {
 void* heap::allocate(size_t size, bool zero) {
   if (size > limit_ - bytes_) return nullptr;
   if ((count_ + 1) * 2 > table_.size()) grow();
-  void* block = zero ? std::calloc(size, 1) : std::malloc(size);
+  // calloc would pass by the allocator's cache of freed blocks.
+  void* block = std::malloc(size);
   if (!block) return nullptr;
-  if (!zero && size > 0) std::memset(block, UNFILLED, size);
+  if (size > 0) std::memset(block, zero ? 0 : UNFILLED, size);
   insert(block, size);
   return block;
 }

@@ -85,6 +85,7 @@ void ta_instance::close_session(void* context, const TEE_Identity& client) {
   }
   std::lock_guard lock(pending_mutex_);
   pending_.push_back({context, client});
+  any_pending_ = true;
 }
 
 void ta_instance::run_close(const pending_close& session) {
@@ -95,11 +96,11 @@ void ta_instance::run_close(const pending_close& session) {
 
 // One at a time: a close entry point may make further ones pending.
 void ta_instance::run_pending_closes() {
-  for (;;) {
+  while (any_pending_) {
     std::unique_lock lock(pending_mutex_);
-    if (pending_.empty()) return;
     pending_close next = pending_.back();
     pending_.pop_back();
+    any_pending_ = !pending_.empty();
     lock.unlock();
     run_close(next);
   }

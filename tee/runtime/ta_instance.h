@@ -3,6 +3,7 @@
 
 #include "tee_internal_api.h"
 
+#include <atomic>
 #include <memory>
 #include <mutex>
 #include <vector>
@@ -86,6 +87,7 @@ class ta_instance {
   stage stage_ = stage::LOADED;
   std::mutex pending_mutex_;
   std::vector<pending_close> pending_;
+  std::atomic<bool> any_pending_ = false;  // so that no visit locks for nothing
 };
 
 }  // namespace tee
