@@ -79,8 +79,9 @@ TEE_Result load_ec_key(uint32_t type, uint32_t max_bits, std::vector<attribute> 
   return TEE_SUCCESS;
 }
 
-TEE_Result generate_ec_key(uint32_t bits, std::span<const attribute> parameters, key_ptr* result) {
-  const attribute* named = find_attribute(parameters, TEE_ATTR_ECC_CURVE);
+TEE_Result generate_ec_key(uint32_t bits, std::span<const attribute_view> parameters,
+                           key_ptr* result) {
+  const attribute_view* named = find_attribute(parameters, TEE_ATTR_ECC_CURVE);
   const curve* on = named && parameters.size() == 1 ? find_curve(named->a) : nullptr;
   if (!on || on->bits != bits) return TEE_ERROR_BAD_PARAMETERS;
   pkey_ptr pkey(EVP_EC_gen(on->name));

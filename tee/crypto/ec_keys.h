@@ -12,7 +12,7 @@ namespace tee::crypto {
                                      std::vector<attribute> attributes, key_ptr* result);
 
 // generate_ec_key: a new key pair. See generate_key for the parameters.
-[[nodiscard]] TEE_Result generate_ec_key(uint32_t bits, std::span<const attribute> parameters,
+[[nodiscard]] TEE_Result generate_ec_key(uint32_t bits, std::span<const attribute_view> parameters,
                                          key_ptr* result);
 
 }  // namespace tee::crypto

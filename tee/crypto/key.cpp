@@ -22,7 +22,7 @@ TEE_Result load_symmetric(const key_type& type, uint32_t max_bits,
 }
 
 TEE_Result generate_symmetric(const key_type& type, uint32_t bits,
-                              std::span<const attribute> parameters, key_ptr* result) {
+                              std::span<const attribute_view> parameters, key_ptr* result) {
   if (!parameters.empty()) return TEE_ERROR_BAD_PARAMETERS;
   attribute secret{TEE_ATTR_SECRET_VALUE, secret_bytes(bits / 8)};
   fill_random(secret.bytes);
@@ -32,26 +32,39 @@ TEE_Result generate_symmetric(const key_type& type, uint32_t bits,
   return TEE_SUCCESS;
 }
 
-size_t times_given(std::span<const attribute> attributes, uint32_t id) {
+size_t times_given(std::span<const attribute_view> attributes, uint32_t id) {
   return static_cast<size_t>(std::count_if(attributes.begin(), attributes.end(),
-                                           [=](const attribute& a) { return a.id == id; }));
+                                           [=](const attribute_view& a) { return a.id == id; }));
+}
+
+template <typename List>
+auto find_in(const List& attributes, uint32_t id) {
+  auto found =
+      std::find_if(attributes.begin(), attributes.end(), [=](const auto& a) { return a.id == id; });
+  return found == attributes.end() ? nullptr : &*found;
 }
 
 }  // namespace
 
 const attribute* key::find(uint32_t id) const {
-  return find_attribute(attributes_, id);
+  return find_in(attributes_, id);
 }
 
-const attribute* find_attribute(std::span<const attribute> attributes, uint32_t id) {
-  auto found = std::find_if(attributes.begin(), attributes.end(),
-                            [=](const attribute& a) { return a.id == id; });
-  return found == attributes.end() ? nullptr : &*found;
+const attribute_view* find_attribute(std::span<const attribute_view> attributes, uint32_t id) {
+  return find_in(attributes, id);
 }
 
-const char* broken_rule(uint32_t type, std::span<const attribute> attributes) {
+std::vector<attribute_view> views_of(std::span<const attribute> attributes) {
+  std::vector<attribute_view> views;
+  views.reserve(attributes.size());
+  for (const attribute& held : attributes)
+    views.push_back({held.id, held.bytes, held.a, held.b});
+  return views;
+}
+
+const char* broken_rule(uint32_t type, std::span<const attribute_view> attributes) {
   const key_type& row = *find_key_type(type);
-  for (const attribute& given : attributes) {
+  for (const attribute_view& given : attributes) {
     if (!row.has(given.id)) return "an attribute does not belong to the object's type";
     if (times_given(attributes, given.id) > 1) return "an attribute is given twice";
   }
@@ -63,14 +76,15 @@ const char* broken_rule(uint32_t type, std::span<const attribute> attributes) {
   return nullptr;
 }
 
-std::vector<attribute> in_table_order(uint32_t type, std::vector<attribute> attributes) {
-  std::vector<attribute> ordered;
+std::vector<attribute_view> in_table_order(uint32_t type,
+                                           std::span<const attribute_view> attributes) {
+  std::vector<attribute_view> ordered;
   ordered.reserve(attributes.size());
   for (const attribute_rule& rule : find_key_type(type)->attributes) {
-    for (attribute& given : attributes) {
+    for (const attribute_view& given : attributes) {
       if (given.id != rule.id) continue;
       bool absent = rule.presence == attribute_rule::OPTIONAL && given.bytes.empty();
-      if (!absent) ordered.push_back(std::move(given));
+      if (!absent) ordered.push_back(given);
     }
   }
   return ordered;
@@ -82,16 +96,20 @@ std::span<const uint8_t> without_leading_zeros(std::span<const uint8_t> number) 
   return number;
 }
 
-TEE_Result load_key(uint32_t type, uint32_t max_bits, std::vector<attribute> attributes,
+TEE_Result load_key(uint32_t type, uint32_t max_bits, std::span<const attribute_view> attributes,
                     key_ptr* result) {
   const key_type& row = *find_key_type(type);
-  std::vector<attribute> ordered = in_table_order(type, std::move(attributes));
+  std::vector<attribute> ordered;
+  for (const attribute_view& given : in_table_order(type, attributes)) {
+    ordered.push_back(
+        {given.id, secret_bytes(given.bytes.begin(), given.bytes.end()), given.a, given.b});
+  }
   if (row.symmetric()) return load_symmetric(row, max_bits, std::move(ordered), result);
   if (row.has(TEE_ATTR_ECC_CURVE)) return load_ec_key(type, max_bits, std::move(ordered), result);
   return load_rsa_key(type, max_bits, std::move(ordered), result);
 }
 
-TEE_Result generate_key(uint32_t type, uint32_t bits, std::span<const attribute> parameters,
+TEE_Result generate_key(uint32_t type, uint32_t bits, std::span<const attribute_view> parameters,
                         key_ptr* result) {
   const key_type& row = *find_key_type(type);
   if (row.symmetric()) return generate_symmetric(row, bits, parameters, result);

@@ -24,6 +24,16 @@ struct attribute {
   bool is_value() const { return (id & TEE_ATTR_FLAG_VALUE) != 0; }
 };
 
+// An attribute whose bytes are somebody else's: what a key is made of, or found by.
+struct attribute_view {
+  uint32_t id = 0;
+  std::span<const uint8_t> bytes;
+  uint32_t a = 0;
+  uint32_t b = 0;
+};
+
+std::vector<attribute_view> views_of(std::span<const attribute> attributes);
+
 // A key never changes after it is made; objects and operations share it. Its spare contexts are
 // working memory: those who share a key must not use it at the same time.
 class key {
@@ -64,16 +74,17 @@ class key {
 using key_ptr = std::shared_ptr<key>;
 
 // find_attribute: the first one with this identifier, or null.
-const attribute* find_attribute(std::span<const attribute> attributes, uint32_t id);
+const attribute_view* find_attribute(std::span<const attribute_view> attributes, uint32_t id);
 
 // broken_rule: which rule about the presence of attributes a list breaks for a type that is in the
 // table: a mandatory one missing or given twice, one that does not belong to the type. Null: none.
 // An empty optional attribute counts as absent.
-const char* broken_rule(uint32_t type, std::span<const attribute> attributes);
+const char* broken_rule(uint32_t type, std::span<const attribute_view> attributes);
 
 // in_table_order: the attributes in the order of the type's table, the empty optional ones left
 // out.
-std::vector<attribute> in_table_order(uint32_t type, std::vector<attribute> attributes);
+std::vector<attribute_view> in_table_order(uint32_t type,
+                                           std::span<const attribute_view> attributes);
 
 // without_leading_zeros: the significant bytes of a big-endian number.
 std::span<const uint8_t> without_leading_zeros(std::span<const uint8_t> number);
@@ -82,13 +93,13 @@ std::span<const uint8_t> without_leading_zeros(std::span<const uint8_t> number);
 // zeros or without. TEE_ERROR_BAD_PARAMETERS when the values are wrong or do not fit each other, or
 // when the key is larger than `max_bits`; *result is untouched then.
 [[nodiscard]] TEE_Result load_key(uint32_t type, uint32_t max_bits,
-                                  std::vector<attribute> attributes, key_ptr* result);
+                                  std::span<const attribute_view> attributes, key_ptr* result);
 
 // generate_key: makes a new key of exactly `bits`, a size that the type's table allows.
 // `parameters`: RSA takes an optional public exponent (default 65537), EC needs the curve,
 // symmetric types take none. TEE_ERROR_BAD_PARAMETERS for others, for an exponent that is even,
 // below 3 or above 64 bits, and for a curve of another size.
 [[nodiscard]] TEE_Result generate_key(uint32_t type, uint32_t bits,
-                                      std::span<const attribute> parameters, key_ptr* result);
+                                      std::span<const attribute_view> parameters, key_ptr* result);
 
 }  // namespace tee::crypto

@@ -150,11 +150,11 @@ TEE_Result load_rsa_key(uint32_t type, uint32_t max_bits, std::vector<attribute>
   return TEE_SUCCESS;
 }
 
-TEE_Result generate_rsa_key(uint32_t bits, std::span<const attribute> parameters, key_ptr* result) {
-  const attribute* given = find_attribute(parameters, TEE_ATTR_RSA_PUBLIC_EXPONENT);
+TEE_Result generate_rsa_key(uint32_t bits, std::span<const attribute_view> parameters,
+                            key_ptr* result) {
+  const attribute_view* given = find_attribute(parameters, TEE_ATTR_RSA_PUBLIC_EXPONENT);
   if (parameters.size() != (given ? 1 : 0)) return TEE_ERROR_BAD_PARAMETERS;
-  auto exponent = without_leading_zeros(given ? std::span<const uint8_t>(given->bytes)
-                                              : std::span<const uint8_t>(DEFAULT_EXPONENT));
+  auto exponent = without_leading_zeros(given ? given->bytes : DEFAULT_EXPONENT);
   bool usable = !exponent.empty() && exponent.size() <= 8 && (exponent.back() & 1) != 0 &&
                 (exponent.size() > 1 || exponent.back() != 1);
   if (!usable) return TEE_ERROR_BAD_PARAMETERS;

@@ -14,7 +14,7 @@ namespace tee::crypto {
                                       std::vector<attribute> attributes, key_ptr* result);
 
 // generate_rsa_key: a new key pair with its CRT numbers. See generate_key for the parameters.
-[[nodiscard]] TEE_Result generate_rsa_key(uint32_t bits, std::span<const attribute> parameters,
+[[nodiscard]] TEE_Result generate_rsa_key(uint32_t bits, std::span<const attribute_view> parameters,
                                           key_ptr* result);
 
 }  // namespace tee::crypto

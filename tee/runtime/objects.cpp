@@ -16,6 +16,7 @@ using tee::guarded;
 using tee::object;
 using tee::panic;
 using tee::crypto::attribute;
+using tee::crypto::attribute_view;
 using tee::crypto::find_key_type;
 using tee::crypto::key_type;
 
@@ -25,25 +26,23 @@ bool is_value(uint32_t attribute_id) {
   return (attribute_id & TEE_ATTR_FLAG_VALUE) != 0;
 }
 
-// Copies a list of attributes out of the trusted application's memory.
-std::vector<attribute> copy_attributes(const char* call, const TEE_Attribute* attributes,
-                                       uint32_t count) {
+// A list of attributes in the trusted application's memory.
+std::vector<attribute_view> view_attributes(const char* call, const TEE_Attribute* attributes,
+                                            uint32_t count) {
   if (!attributes && count > 0) panic(call, "attributes are null with count %u", count);
-  std::vector<attribute> copies;
-  copies.reserve(count);
+  std::vector<attribute_view> views(count);
   for (uint32_t i = 0; i < count; ++i) {
     const TEE_Attribute& given = attributes[i];
-    attribute& copy = copies.emplace_back(attribute{given.attributeID, {}});
+    views[i].id = given.attributeID;
     if (is_value(given.attributeID)) {
-      copy.a = given.content.value.a;
-      copy.b = given.content.value.b;
+      views[i].a = given.content.value.a;
+      views[i].b = given.content.value.b;
     } else {
-      auto bytes = tee::input_bytes(call, "an attribute's buffer", given.content.ref.buffer,
-                                    given.content.ref.length);
-      copy.bytes.assign(bytes.begin(), bytes.end());
+      views[i].bytes = tee::input_bytes(call, "an attribute's buffer", given.content.ref.buffer,
+                                        given.content.ref.length);
     }
   }
-  return copies;
+  return views;
 }
 
 // The object behind a handle that is to receive a key.
@@ -57,7 +56,7 @@ object& empty_object(const char* call, TEE_ObjectHandle handle) {
 // Which size the trusted application may not go beyond is its own business only where it hands over
 // one secret; the numbers of a key pair often come from a client.
 void check_secret_size(const char* call, const object& target,
-                       const std::vector<attribute>& attributes) {
+                       const std::vector<attribute_view>& attributes) {
   if (!find_key_type(target.type)->symmetric()) return;
   size_t length = attributes.front().bytes.size();
   if (length > target.max_bits / 8) {
@@ -135,13 +134,13 @@ TEE_Result TEE_PopulateTransientObject(TEE_ObjectHandle object, const TEE_Attrib
   constexpr const char* CALL = "TEE_PopulateTransientObject";
   return guarded(CALL, [&]() -> TEE_Result {
     tee::object& target = empty_object(CALL, object);
-    auto attributes = copy_attributes(CALL, attrs, attrCount);
+    auto attributes = view_attributes(CALL, attrs, attrCount);
     if (const char* rule = tee::crypto::broken_rule(target.type, attributes)) {
       panic(CALL, "%s (type 0x%08x)", rule, target.type);
     }
     check_secret_size(CALL, target, attributes);
     if (TEE_Result fault = fault_point()) return fault;
-    return current_instance(CALL).keys().load(target.type, target.max_bits, std::move(attributes),
+    return current_instance(CALL).keys().load(target.type, target.max_bits, attributes,
                                               &target.key);
   });
 }
@@ -156,7 +155,7 @@ TEE_Result TEE_GenerateKey(TEE_ObjectHandle object, uint32_t keySize, const TEE_
       panic(CALL, "key size %u does not fit type 0x%08x with at most %u bits", keySize, target.type,
             target.max_bits);
     }
-    auto parameters = copy_attributes(CALL, params, paramCount);
+    auto parameters = view_attributes(CALL, params, paramCount);
     if (TEE_Result fault = fault_point()) return fault;
     if (TEE_Result res = tee::crypto::generate_key(target.type, keySize, parameters, &target.key)) {
       return res;

@@ -49,8 +49,8 @@ TEE_Result take_attributes(const char* call, const stored_object& stored, object
   target->max_bits = stored.max_bits;
   target->usage = stored.usage;
   if (stored.attributes.empty()) return TEE_SUCCESS;
-  TEE_Result res = tee::current_instance(call).keys().load(stored.type, stored.max_bits,
-                                                           stored.attributes, &target->key);
+  TEE_Result res = tee::current_instance(call).keys().load(
+      stored.type, stored.max_bits, tee::crypto::views_of(stored.attributes), &target->key);
   return res == TEE_ERROR_BAD_PARAMETERS ? TEE_ERROR_CORRUPT_OBJECT : res;
 }
 
