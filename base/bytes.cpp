@@ -6,7 +6,7 @@
 namespace keymaster {
 
 void copy_bytes(byte_span to, byte_view from) {
-  if (!from.empty()) memcpy(to.data(), from.data(), from.size());
+  if (!from.empty()) memmove(to.data(), from.data(), from.size());
 }
 
 void wipe(byte_span bytes) {

@@ -18,8 +18,8 @@ using byte_span = std::span<uint8_t>;
 using tee_size = decltype(TEE_Param{}.memref.size);
 static_assert(sizeof(tee_size) == sizeof(TEE_Attribute{}.content.ref.length));
 
-// copy_bytes: copies `from` to the start of `to`; `to` holds at least from.size() bytes. Legal for
-// empty ranges with null pointers, which memcpy is not.
+// copy_bytes: copies `from`, which may overlap, to the start of `to`, which holds at least
+// from.size() bytes. Legal for empty ranges with null pointers, which memmove is not.
 void copy_bytes(byte_span to, byte_view from);
 
 // wipe: overwrites the bytes with zeros in a way that the compiler keeps.

@@ -41,6 +41,11 @@ void heap_buffer::reset() {
   size_ = capacity_ = 0;
 }
 
+void heap_buffer::keep(byte_view part) {
+  copy_bytes(span(), part);
+  size_ = part.size();
+}
+
 uint8_t* heap_buffer::release() {
   size_ = capacity_ = 0;
   return std::exchange(data_, nullptr);

@@ -45,6 +45,8 @@ class heap_buffer {
   // Keeps the first `size` bytes (at most size()) as the contents; the rest stays owned and is
   // wiped with it.
   void truncate(size_t size) { size_ = size < size_ ? size : size_; }
+  // Keeps only `part`, which is of this buffer, as the contents, moved to the front; likewise.
+  void keep(byte_view part);
   // Hands the block to the caller, who frees it with heap_give_back.
   [[nodiscard]] uint8_t* release();
 

@@ -13,13 +13,10 @@ namespace {
 
 // The user authentication that a key demands, and what the request brings for it.
 struct user_auth_t {
-  const keymaster_key_param_t* timeout;    // KM_TAG_AUTH_TIMEOUT, or null
-  const keymaster_key_param_t* auth_type;  // KM_TAG_USER_AUTH_TYPE, or null
-  bool none_required;                      // KM_TAG_NO_AUTH_REQUIRED
-  uint64_t challenge;                      // that the token must carry; 0: any
-  byte_view token;                         // the request's, valid; empty when it has none
-  bool is_demanded;                        // a KM_TAG_USER_SECURE_ID was met
-  bool is_given;                           // one of them matched
+  uint64_t challenge;  // that the token must carry; 0: any
+  byte_view token;     // the request's, valid; empty when it has none
+  bool is_demanded;    // a KM_TAG_USER_SECURE_ID was met
+  bool is_given;       // one of them matched
 
   bool is_due() const { return is_demanded && !is_given; }
 };
@@ -45,12 +42,8 @@ struct begin_check_t {
   requested_value_t digest{};
 };
 
-keymaster_error_t read_user_auth(const keymaster_key_param_set_t& request,
-                                 const keymaster_key_param_set_t& key_params, uint64_t challenge,
+keymaster_error_t read_user_auth(const keymaster_key_param_set_t& request, uint64_t challenge,
                                  user_auth_t* user) {
-  user->timeout = get_unique(key_params, KM_TAG_AUTH_TIMEOUT);
-  user->auth_type = get_unique(key_params, KM_TAG_USER_AUTH_TYPE);
-  user->none_required = get_unique(key_params, KM_TAG_NO_AUTH_REQUIRED) != nullptr;
   user->challenge = challenge;
   const keymaster_key_param_t* token = get_unique(request, KM_TAG_AUTH_TOKEN);
   if (token == nullptr) return KM_ERROR_OK;
@@ -60,18 +53,21 @@ keymaster_error_t read_user_auth(const keymaster_key_param_set_t& request,
 }
 
 // One KM_TAG_USER_SECURE_ID of the key. No match is no refusal: another identifier may match.
-keymaster_error_t check_secure_id(uint64_t secure_id, user_auth_t* user, trace_site at) {
-  if (user->none_required) {
+keymaster_error_t check_secure_id(uint64_t secure_id, const keymaster_key_param_set_t& key_params,
+                                  user_auth_t* user, trace_site at) {
+  if (get_unique(key_params, KM_TAG_NO_AUTH_REQUIRED) != nullptr) {
     return KM_REFUSE_AT(at, KM_ERROR_INVALID_ARGUMENT,
                         "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED");
   }
-  if (user->auth_type == nullptr) {
+  const keymaster_key_param_t* auth_type = get_unique(key_params, KM_TAG_USER_AUTH_TYPE);
+  if (auth_type == nullptr) {
     return KM_REFUSE_AT(at, KM_ERROR_INVALID_ARGUMENT,
                         "Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE");
   }
   user->is_demanded = true;
-  user->is_given = user->is_given || check_auth(secure_id, user->challenge, user->token,
-                                                user->timeout, user->auth_type->enumerated);
+  user->is_given = user->is_given ||
+                   check_auth(secure_id, user->challenge, user->token,
+                              get_unique(key_params, KM_TAG_AUTH_TIMEOUT), auth_type->enumerated);
   return KM_ERROR_OK;
 }
 
@@ -166,7 +162,7 @@ keymaster_error_t check_param(const keymaster_key_param_t& param, begin_check_t*
       // can be used to try a key for free.
       return check_use_count_and_add(check->identity, param.integer);
     case KM_TAG_USER_SECURE_ID:
-      return check_secure_id(param.long_integer, &check->user, at);
+      return check_secure_id(param.long_integer, check->key_params, &check->user, at);
     case KM_TAG_BOOTLOADER_ONLY:
       return KM_REFUSE_AT(at, KM_ERROR_INVALID_KEY_BLOB, "Bootloader only key");
     default:
@@ -194,9 +190,9 @@ keymaster_error_t check_allowed(const begin_check_t& check, trace_site at) {
 
 // Without a timeout the key is authenticated for each operation, whose handle a token can carry
 // only after this begin.
-keymaster_error_t check_begin_auth(const user_auth_t& user, trace_site at) {
-  if (!user.is_due()) return KM_ERROR_OK;
-  if (user.timeout != nullptr) {
+keymaster_error_t check_begin_auth(const begin_check_t& check, trace_site at) {
+  if (!check.user.is_due()) return KM_ERROR_OK;
+  if (get_unique(check.key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) {
     return KM_REFUSE_AT(at, KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
   }
   trace(TEE_TRACE_INFO, at, "OP AUTH NEEDED");
@@ -213,15 +209,13 @@ keymaster_error_t check_caller_nonce(const begin_check_t& check, trace_site at) 
 
 keymaster_error_t check_begin(begin_check_t* check, trace_site begin, trace_site at) {
   constexpr uint64_t ANY_CHALLENGE = 0;
-  if (auto error = read_user_auth(check->request, check->key_params, ANY_CHALLENGE, &check->user)) {
-    return error;
-  }
+  if (auto error = read_user_auth(check->request, ANY_CHALLENGE, &check->user)) return error;
   if (auto error = ask_operation(check, begin)) return error;
   for (const keymaster_key_param_t& param : check->key_params) {
     if (auto error = check_param(param, check, at)) return error;
   }
   if (auto error = check_allowed(*check, at)) return error;
-  const keymaster_error_t outcome = check_begin_auth(check->user, at);
+  const keymaster_error_t outcome = check_begin_auth(*check, at);
   if (outcome != KM_ERROR_OK && outcome != KM_AUTHENTICATION_DUE) return outcome;
   if (auto error = check_caller_nonce(*check, at)) return error;
   // A full log does not refuse: the limit then goes unenforced until a record is free.
@@ -235,10 +229,10 @@ keymaster_error_t check_operation_auth(const keymaster_key_param_set_t& request,
                                        uint64_t challenge, trace_site at) {
   if (get_unique(key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) return KM_ERROR_OK;
   user_auth_t user{};
-  if (auto error = read_user_auth(request, key_params, challenge, &user)) return error;
+  if (auto error = read_user_auth(request, challenge, &user)) return error;
   for (const keymaster_key_param_t& param : key_params) {
     if (param.tag != KM_TAG_USER_SECURE_ID) continue;
-    if (auto error = check_secure_id(param.long_integer, &user, at)) return error;
+    if (auto error = check_secure_id(param.long_integer, key_params, &user, at)) return error;
   }
   if (!user.is_due()) return KM_ERROR_OK;
   return KM_REFUSE_AT(at, KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");

@@ -8,11 +8,10 @@
 
 namespace keymaster {
 
-// parse_plaintext: takes a plaintext apart; what follows the characteristics is ignored. On failure
-// *key may be filled. Keymaster errors: `unreadable_set` for characteristics that do not unmarshal;
-// -41 out of memory. TEE_ERROR_GENERIC: a length passes the end.
-[[nodiscard]] TEE_Result parse_plaintext(byte_view plaintext, keymaster_error_t unreadable_set,
-                                         heap_buffer* key,
+// parse_plaintext: takes a plaintext apart: *plaintext is cut to the key material, what follows the
+// characteristics is ignored. Keymaster errors: `unreadable_set` for characteristics that do not
+// unmarshal. TEE_ERROR_GENERIC: a length passes the end. On failure *plaintext is as it was.
+[[nodiscard]] TEE_Result parse_plaintext(heap_buffer* plaintext, keymaster_error_t unreadable_set,
                                          keymaster_key_param_set_t* characteristics,
                                          keymaster_error_t* km_error, trace_site at);
 

@@ -165,29 +165,22 @@ TEE_Result unseal(byte_view blob, heap_buffer* plaintext, keymaster_error_t* km_
 
 }  // namespace
 
-TEE_Result parse_plaintext(byte_view plaintext, keymaster_error_t unreadable_set, heap_buffer* key,
+TEE_Result parse_plaintext(heap_buffer* plaintext, keymaster_error_t unreadable_set,
                            keymaster_key_param_set_t* characteristics, keymaster_error_t* km_error,
                            trace_site at) {
-  input_cursor in(plaintext);
-  byte_view key_bytes;
+  input_cursor in(plaintext->view());
+  byte_view key;
   byte_view marshalled;
-  if (!in.read_field(&key_bytes)) {
-    trace(TEE_TRACE_ERROR, at, "Too short input");
-    return TEE_ERROR_GENERIC;
-  }
-  if (!key->copy_of(key_bytes)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
-    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
-    return TEE_SUCCESS;
-  }
-  if (!in.read_field(&marshalled)) {
+  if (!in.read_field(&key) || !in.read_field(&marshalled)) {
     trace(TEE_TRACE_ERROR, at, "Too short input");
     return TEE_ERROR_GENERIC;
   }
   if (unmarshal(marshalled, characteristics) != TEE_SUCCESS) {
     trace(TEE_TRACE_ERROR, at, "Unmarshal failed");
     *km_error = unreadable_set;
+    return TEE_SUCCESS;
   }
+  plaintext->keep(key);
   return TEE_SUCCESS;
 }
 
@@ -223,9 +216,9 @@ TEE_Result open_key(byte_view blob, heap_buffer* key, keymaster_key_param_set_t*
   heap_buffer plaintext;
   TEE_Result res = unseal(blob, &plaintext, km_error, trace_site::here());
   if (failed(res, *km_error)) return res;
-  res = parse_plaintext(plaintext.view(), KM_ERROR_INVALID_ARGUMENT, key, characteristics, km_error,
+  res = parse_plaintext(&plaintext, KM_ERROR_INVALID_ARGUMENT, characteristics, km_error,
                         trace_site::here());
-  if (failed(res, *km_error)) key->reset();
+  if (!failed(res, *km_error)) *key = std::move(plaintext);
   return res;
 }
 

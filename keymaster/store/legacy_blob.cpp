@@ -50,9 +50,9 @@ TEE_Result open_v1_key(byte_view blob, heap_buffer* key, keymaster_key_param_set
     return KM_FAIL(km_error, KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
   if (TEE_Result res = ask_earlier_keymaster(&plaintext, trace_site::here())) return res;
-  const TEE_Result res = parse_plaintext(plaintext.view(), KM_ERROR_INVALID_KEY_BLOB, key,
-                                         characteristics, km_error, trace_site::here());
-  if (failed(res, *km_error)) key->reset();
+  const TEE_Result res = parse_plaintext(&plaintext, KM_ERROR_INVALID_KEY_BLOB, characteristics,
+                                         km_error, trace_site::here());
+  if (!failed(res, *km_error)) *key = std::move(plaintext);
   return res;
 }
 

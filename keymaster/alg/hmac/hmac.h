@@ -39,7 +39,7 @@ struct hmac_key_t {
 };
 
 // hmac_resolve_key_data: loads key material. TEE_ERROR_GENERIC: the record is too short. -41:
-// unknown object type, or out of memory.
+// unknown object type.
 [[nodiscard]] TEE_Result hmac_resolve_key_data(byte_view key_material, hmac_key_t* key,
                                                keymaster_error_t* km_error);
 

@@ -2,6 +2,7 @@
 #include "tee_internal_api.h"
 
 #include "keymaster/alg/hmac/hmac.h"
+#include "keymaster/alg/key_record.h"
 #include "keymaster/alg/key_size.h"
 #include "keymaster/alg/mac_length.h"
 #include "keymaster/alg/message.h"
@@ -13,6 +14,7 @@ namespace {
 constexpr uint32_t MAX_KEY_BITS = 1024;
 constexpr uint32_t MIN_MIN_MAC_BITS = 64;
 constexpr size_t HEADER_SIZE = 2 * sizeof(uint32_t);
+constexpr size_t MAX_BLOCK_SIZE = 128;
 
 constexpr hmac_hash_t HASHES[] = {
     {KM_DIGEST_SHA1, TEE_TYPE_HMAC_SHA1, TEE_ALG_HMAC_SHA1, 160, 512},
@@ -93,6 +95,20 @@ TEE_Result normalise(byte_view key, const hmac_hash_t& hash, byte_span block) {
   return digest.digest_final(key, block, &length, at);
 }
 
+// Loads the key of one block that `bytes` stand for.
+TEE_Result load_normalised(byte_view bytes, const hmac_hash_t& hash, tee_object* object,
+                           trace_site at) {
+  uint8_t room[MAX_BLOCK_SIZE] = {};
+  const byte_span block = byte_span(room).first(hash.block_bits / 8);
+  TEE_Result res = normalise(bytes, hash, block);
+  if (res == TEE_SUCCESS) {
+    const TEE_Attribute secret = ref_attribute(TEE_ATTR_SECRET_VALUE, block);
+    res = load_key(hash.object_type, hash.block_bits, {&secret, 1}, object, at);
+  }
+  wipe(room);
+  return res;
+}
+
 // Reads a record into *key_bits, *object_type and a view of the key's bytes.
 bool read_record(byte_view key_material, uint32_t* key_bits, uint32_t* object_type,
                  byte_view* key) {
@@ -156,17 +172,12 @@ TEE_Result hmac_resolve_key_data(byte_view key_material, hmac_key_t* key,
     return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
   }
   const hmac_hash_t* hash = hmac_hash_of_type(object_type);
-  heap_buffer block;
-  if (hash == nullptr || !block.allocate(hash->block_bits / 8)) {
+  if (hash == nullptr) {
+    // Intended: no key of another type is ever made.
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
-  if (TEE_Result res = normalise(bytes, *hash, block.span())) return res;
-  const TEE_Attribute secret = ref_attribute(TEE_ATTR_SECRET_VALUE, block.view());
-  tee_object object;
-  if (TEE_Result res = object.allocate(object_type, hash->block_bits)) return res;
-  if (TEE_Result res = object.populate({&secret, 1})) return res;
-  key->object = std::move(object);
+  if (TEE_Result res = load_normalised(bytes, *hash, &key->object, trace_site::here())) return res;
   key->key_bits = hash->block_bits;
   key->object_type = object_type;
   return TEE_SUCCESS;
