@@ -80,11 +80,6 @@ TEST_F(objects_death, programming_errors_panic) {
   TEE_Attribute null_buffer = good;
   null_buffer.content.ref.buffer = nullptr;
   TEE_ObjectInfo info;
-  size_t length = 0;
-  TEE_Attribute out;
-  auto read = [&](TEE_ObjectHandle object, uint32_t id) {
-    (void)TEE_GetObjectBufferAttribute(object, id, nullptr, &length);
-  };
   auto populate_empty = [&](const TEE_Attribute* attributes, uint32_t count) {
     (void)TEE_PopulateTransientObject(empty, attributes, count);
   };
@@ -109,20 +104,11 @@ TEST_F(objects_death, programming_errors_panic) {
       {"Populate.*: an attribute's buffer is null", [&] { populate_empty(&null_buffer, 1); }},
       {"GenerateKey: key size 256 does not fit",
        [&] { (void)TEE_GenerateKey(empty, 256, nullptr, 0); }},
-      {"BufferAttribute: object is not initialised", [&] { read(empty, TEE_ATTR_SECRET_VALUE); }},
-      {"InitRefAttribute: attribute .* is a value",
-       [&] { TEE_InitRefAttribute(&out, TEE_ATTR_ECC_CURVE, nullptr, 0); }},
   };
   for (const auto& row : rows) {
     EXPECT_DEATH(row.call(), std::string("panic: TEE_.*") + row.message) << row.message;
   }
   EXPECT_NE(recycled, stale);
-}
-
-TEST(objects_outside, calls_need_a_running_trusted_application) {
-  TEE_ObjectHandle object = nullptr;
-  EXPECT_DEATH((void)TEE_AllocateTransientObject(TEE_TYPE_AES, 128, &object),
-               "panic: TEE_AllocateTransientObject: called outside of a trusted application");
 }
 
 }  // namespace

@@ -1,14 +1,12 @@
-// Properties and trace.
+// Properties.
 #include <string>
 
 #include "support.h"
-#include "tee/runtime/host_control.h"
 
 namespace tee::test {
 namespace {
 
 using platform = in_instance;
-using platform_death = in_instance;
 
 TEST_F(platform, properties_as_text) {
   const TEE_Identity client{TEE_LOGIN_TRUSTED_APP, UUID};
@@ -45,16 +43,6 @@ TEST_F(platform, properties_as_text) {
     EXPECT_EQ(TEE_GetPropertyAsString(row.set, other.c_str(), nullptr, &length),
               TEE_ERROR_ITEM_NOT_FOUND);
   }
-}
-
-TEST_F(platform_death, programming_errors_panic) {
-  size_t length = 0;
-  auto no_set = reinterpret_cast<TEE_PropSetHandle>(uintptr_t{5});
-  EXPECT_DEATH((void)TEE_GetPropertyAsString(no_set, "gpd.ta.appID", nullptr, &length),
-               "panic: TEE_GetPropertyAsString: .* is not a property set");
-  EXPECT_DEATH((void)TEE_GetPropertyAsString(TEE_PROPSET_CURRENT_TA, nullptr, nullptr, &length),
-               "panic: TEE_GetPropertyAsString: name is null");
-  EXPECT_DEATH(TEE_GenerateRandom(nullptr, 1), "panic: TEE_GenerateRandom: .* is null");
 }
 
 }  // namespace
