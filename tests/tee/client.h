@@ -23,9 +23,9 @@ inline TEEC_UUID to_client(const TEE_UUID& uuid) {
 
 class client {
  public:
-  client(const std::string& device_path, const TEE_UUID& ta) : path_(device_path) {
+  client(const std::string& device_path, const TEE_UUID& ta) {
     setenv("TEE_TA_PATH", TEST_TA_PATH, 1);
-    restart();
+    EXPECT_EQ(TEEC_InitializeContext(device_path.c_str(), &context), TEEC_SUCCESS);
     EXPECT_EQ(open_session(ta), TEEC_SUCCESS);
   }
   client(const client&) = delete;
@@ -47,18 +47,10 @@ class client {
     close_session();
     TEEC_FinalizeContext(&context);
   }
-  // restart: a new context, and so, if no one else has one on the device, new instances.
-  void restart() {
-    close_context();
-    EXPECT_EQ(TEEC_InitializeContext(path_.c_str(), &context), TEEC_SUCCESS);
-  }
 
   TEEC_Context context{};
   TEEC_Session session{};
   uint32_t origin = 0;  // of the last result
-
- private:
-  std::string path_;
 };
 
 }  // namespace tee::test

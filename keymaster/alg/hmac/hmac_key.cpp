@@ -14,7 +14,7 @@ namespace {
 constexpr uint32_t MAX_KEY_BITS = 1024;
 constexpr uint32_t MIN_MIN_MAC_BITS = 64;
 constexpr size_t HEADER_SIZE = 2 * sizeof(uint32_t);
-constexpr size_t MAX_BLOCK_SIZE = 128;
+constexpr size_t MAX_BLOCK_SIZE = 128;  // of the hashes below
 
 constexpr hmac_hash_t HASHES[] = {
     {KM_DIGEST_SHA1, TEE_TYPE_HMAC_SHA1, TEE_ALG_HMAC_SHA1, 160, 512},
