@@ -1,7 +1,7 @@
 // ECDSA.
 #include "tee/crypto/ecdsa.h"
 
-#include <cstring>
+#include <algorithm>
 #include <openssl/asn1.h>
 
 #include "tee/crypto/pkey.h"
@@ -39,27 +39,32 @@ class representative {
   std::span<const uint8_t> bytes_;
 };
 
-// enter: moves behind the header of an element of libcrypto's own DER, which must have `tag`; gives
-// the length of its content.
-size_t enter(const uint8_t** cursor, long room, int tag) {
+// enter: moves `rest` of libcrypto's own DER behind the header of an element that must have `tag`;
+// gives the length of its content, which lies within `rest`.
+size_t enter(std::span<const uint8_t>* rest, int tag) {
+  const uint8_t* content = rest->data();
   long length = 0;
   int found = 0;
   int tag_class = 0;
-  int flags = ASN1_get_object(cursor, &length, &found, &tag_class, room);
-  must((flags & 0x80) == 0 && found == tag && length >= 0, "DER of a signature");
+  int flags =
+      ASN1_get_object(&content, &length, &found, &tag_class, static_cast<long>(rest->size()));
+  constexpr int BAD_OR_INDEFINITE = 0x81;
+  must((flags & BAD_OR_INDEFINITE) == 0 && found == tag, "DER of a signature");
+  *rest = rest->subspan(static_cast<size_t>(content - rest->data()));
   return static_cast<size_t>(length);
 }
 
-// take_number: the INTEGER at the cursor, as `length` bytes with leading zeros. Decoding it into a
-// number of libcrypto's and writing that out costs 4,000 instructions more per signature.
-void take_number(const uint8_t** cursor, long room, uint8_t* bytes, size_t length) {
-  const size_t size = enter(cursor, room, V_ASN1_INTEGER);
-  const size_t sign = size > length ? 1 : 0;  // a zero byte in front of a set highest bit
-  must(size - sign <= length, "DER of a signature");
-  const size_t padding = length - (size - sign);
-  memset(bytes, 0, padding);
-  memcpy(bytes + padding, *cursor + sign, size - sign);
-  *cursor += size;
+// take_number: the INTEGER at the head of `rest`, with leading zeros. Decoding it into a number of
+// libcrypto's and writing that out costs 4,000 instructions more per signature.
+void take_number(std::span<const uint8_t>* rest, std::span<uint8_t> padded) {
+  const size_t length = enter(rest, V_ASN1_INTEGER);
+  std::span<const uint8_t> number = rest->first(length);
+  *rest = rest->subspan(length);
+  if (number.size() > padded.size() && number[0] == 0) number = number.subspan(1);
+  must(number.size() <= padded.size(), "DER of a signature");
+  const size_t zeros = padded.size() - number.size();
+  std::fill_n(padded.begin(), zeros, uint8_t{0});
+  std::copy(number.begin(), number.end(), padded.subspan(zeros).begin());
 }
 
 }  // namespace
@@ -78,14 +83,12 @@ TEE_Result ecdsa_sign(key& ec_key, std::span<const uint8_t> digest, uint8_t* sig
     forget_errors();
     return TEE_ERROR_BAD_PARAMETERS;
   }
-  const uint8_t* cursor = der;
-  long room = static_cast<long>(length);
-  enter(&cursor, room, V_ASN1_SEQUENCE);
+  std::span<const uint8_t> rest(der, length);
+  enter(&rest, V_ASN1_SEQUENCE);
   size_t half = curve_of(ec_key).length();
-  for (uint8_t* number : {signature, signature + half}) {
-    room = static_cast<long>(length) - (cursor - der);
-    take_number(&cursor, room, number, half);
-  }
+  take_number(&rest, {signature, half});
+  take_number(&rest, {signature + half, half});
+  must(rest.empty(), "DER of a signature");
   return TEE_SUCCESS;
 }
 
