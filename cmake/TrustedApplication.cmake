@@ -10,7 +10,7 @@ set(TA_COMPILE_OPTIONS
     $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions> $<$<COMPILE_LANGUAGE:CXX>:-fno-rtti>
     $<$<COMPILE_LANGUAGE:CXX>:-fno-threadsafe-statics> -fvisibility=hidden
     -fno-asynchronous-unwind-tables -fno-math-errno -fno-stack-protector
-    -ffunction-sections -fdata-sections)
+    -ffunction-sections -fdata-sections ${KEYMASTER_LTO_COMPILE})
 
 # A TA links the platform, the C library's few memory and text functions, and nothing else: no C++
 # runtime and no start files, so what it imports is what a device's TEE must offer. Sanitizers bring
@@ -19,6 +19,7 @@ if(NOT KEYMASTER_SANITIZE)
   set(TA_LINK_OPTIONS -nostdlib -Wl,--no-as-needed)  # the TA's own libraries come behind them
   set(TA_LINK_LIBRARIES c gcc)
 endif()
+list(APPEND TA_LINK_OPTIONS ${KEYMASTER_LTO_LINK})
 
 # Hidden visibility alone lets the standard library's templates through.
 set(TA_EXPORTS ${CMAKE_CURRENT_LIST_DIR}/trusted_application.map)
