@@ -22,7 +22,7 @@ namespace keymaster {
 
 // KM_REFUSE_AT(at, code, format, ...): the same under the caller's function and line.
 #define KM_REFUSE_AT(at, code, ...) \
-  (::keymaster::trace(TEE_TRACE_ERROR, at, __VA_ARGS__), static_cast<int32_t>(code))
+  (::keymaster::trace_error(at, __VA_ARGS__), static_cast<int32_t>(code))
 
 // failed: whether a call with both results failed. 0 is success in both.
 [[nodiscard]] constexpr bool failed(TEE_Result res, int32_t km_error) {

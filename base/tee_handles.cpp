@@ -8,7 +8,7 @@ namespace {
 
 // The common end of every call below: `name` is the platform call's, as it stands in the message.
 TEE_Result checked(TEE_Result res, const char* name, trace_site at) {
-  if (res != TEE_SUCCESS) trace(TEE_TRACE_ERROR, at, "%s failed with 0x%08x\n", name, res);
+  if (res != TEE_SUCCESS) trace_error(at, "%s failed with 0x%08x\n", name, res);
   return res;
 }
 

@@ -45,21 +45,31 @@ size_t write_prefix(char* line, size_t room, uint32_t level, trace_site at) {
                  room);
 }
 
+// The last byte is kept for the newline; the terminating zero that snprintf puts there is dropped.
+void write_line(uint32_t level, trace_site at, const char* format, va_list arguments) {
+  if (level > TEE_TraceThreshold()) return;
+  char line[MAX_LINE_SIZE];
+  size_t length = write_prefix(line, sizeof(line), level, at);
+  const size_t room = sizeof(line) - length;
+  length += written(vsnprintf(line + length, room, format, arguments), room);
+  if (length == 0 || line[length - 1] != '\n') line[length++] = '\n';
+  TEE_TraceWrite(level, line, length);
+}
+
 }  // namespace
 
 void trace(uint32_t level, trace_site at, const char* format, ...) {
-  if (level > TEE_TraceThreshold()) return;
-  // The last byte is kept for the newline; the terminating zero that snprintf puts there is
-  // dropped.
-  char line[MAX_LINE_SIZE];
-  size_t length = write_prefix(line, sizeof(line), level, at);
   va_list arguments;
   va_start(arguments, format);
-  const size_t room = sizeof(line) - length;
-  length += written(vsnprintf(line + length, room, format, arguments), room);
+  write_line(level, at, format, arguments);
   va_end(arguments);
-  if (length == 0 || line[length - 1] != '\n') line[length++] = '\n';
-  TEE_TraceWrite(level, line, length);
+}
+
+void trace_error(trace_site at, const char* format, ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  write_line(TEE_TRACE_ERROR, at, format, arguments);
+  va_end(arguments);
 }
 
 }  // namespace keymaster

@@ -25,8 +25,12 @@ struct trace_site {
 void trace(uint32_t level, trace_site at, const char* format, ...)
     __attribute__((format(printf, 3, 4)));
 
-#define TRACE_ERROR(...) \
-  ::keymaster::trace(TEE_TRACE_ERROR, ::keymaster::trace_site::here(), __VA_ARGS__)
+// trace_error: the same at error level. Cold: the compiler keeps what leads to it away from the
+// path that succeeds.
+void trace_error(trace_site at, const char* format, ...)
+    __attribute__((format(printf, 2, 3), cold));
+
+#define TRACE_ERROR(...) ::keymaster::trace_error(::keymaster::trace_site::here(), __VA_ARGS__)
 #define TRACE_INFO(...) \
   ::keymaster::trace(TEE_TRACE_INFO, ::keymaster::trace_site::here(), __VA_ARGS__)
 #define TRACE_DEBUG(...) \

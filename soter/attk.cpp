@@ -32,22 +32,22 @@ TEE_Result export_der(TEE_ObjectHandle key, uint32_t key_bits, size_t capacity, 
   TEE_OperationHandle handle{};
   if (TEE_Result res =
           TEE_AllocateOperation(&handle, TEE_ALG_RSA_NOPAD, TEE_MODE_EXPORT, key_bits)) {
-    trace(TEE_TRACE_ERROR, at, "TEE_AllocateOperation failed: %08x\n", res);
+    trace_error(at, "TEE_AllocateOperation failed: %08x\n", res);
     return res;
   }
   operation.reset(handle);
   if (TEE_Result res = TEE_SetOperationKey(operation.get(), key)) {
-    trace(TEE_TRACE_ERROR, at, "TEE_SetOperationKey failed: %08x\n", res);
+    trace_error(at, "TEE_SetOperationKey failed: %08x\n", res);
     return res;
   }
   if (!der->allocate(capacity)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   size_t length = capacity;
   if (TEE_Result res =
           TEE_AsymmetricExport(operation.get(), TEE_EXPORT_FORMAT_SPKI, der->data(), &length)) {
-    trace(TEE_TRACE_ERROR, at, "TEE_AsymmetricExport failed: %08x\n", res);
+    trace_error(at, "TEE_AsymmetricExport failed: %08x\n", res);
     return res;
   }
   der->truncate(length);

@@ -43,8 +43,8 @@ TEE_Result read_counter(const tee_object& object, uint64_t* counter, trace_site 
   tee_size count = 0;
   if (TEE_Result res = TEE_ReadObjectData(object.get(), data, sizeof(data), &count)) return res;
   if (count != sizeof(*counter)) {
-    trace(TEE_TRACE_ERROR, at, "counter object is not %d bytes, %d bytes\n",
-          static_cast<int>(sizeof(*counter)), static_cast<int>(count));
+    trace_error(at, "counter object is not %d bytes, %d bytes\n",
+                static_cast<int>(sizeof(*counter)), static_cast<int>(count));
     return TEE_ERROR_BAD_STATE;
   }
   copy_bytes(object_bytes(*counter), byte_view(data).first(sizeof(*counter)));
@@ -54,11 +54,11 @@ TEE_Result read_counter(const tee_object& object, uint64_t* counter, trace_site 
 // One write, which the platform does whole or not at all.
 TEE_Result write_counter(const tee_object& object, uint64_t counter, trace_site at) {
   if (TEE_Result res = TEE_SeekObjectData(object.get(), 0, TEE_DATA_SEEK_SET)) {
-    trace(TEE_TRACE_ERROR, at, "seek pos to the beginning error\n");
+    trace_error(at, "seek pos to the beginning error\n");
     return res;
   }
   if (TEE_Result res = TEE_WriteObjectData(object.get(), &counter, sizeof(counter))) {
-    trace(TEE_TRACE_ERROR, at, "write object error\n");
+    trace_error(at, "write object error\n");
     return res;
   }
   return TEE_SUCCESS;

@@ -16,28 +16,28 @@ namespace {
 
 // Whether setting a member went well.
 bool is_set(int error, const char* member, trace_site at) {
-  if (error != 0) trace(TEE_TRACE_ERROR, at, "set %s error %d\n", member, error);
+  if (error != 0) trace_error(at, "set %s error %d\n", member, error);
   return error == 0;
 }
 
 bool make_root(json_value* root, trace_site at) {
   if (root->make_object()) return true;
-  trace(TEE_TRACE_ERROR, at, "json error root_value %p root_object %p\n",
-        static_cast<const void*>(root), static_cast<const void*>(root->object()));
+  trace_error(at, "json error root_value %p root_object %p\n", static_cast<const void*>(root),
+              static_cast<const void*>(root->object()));
   return false;
 }
 
 bool serialize(const json_value& root, heap_buffer* document, trace_site at) {
   if (json_serialize(root, document)) return true;
-  trace(TEE_TRACE_ERROR, at, "json serialization error\n");
+  trace_error(at, "json serialization error\n");
   return false;
 }
 
 bool is_text(byte_view raw, trace_site at) {
   const auto length = static_cast<size_t>(std::ranges::find(raw, 0) - raw.begin());
   if (length == raw.size() && is_valid_utf8(raw)) return true;
-  trace(TEE_TRACE_ERROR, at, "Not a valid utf8 string, strlen(raw) %d length %d",
-        static_cast<int>(length), static_cast<int>(raw.size()));
+  trace_error(at, "Not a valid utf8 string, strlen(raw) %d length %d", static_cast<int>(length),
+              static_cast<int>(raw.size()));
   return false;
 }
 
@@ -45,7 +45,7 @@ bool is_text(byte_view raw, trace_site at) {
 bool set_finger(json_list* members, trace_site at) {
   uint32_t fid = 0;
   if (TEE_Result res = get_fid(&fid)) {
-    trace(TEE_TRACE_ERROR, at, "get finger id error %x, continue without fid\n", res);
+    trace_error(at, "get finger id error %x, continue without fid\n", res);
     return true;
   }
   return is_set(json_set_number(members, "fid", fid), "finger id", at);
@@ -54,7 +54,7 @@ bool set_finger(json_list* members, trace_site at) {
 TEE_Result set_counter(json_list* members, trace_site at) {
   uint64_t counter = 0;
   if (TEE_Result res = increase_and_get_counter(&counter)) {
-    trace(TEE_TRACE_ERROR, at, "increase counter error %x\n", res);
+    trace_error(at, "increase counter error %x\n", res);
     return res;
   }
   const int error = json_set_number(members, "counter", static_cast<double>(counter));
@@ -92,17 +92,17 @@ TEE_Result set_public_key(json_list* members, byte_view key_material, trace_site
   uint32_t key_bits = 0;
   const tee_object key = resolve_key_from_data(key_material, &key_bits);
   if (!key) {
-    trace(TEE_TRACE_ERROR, at, "resolve key from data stream error\n");
+    trace_error(at, "resolve key from data stream error\n");
     return TEE_ERROR_BAD_FORMAT;
   }
   heap_buffer pem;
   if (!pem.allocate(pem_capacity(key_bits))) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   size_t length = 0;
   if (TEE_Result res = export_rsa_public_key(key.get(), key_bits, pem.span(), &length)) {
-    trace(TEE_TRACE_ERROR, at, "export public key error\n");
+    trace_error(at, "export public key error\n");
     return res;
   }
   const int error = json_set_string(members, "pub_key", pem.view().first(length));
@@ -144,7 +144,7 @@ TEE_Result produce_soter_export_json(const keymaster_key_param_set_t& key_params
   if (const auto* uid = get_unique(key_params, KM_TAG_SOTER_UID)) {
     trace(TEE_TRACE_DEBUG, at, "soter key has uid\n");
     if (int error = json_set_number(members, "uid", uid->integer)) {
-      trace(TEE_TRACE_ERROR, at, "set number error %x\n", static_cast<unsigned>(error));
+      trace_error(at, "set number error %x\n", static_cast<unsigned>(error));
       return TEE_ERROR_OUT_OF_MEMORY;
     }
   }

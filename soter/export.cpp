@@ -49,7 +49,7 @@ TEE_Result choose_sign_key(const keymaster_key_param_set_t& key_params, tee_obje
   if (contains_tag(key_params, KM_TAG_SOTER_ATTK_SIGNS)) {
     trace(TEE_TRACE_DEBUG, at, "soter use attkey sign\n");
     if (TEE_Result res = soter_check_init()) {
-      trace(TEE_TRACE_ERROR, at, "soter is not ready\n");
+      trace_error(at, "soter is not ready\n");
       return res;
     }
     *key = convert_key_to_object(soter_key_pair(), key_bits);
@@ -59,7 +59,7 @@ TEE_Result choose_sign_key(const keymaster_key_param_set_t& key_params, tee_obje
   trace(TEE_TRACE_DEBUG, at, "soter use normal key sign\n");
   const byte_view blob = sign_key_blob(key_params, at);
   if (blob.empty()) {
-    trace(TEE_TRACE_ERROR, at, "no sign key with key blob\n");
+    trace_error(at, "no sign key with key blob\n");
     return TEE_ERROR_ITEM_NOT_FOUND;
   }
   *key = retrieve_key_from_pobj(blob, key_bits);

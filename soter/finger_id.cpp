@@ -44,7 +44,7 @@ TEE_Result is_from_fp_ta() {
 
 TEE_Result take_notification(byte_view notification, trace_site at) {
   if (notification.size() != NOTIFICATION_SIZE) {
-    trace(TEE_TRACE_ERROR, at, "finger print ta input argument error");
+    trace_error(at, "finger print ta input argument error");
     return TEE_ERROR_BAD_PARAMETERS;
   }
   input_cursor in(notification);
@@ -54,9 +54,8 @@ TEE_Result take_notification(byte_view notification, trace_site at) {
     return TEE_ERROR_BAD_PARAMETERS;
   }
   if (version != NOTIFICATION_VERSION) {
-    trace(TEE_TRACE_ERROR, at,
-          "finger print ta input argument version mismatch expected %u actual %u\n",
-          NOTIFICATION_VERSION, version);
+    trace_error(at, "finger print ta input argument version mismatch expected %u actual %u\n",
+                NOTIFICATION_VERSION, version);
     return TEE_ERROR_BAD_FORMAT;
   }
   last_match = match;

@@ -23,7 +23,7 @@ TEE_Result refuse_undigested(const rsa_sign_operation_t& operation, byte_view do
                              trace_site at) {
   const TEE_Result res =
       document.size() > operation.key_size() ? TEE_ERROR_OUT_OF_MEMORY : TEE_ERROR_BAD_STATE;
-  trace(TEE_TRACE_ERROR, at, "AsymmetricSignDigest failed with 0x%08x\n", res);
+  trace_error(at, "AsymmetricSignDigest failed with 0x%08x\n", res);
   return res;
 }
 

@@ -11,7 +11,7 @@ namespace {
 constexpr size_t ITEM_HEADER = 4;
 
 void trace_out_of_memory(size_t size, trace_site at = trace_site::here()) {
-  trace(TEE_TRACE_ERROR, at, "Out of memory, need %dB", static_cast<int>(size));
+  trace_error(at, "Out of memory, need %dB", static_cast<int>(size));
 }
 
 }  // namespace

@@ -13,12 +13,12 @@ keymaster_error_t open_attested(byte_view blob, opened_key* key, trace_site at) 
   if (auto error = open_checked_key(blob, key, at)) return error;
   const auto* tag = get_unique(key->characteristics, KM_TAG_ALGORITHM);
   if (tag == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No KM_TAG_ALGORITHM");
+    trace_error(at, "No KM_TAG_ALGORITHM");
     return KM_ERROR_UNKNOWN_ERROR;
   }
   const algorithm_t* algorithm = find_algorithm(tag->enumerated);
   if (algorithm != nullptr && algorithm->get_operation_methods != nullptr) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Algorithm %d not implemented", static_cast<int>(tag->enumerated));
+  trace_error(at, "Algorithm %d not implemented", static_cast<int>(tag->enumerated));
   return KM_ERROR_UNSUPPORTED_ALGORITHM;
 }
 

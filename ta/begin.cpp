@@ -17,14 +17,14 @@ TEE_Result authorize(const opened_key& key, uint32_t purpose,
                      trace_site at) {
   if (!check_app_id_and_app_data(key.characteristics, unique_blob(params, KM_TAG_APPLICATION_ID),
                                  unique_blob(params, KM_TAG_APPLICATION_DATA))) {
-    trace(TEE_TRACE_ERROR, at, "Wrong AppId or AppData");
+    trace_error(at, "Wrong AppId or AppData");
     *km_error = KM_ERROR_INVALID_KEY_BLOB;
     return TEE_SUCCESS;
   }
   const TEE_Result res =
       authorize_begin(key.blob.view(), purpose, params, key.characteristics, km_error, at);
   if (res == TEE_SUCCESS && *km_error == KM_AUTHENTICATION_DUE) *km_error = KM_ERROR_OK;
-  if (failed(res, *km_error)) trace(TEE_TRACE_ERROR, at, "Authorization failed");
+  if (failed(res, *km_error)) trace_error(at, "Authorization failed");
   return res;
 }
 
@@ -33,18 +33,18 @@ keymaster_error_t choose_methods(const keymaster_key_param_set_t& characteristic
                                  const operation_methods_t** methods, trace_site at) {
   const auto* tag = get_unique(characteristics, KM_TAG_ALGORITHM);
   if (tag == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No KM_TAG_ALGORITHM");
+    trace_error(at, "No KM_TAG_ALGORITHM");
     return KM_ERROR_UNKNOWN_ERROR;
   }
   const algorithm_t* algorithm = find_algorithm(tag->enumerated);
   if (algorithm == nullptr || algorithm->get_operation_methods == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Algorithm %d not implemented", static_cast<int>(tag->enumerated));
+    trace_error(at, "Algorithm %d not implemented", static_cast<int>(tag->enumerated));
     return KM_ERROR_UNSUPPORTED_ALGORITHM;
   }
   *methods = algorithm->get_operation_methods(purpose);
   if (*methods != nullptr && (*methods)->create_operation != nullptr) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Algorithm %s purpose %d not implemented", algorithm->name,
-        static_cast<int>(purpose));
+  trace_error(at, "Algorithm %s purpose %d not implemented", algorithm->name,
+              static_cast<int>(purpose));
   return KM_ERROR_UNSUPPORTED_PURPOSE;
 }
 
@@ -58,7 +58,7 @@ keymaster_error_t create(opened_key* key, uint32_t purpose, const keymaster_key_
   *operation = methods->create_operation(key->material.view(), key->characteristics, params,
                                          out_params, &error);
   if (*operation == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Create operation failed");
+    trace_error(at, "Create operation failed");
     settle_failure(TEE_SUCCESS, &error);
     return error;
   }
@@ -72,12 +72,12 @@ TEE_Result enter(operation_t* operation, const keymaster_key_param_set_t& out_pa
   uint32_t handle = 0;
   const TEE_Result added = operation_pool_add(operation, &handle, km_error);
   if (failed(added, *km_error)) {
-    trace(TEE_TRACE_ERROR, at, "Allocate in operation pool failed");
+    trace_error(at, "Allocate in operation pool failed");
     free_ended(operation);
     return added;
   }
   if (TEE_Result res = write_set(out_params, io->output, &io->output_size)) {
-    trace(TEE_TRACE_ERROR, at, "Marshal failed");
+    trace_error(at, "Marshal failed");
     end_operation(operation, handle);
     return res;
   }

@@ -87,16 +87,16 @@ TEE_Result check_parameters(const command_row& row, uint32_t types, const TEE_Pa
                             trace_site at) {
   if (types != row.types) {
     if (row.types == IN_ONLY) {
-      trace(TEE_TRACE_ERROR, at, "Bad argument type 0x%x\n", types);
+      trace_error(at, "Bad argument type 0x%x\n", types);
     } else {
-      trace(TEE_TRACE_ERROR, at, "Bad argument type\n");
+      trace_error(at, "Bad argument type\n");
     }
     return TEE_ERROR_BAD_PARAMETERS;
   }
   const bool a_refused = row.slot0 == BOTH_ZERO && params[0].value.a != 0;
   const bool b_refused = row.slot0 != UNUSED && params[0].value.b != 0;
   if (a_refused || b_refused) {
-    trace(TEE_TRACE_ERROR, at, "Bad argument\n");
+    trace_error(at, "Bad argument\n");
     return TEE_ERROR_BAD_PARAMETERS;
   }
   return TEE_SUCCESS;
@@ -119,7 +119,7 @@ command_io unpack(const command_row& row, const TEE_Param* params) {
 
 TEE_Result run(const command_row& row, command_io* io, keymaster_error_t* km_error) {
   if (row.needs_configured && !configured().is_configured) {
-    trace(TEE_TRACE_ERROR, {row.name, __LINE__}, "Not configured");
+    trace_error({row.name, __LINE__}, "Not configured");
     *km_error = KM_ERROR_KEYMASTER_NOT_CONFIGURED;
     return TEE_SUCCESS;
   }
@@ -144,7 +144,7 @@ void settle_output(const command_row& row, const command_io& io, bool done, TEE_
 TEE_Result dispatch(uint32_t command, uint32_t types, TEE_Param* params, trace_site at) {
   const command_row* row = find_command(command);
   if (row == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Unknown command %x\n", command);
+    trace_error(at, "Unknown command %x\n", command);
     return TEE_ERROR_BAD_PARAMETERS;
   }
   trace(TEE_TRACE_INFO, at, "%s", row->name);

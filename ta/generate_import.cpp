@@ -10,7 +10,7 @@ namespace {
 
 keymaster_error_t check_blob_usage(const keymaster_key_param_set_t& description, trace_site at) {
   if (tag_at_most_once(description, KM_TAG_BLOB_USAGE_REQUIREMENTS)) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Too many KM_TAG_BLOB_USAGE_REQUIREMENTS specified");
+  trace_error(at, "Too many KM_TAG_BLOB_USAGE_REQUIREMENTS specified");
   return KM_ERROR_INVALID_TAG;
 }
 
@@ -19,13 +19,13 @@ keymaster_error_t choose_import(const keymaster_key_param_set_t& description,
                                 const algorithm_t** algorithm, trace_site at) {
   const auto* tag = get_unique(description, KM_TAG_ALGORITHM);
   if (tag == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_ALGORITHM");
+    trace_error(at, "No or too many KM_TAG_ALGORITHM");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   *algorithm = find_algorithm(tag->enumerated);
   if (*algorithm != nullptr && (*algorithm)->import_key != nullptr) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Unsupport import_key for algorithm %s (%d)",
-        *algorithm == nullptr ? "" : (*algorithm)->name, static_cast<int>(tag->enumerated));
+  trace_error(at, "Unsupport import_key for algorithm %s (%d)",
+              *algorithm == nullptr ? "" : (*algorithm)->name, static_cast<int>(tag->enumerated));
   return KM_ERROR_UNSUPPORTED_ALGORITHM;
 }
 
@@ -35,7 +35,7 @@ TEE_Result import_material(const algorithm_t& algorithm, keymaster_key_param_set
                            keymaster_error_t* km_error, trace_site at) {
   heap_buffer key_data;
   if (!key_data.copy_of(client_data)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
@@ -49,7 +49,7 @@ TEE_Result import_material(const algorithm_t& algorithm, keymaster_key_param_set
 TEE_Result write_imported(byte_view material, const keymaster_key_param_set_t& characteristics,
                           byte_span output, size_t* total, trace_site at) {
   const auto too_short = [at] {
-    trace(TEE_TRACE_ERROR, at, "Too short buffer");
+    trace_error(at, "Too short buffer");
     return TEE_ERROR_GENERIC;
   };
   output_cursor out(output);
@@ -61,7 +61,7 @@ TEE_Result write_imported(byte_view material, const keymaster_key_param_set_t& c
   }
   size_t size = 0;
   if (TEE_Result res = save_key(material, characteristics, out.rest(), &size)) {
-    trace(TEE_TRACE_ERROR, at, "Can't save key to TEE storage");
+    trace_error(at, "Can't save key to TEE storage");
     return res;
   }
   store_u32(blob_length, static_cast<uint32_t>(size));
@@ -69,7 +69,7 @@ TEE_Result write_imported(byte_view material, const keymaster_key_param_set_t& c
     return too_short();
   }
   if (TEE_Result res = write_set(characteristics, out.rest(), &size)) {
-    trace(TEE_TRACE_ERROR, at, "Marshal failed");
+    trace_error(at, "Marshal failed");
     return res;
   }
   store_u32(characteristics_length, static_cast<uint32_t>(size));

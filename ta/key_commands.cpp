@@ -16,11 +16,11 @@ TEE_Result open_for_characteristics(byte_view input, opened_key* key, keymaster_
                                     trace_site at) {
   key_request request;
   if (!read_key_request(input, &request)) {
-    trace(TEE_TRACE_ERROR, at, "Too short input");
+    trace_error(at, "Too short input");
     return TEE_ERROR_GENERIC;
   }
   if (request.blob.size() < SHORTEST_BLOB) {
-    trace(TEE_TRACE_ERROR, at, "Wrong key_blob_size %d", static_cast<int>(request.blob.size()));
+    trace_error(at, "Wrong key_blob_size %d", static_cast<int>(request.blob.size()));
     *km_error = KM_ERROR_INVALID_KEY_BLOB;
     return TEE_SUCCESS;
   }
@@ -32,19 +32,19 @@ TEE_Result export_normal(const opened_key& key, command_io* io, keymaster_error_
                          trace_site at) {
   const auto* tag = get_unique(key.characteristics, KM_TAG_ALGORITHM);
   if (tag == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_ALGORITHM");
+    trace_error(at, "No or too many KM_TAG_ALGORITHM");
     *km_error = KM_ERROR_INVALID_ARGUMENT;
     return TEE_SUCCESS;
   }
   const algorithm_t* algorithm = find_algorithm(tag->enumerated);
   if (algorithm == nullptr || algorithm->export_key == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Unsupported algorithm");
+    trace_error(at, "Unsupported algorithm");
     *km_error = KM_ERROR_UNSUPPORTED_ALGORITHM;
     return TEE_SUCCESS;
   }
   const TEE_Result res =
       algorithm->export_key(key.material.view(), io->output, &io->output_size, km_error);
-  if (failed(res, *km_error)) trace(TEE_TRACE_ERROR, at, "Export key failed");
+  if (failed(res, *km_error)) trace_error(at, "Export key failed");
   return res;
 }
 

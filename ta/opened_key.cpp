@@ -10,7 +10,7 @@ namespace keymaster {
 
 TEE_Result read_params(byte_view marshalled, keymaster_key_param_set_t* params, trace_site at) {
   if (unmarshal(marshalled, params) == TEE_SUCCESS) return TEE_SUCCESS;
-  trace(TEE_TRACE_ERROR, at, "Unmarshal failed");
+  trace_error(at, "Unmarshal failed");
   return TEE_ERROR_BAD_PARAMETERS;
 }
 
@@ -19,7 +19,7 @@ TEE_Result read_use(byte_view input, byte_view* blob, keymaster_key_param_set_t*
   input_cursor in(input);
   byte_view marshalled;
   if (!in.read_field(blob) || !in.read_field(&marshalled)) {
-    trace(TEE_TRACE_ERROR, at, "Too short input");
+    trace_error(at, "Too short input");
     return TEE_ERROR_GENERIC;
   }
   return read_params(marshalled, params, at);
@@ -27,14 +27,14 @@ TEE_Result read_use(byte_view input, byte_view* blob, keymaster_key_param_set_t*
 
 keymaster_error_t open_checked_key(byte_view blob, opened_key* key, trace_site at) {
   if (!key->blob.copy_of(blob)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   keymaster_error_t error = KM_ERROR_OK;
   const TEE_Result res = open_key(key->blob.view(), &key->material, &key->characteristics, &error);
   if (failed(res, error)) {
     // The reason is traced, not told: a blob that does not open asks for an upgrade. Intended.
-    trace(TEE_TRACE_ERROR, at, "Open key failed");
+    trace_error(at, "Open key failed");
     return KM_ERROR_KEY_REQUIRES_UPGRADE;
   }
   if (key_requires_upgrade(key->characteristics)) return KM_ERROR_KEY_REQUIRES_UPGRADE;
@@ -51,7 +51,7 @@ bool read_key_request(byte_view input, key_request* request) {
 keymaster_error_t open_requested_key(const key_request& request, opened_key* key, trace_site at) {
   if (auto error = open_checked_key(request.blob, key, at)) return error;
   if (!check_app_id_and_app_data(key->characteristics, request.app_id, request.app_data)) {
-    trace(TEE_TRACE_ERROR, at, "Wrong AppId or AppData");
+    trace_error(at, "Wrong AppId or AppData");
     return KM_ERROR_INVALID_KEY_BLOB;
   }
   return KM_ERROR_OK;

@@ -50,14 +50,14 @@ TEE_Result authorize_step(byte_view marshalled, const live_operation& operation,
                           keymaster_key_param_set_t* params, keymaster_error_t* km_error,
                           trace_site at) {
   if (unmarshal(marshalled, params) != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "Unmarshal failed");
+    trace_error(at, "Unmarshal failed");
     *km_error = KM_ERROR_INVALID_ARGUMENT;
     return TEE_SUCCESS;
   }
   const uint64_t challenge = operation.handle();
   const TEE_Result res = authorize_update_or_finish(*params, operation.get()->key_characteristics,
                                                     challenge, km_error);
-  if (failed(res, *km_error)) trace(TEE_TRACE_ERROR, at, "Authorization failed");
+  if (failed(res, *km_error)) trace_error(at, "Authorization failed");
   return res;
 }
 
@@ -66,12 +66,12 @@ TEE_Result run_finish(operation_t* operation, const keymaster_key_param_set_t& p
                       byte_view input, heap_buffer* output, keymaster_key_param_set_t* out_params,
                       keymaster_error_t* km_error, trace_site at) {
   if (operation->finish == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Finish not implemented");
+    trace_error(at, "Finish not implemented");
     *km_error = KM_ERROR_UNIMPLEMENTED;
     return TEE_SUCCESS;
   }
   const TEE_Result res = operation->finish(operation, params, input, output, out_params, km_error);
-  if (failed(res, *km_error)) trace(TEE_TRACE_ERROR, at, "Finish failed");
+  if (failed(res, *km_error)) trace_error(at, "Finish failed");
   return res;
 }
 
@@ -81,12 +81,12 @@ TEE_Result write_finished(byte_view result, const keymaster_key_param_set_t& out
   output_cursor out(output);
   byte_span params_length;
   if (!out.write_field(result) || !out.reserve(sizeof(uint32_t), &params_length)) {
-    trace(TEE_TRACE_ERROR, at, "Too short buffer");
+    trace_error(at, "Too short buffer");
     return TEE_ERROR_GENERIC;
   }
   size_t size = 0;
   if (TEE_Result res = write_set(out_params, out.rest(), &size)) {
-    trace(TEE_TRACE_ERROR, at, "Marshal failed");
+    trace_error(at, "Marshal failed");
     return res;
   }
   store_u32(params_length, static_cast<uint32_t>(size));

@@ -13,15 +13,15 @@ namespace {
 TEE_Result open_any(byte_view client_blob, opened_key* key, keymaster_error_t* km_error,
                     trace_site at) {
   if (!key->blob.copy_of(client_blob)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
   TEE_Result res = open_key(key->blob.view(), &key->material, &key->characteristics, km_error);
   if (!failed(res, *km_error)) return TEE_SUCCESS;
-  trace(TEE_TRACE_ERROR, at, "Open V2 key failed");
+  trace_error(at, "Open V2 key failed");
   res = open_v1_key(key->blob.view(), &key->material, &key->characteristics, km_error);
-  if (failed(res, *km_error)) trace(TEE_TRACE_ERROR, at, "Open V1 key failed");
+  if (failed(res, *km_error)) trace_error(at, "Open V1 key failed");
   return res;
 }
 
@@ -41,13 +41,13 @@ keymaster_error_t upgrade_characteristics(keymaster_key_param_set_t* characteris
                                           const keymaster_key_param_set_t& params, trace_site at) {
   if (!check_app_id_and_app_data(*characteristics, unique_blob(params, KM_TAG_APPLICATION_ID),
                                  unique_blob(params, KM_TAG_APPLICATION_DATA))) {
-    trace(TEE_TRACE_ERROR, at, "Wrong AppId or AppData");
+    trace_error(at, "Wrong AppId or AppData");
     return KM_ERROR_INVALID_KEY_BLOB;
   }
   if (!raise_version(characteristics, KM_TAG_OS_VERSION, configured().configured_os_version) ||
       !raise_version(characteristics, KM_TAG_OS_PATCHLEVEL,
                      configured().configured_os_patchlevel)) {
-    trace(TEE_TRACE_ERROR, at, "Can't upgrade key params");
+    trace_error(at, "Can't upgrade key params");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   return KM_ERROR_OK;

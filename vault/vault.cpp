@@ -37,7 +37,7 @@ TEE_Result call_vault(const vault_command& command, TEE_Param* params, size_t* l
                       trace_site at) {
   tee_session session;
   if (TEE_Result res = session.open(VAULT, TEE_TIMEOUT_INFINITE)) {
-    trace(TEE_TRACE_ERROR, at, "Open vault session fails, 0x%x\n", res);
+    trace_error(at, "Open vault session fails, 0x%x\n", res);
     return res;
   }
   TEE_Result res = session.invoke(command.id, command.types, params);
@@ -56,11 +56,11 @@ TEE_Result call_vault(const vault_command& command, TEE_Param* params, size_t* l
 TEE_Result retrieve_bytes(const vault_command& command, uint8_t* buffer, size_t size,
                           size_t* used_length, trace_site at) {
   if (buffer == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Buf is null\n");
+    trace_error(at, "Buf is null\n");
     return TEE_ERROR_SHORT_BUFFER;
   }
   if (used_length == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "used_length pointer is null\n");
+    trace_error(at, "used_length pointer is null\n");
     return TEE_ERROR_BAD_PARAMETERS;
   }
   TEE_Param params[4] = {};

@@ -110,11 +110,11 @@ template <class T>
 void free_operation(operation_t* operation, trace_site at) {
   auto* record = static_cast<T*>(operation);
   if (record == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Try to free NULL %s", T::TYPE_NAME);
+    trace_error(at, "Try to free NULL %s", T::TYPE_NAME);
     return;
   }
   for (int i = record->missing(); i > 0; i--) {
-    trace(TEE_TRACE_ERROR, at, "Try to free invalid %s", T::TYPE_NAME);
+    trace_error(at, "Try to free invalid %s", T::TYPE_NAME);
   }
   heap_delete(record);
 }
@@ -127,7 +127,7 @@ operation_t* create_operation_object(const operation_slots_t& slots, keymaster_e
                                      trace_site at, Prepare prepare) {
   T* record = heap_new<T>();
   if (record == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return nullptr;
   }

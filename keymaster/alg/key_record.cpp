@@ -17,7 +17,7 @@ TEE_Result measure(const tee_object& key, std::span<const uint32_t> ids, size_t 
                    number_lengths* lengths, keymaster_error_t* km_error, trace_site at) {
   heap_buffer scratch;
   if (!scratch.allocate(longest)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
@@ -32,14 +32,14 @@ TEE_Result write_number(const tee_object& key, uint32_t id, size_t length, outpu
                         keymaster_error_t* km_error, trace_site at) {
   byte_span room;
   if (!out->write_u32(static_cast<uint32_t>(length)) || !out->reserve(length, &room)) {
-    trace(TEE_TRACE_ERROR, at, "Too short buffer");
+    trace_error(at, "Too short buffer");
     return TEE_ERROR_GENERIC;
   }
   size_t written = 0;
   if (TEE_Result res = key.read_attribute(id, room, &written, at)) return res;
   if (written != length) {
-    trace(TEE_TRACE_ERROR, at, "Buffer size modified, before %dB, after %dB",
-          static_cast<int>(length), static_cast<int>(written));
+    trace_error(at, "Buffer size modified, before %dB, after %dB", static_cast<int>(length),
+                static_cast<int>(written));
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;
@@ -55,7 +55,7 @@ TEE_Result write_record(const tee_object& key, uint32_t key_bits, std::span<cons
   for (size_t i = 0; i < ids.size(); i++)
     size += sizeof(uint32_t) + lengths[i];
   if (!record->allocate(size)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   store_u32(record->span(), key_bits);

@@ -41,7 +41,7 @@ TEE_Result sign_digest(const tee_operation& main, std::span<const TEE_Attribute>
       main.get(), params.data(), static_cast<uint32_t>(params.size()), digest.data(),
       static_cast<tee_size>(digest.size()), signature->data(), &size);
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "AsymmetricSignDigest failed with 0x%08x\n", res);
+    trace_error(at, "AsymmetricSignDigest failed with 0x%08x\n", res);
     return res;
   }
   signature->truncate(size);
@@ -60,7 +60,7 @@ TEE_Result verify_digest(const tee_operation& main, std::span<const TEE_Attribut
     return TEE_SUCCESS;
   }
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "TEE_AsymmetricVerifyDigest return 0x%08x", res);
+    trace_error(at, "TEE_AsymmetricVerifyDigest return 0x%08x", res);
   }
   return res;
 }

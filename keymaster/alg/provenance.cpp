@@ -11,11 +11,11 @@ namespace {
 keymaster_error_t add_own_tag(keymaster_key_param_set_t* description, keymaster_tag_t tag,
                               const char* name, uint64_t value, trace_site at) {
   if (contains_tag(*description, tag)) {
-    trace(TEE_TRACE_ERROR, at, "Shouldn't specify %s", name);
+    trace_error(at, "Shouldn't specify %s", name);
     return KM_ERROR_INVALID_ARGUMENT;
   }
   if (!add_long(description, tag, value)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;

@@ -39,13 +39,13 @@ keymaster_error_t choose_algorithm(const keymaster_key_param_set_t& key_params,
                                    const algorithm_t** algorithm, trace_site at) {
   const auto* tag = get_unique(key_params, KM_TAG_ALGORITHM);
   if (tag == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No KM_TAG_ALGORITHM");
+    trace_error(at, "No KM_TAG_ALGORITHM");
     return KM_ERROR_UNKNOWN_ERROR;
   }
   *algorithm = find_algorithm(tag->enumerated);
   if (*algorithm != nullptr && (*algorithm)->set_key_info != nullptr) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Algorithm %d not implemented or attestation not supported",
-        static_cast<int>(tag->enumerated));
+  trace_error(at, "Algorithm %d not implemented or attestation not supported",
+              static_cast<int>(tag->enumerated));
   return KM_ERROR_UNSUPPORTED_ALGORITHM;
 }
 
@@ -88,11 +88,11 @@ keymaster_error_t add_key_usage(const keymaster_key_param_set_t& key_params,
   const int32_t length = asn1_encode(ASN1_BIT_STRING_TYPE, &usage, encoding);
   ASN1_BIT_STRING_TYPE.free(&usage);
   if (filled != 0) {
-    trace(TEE_TRACE_ERROR, at, "ASN1_BIT_STRING_set_bit return %d", filled);
+    trace_error(at, "ASN1_BIT_STRING_set_bit return %d", filled);
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   if (length < 0) {
-    trace(TEE_TRACE_ERROR, at, "ASN1_BIT_STRING_write return %d", length);
+    trace_error(at, "ASN1_BIT_STRING_write return %d", length);
     return KM_ERROR_UNKNOWN_ERROR;
   }
   X509_EXTENSION* extension = X509_EXTENSIONS_alloc_item(extensions, at);
@@ -100,7 +100,7 @@ keymaster_error_t add_key_usage(const keymaster_key_param_set_t& key_params,
   extension->id = &OID_KEY_USAGE;
   const byte_view value = byte_view(encoding).first(static_cast<size_t>(length));
   if (int32_t code = ASN1_OCTET_STRING_set(&extension->value, value)) {
-    trace(TEE_TRACE_ERROR, at, "ASN1_OCTET_STRING_set return %d", code);
+    trace_error(at, "ASN1_OCTET_STRING_set return %d", code);
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;
@@ -158,7 +158,7 @@ TEE_Result write_chain(byte_view certificate, byte_span output, size_t* produced
   output_cursor out(output);
   for (const byte_view link : {certificate, byte_view(ATTESTATION_KEY.certificate)}) {
     if (!out.write_field(link)) {
-      trace(TEE_TRACE_ERROR, at, "Too short buffer");
+      trace_error(at, "Too short buffer");
       return TEE_ERROR_GENERIC;
     }
     (*count)++;

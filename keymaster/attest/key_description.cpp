@@ -178,7 +178,7 @@ keymaster_error_t settle_unique_id(const keymaster_key_param_set_t& hardware,
   if (!contains_tag(hardware, KM_TAG_INCLUDE_UNIQUE_ID)) return KM_ERROR_OK;
   const auto* created = get_unique(hardware, KM_TAG_CREATION_DATETIME);
   if (created == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Unique ID cannot be generated without creation datetime");
+    trace_error(at, "Unique ID cannot be generated without creation datetime");
     return KM_ERROR_INVALID_KEY_BLOB;
   }
   return generate_unique_id(unique_id, created->date_time,

@@ -49,7 +49,7 @@ int32_t digest_encoding(uint32_t algorithm, byte_view encoding, heap_buffer* dig
   const TEE_Result asked = TEE_DigestDoFinal(
       operation.get(), encoding.data(), static_cast<tee_size>(encoding.size()), nullptr, &size);
   if (asked != TEE_ERROR_SHORT_BUFFER) {
-    trace(TEE_TRACE_ERROR, at, "DigestDoFinal failed with 0x%08x\n", asked);
+    trace_error(at, "DigestDoFinal failed with 0x%08x\n", asked);
     return as_writer_code(asked == TEE_SUCCESS ? TEE_ERROR_GENERIC : asked);
   }
   if (!digest->allocate(size)) return DER_NO_MEMORY;
@@ -61,7 +61,7 @@ int32_t sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
                     heap_buffer* signature, trace_site at) {
   TEE_ObjectInfo info{};
   if (TEE_Result res = TEE_GetObjectInfo1(key.get(), &info)) {
-    trace(TEE_TRACE_ERROR, at, "GetObjectInfo1 failed with 0x%08x\n", res);
+    trace_error(at, "GetObjectInfo1 failed with 0x%08x\n", res);
     return as_writer_code(res);
   }
   tee_operation operation;
@@ -80,7 +80,7 @@ int32_t sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
     res = sign(signature->data(), &size);
   }
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "AsymmetricSignDigest failed with 0x%08x\n", res);
+    trace_error(at, "AsymmetricSignDigest failed with 0x%08x\n", res);
     return as_writer_code(res);
   }
   signature->truncate(size);

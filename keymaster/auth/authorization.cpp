@@ -75,14 +75,14 @@ keymaster_error_t check_secure_id(uint64_t secure_id, const keymaster_key_param_
 keymaster_error_t ask_operation(begin_check_t* check, trace_site at) {
   const algorithm_t* algorithm = find_algorithm(check->algorithm);
   if (algorithm == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Algorithm %d not implemented", static_cast<int>(check->algorithm));
+    trace_error(at, "Algorithm %d not implemented", static_cast<int>(check->algorithm));
     return KM_ERROR_UNSUPPORTED_ALGORITHM;
   }
   const operation_methods_t* methods = algorithm->get_operation_methods(check->purpose);
   if (methods == nullptr || methods->get_padding == nullptr || methods->get_block_mode == nullptr ||
       methods->get_digest == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Algorithm %s purpose %d not implemented", algorithm->name,
-          static_cast<int>(check->purpose));
+    trace_error(at, "Algorithm %s purpose %d not implemented", algorithm->name,
+                static_cast<int>(check->purpose));
     return KM_ERROR_UNSUPPORTED_PURPOSE;
   }
   check->padding.is_allowed = !methods->get_padding(check->request, &check->padding.value);

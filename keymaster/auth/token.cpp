@@ -50,7 +50,7 @@ TEE_Result make_token_key(tee_object* key, trace_site at) {
     const TEE_Attribute secret[] = {ref_attribute(TEE_ATTR_SECRET_VALUE, seed)};
     res = key->populate(secret, at);
   } else {
-    trace(TEE_TRACE_ERROR, at, "GetBootSeed failed with 0x%08x\n", res);
+    trace_error(at, "GetBootSeed failed with 0x%08x\n", res);
   }
   wipe(seed);
   return res;
@@ -82,7 +82,7 @@ TEE_Result auth_tokens_init(trace_site at) {
   if (TEE_Result res = make_token_key(&key, at)) return res;
   token_cache = static_cast<cache_entry_t*>(heap_take(CACHE_ENTRIES * sizeof(cache_entry_t)));
   if (token_cache == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   for (cache_entry_t& entry : cache())

@@ -16,19 +16,18 @@ bool is_hidden(keymaster_tag_t tag) {
 TEE_Result read_entry(input_cursor* in, keymaster_key_param_t* entry, trace_site at) {
   keymaster_key_param_t record{};
   if (!in->read_into(object_bytes(record))) {
-    trace(TEE_TRACE_ERROR, at, "Too short input");
+    trace_error(at, "Too short input");
     return TEE_ERROR_GENERIC;
   }
   if (has_blob(record.tag)) {
     byte_view bytes;
     heap_buffer data;
     if (!in->read_bytes(record.data_length, &bytes)) {
-      trace(TEE_TRACE_ERROR, at, "Too short input");
+      trace_error(at, "Too short input");
       return TEE_ERROR_GENERIC;
     }
     if (!data.copy_of(bytes)) {
-      trace(TEE_TRACE_ERROR, at, "Out of memory, require %dB",
-            static_cast<int>(record.data_length));
+      trace_error(at, "Out of memory, require %dB", static_cast<int>(record.data_length));
       return TEE_ERROR_OUT_OF_MEMORY;
     }
     record.long_integer = 0;
@@ -45,16 +44,16 @@ TEE_Result write_entry(output_cursor* out, const keymaster_key_param_t& param, t
   const bool blob = has_blob(param.tag);
   if (blob) record.long_integer = 0;
   if (!out->write_bytes(object_bytes(std::as_const(record)))) {
-    trace(TEE_TRACE_ERROR, at, "Too short buffer");
+    trace_error(at, "Too short buffer");
     return TEE_ERROR_GENERIC;
   }
   if (!blob) return TEE_SUCCESS;
   if (param.data == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Invalid keymaster_key_param_set_t");
+    trace_error(at, "Invalid keymaster_key_param_set_t");
     return TEE_ERROR_BAD_PARAMETERS;
   }
   if (!out->write_bytes(param.blob())) {
-    trace(TEE_TRACE_ERROR, at, "Too short buffer");
+    trace_error(at, "Too short buffer");
     return TEE_ERROR_GENERIC;
   }
   return TEE_SUCCESS;
@@ -68,7 +67,7 @@ TEE_Result write_set(const keymaster_key_param_set_t& set, bool include_all, byt
   }
   output_cursor out(buffer);
   if (!out.write_u32(count)) {
-    trace(TEE_TRACE_ERROR, at, "Too short buffer");
+    trace_error(at, "Too short buffer");
     return TEE_ERROR_GENERIC;
   }
   for (const keymaster_key_param_t& param : set) {

@@ -27,7 +27,7 @@ TEE_Result start_gcm(byte_view header, TEE_ObjectHandle ksk, uint32_t mode, tee_
                      trace_site at) {
   tee_object kk;
   if (TEE_Result res = TEE_DeriveKK(ksk, header.subspan(SALT_OFFSET, SALT_SIZE), &kk)) {
-    trace(TEE_TRACE_ERROR, at, "DeriveKK failed with 0x%08x\n", res);
+    trace_error(at, "DeriveKK failed with 0x%08x\n", res);
     return res;
   }
   if (TEE_Result res = gcm->allocate(TEE_ALG_AES_GCM, mode, KK_BITS, at)) return res;
@@ -54,13 +54,13 @@ TEE_Result finish_encryption(tee_operation* gcm, byte_span tag, output_cursor* c
   tee_size tag_size = static_cast<tee_size>(tag.size());
   if (TEE_Result res = TEE_AEEncryptFinal(gcm->get(), nullptr, 0, last.data(), &last_size,
                                           tag.data(), &tag_size)) {
-    trace(TEE_TRACE_ERROR, at, "AEEncryptFinal failed with 0x%08x\n", res);
+    trace_error(at, "AEEncryptFinal failed with 0x%08x\n", res);
     return res;
   }
   if (tag_size != TAG_SIZE) {
     // The second number is the final call's output, not the tag's size: intended.
-    trace(TEE_TRACE_ERROR, at, "Wrong tag size, expect %dB, got %dB", static_cast<int>(TAG_SIZE),
-          static_cast<int>(last_size));
+    trace_error(at, "Wrong tag size, expect %dB, got %dB", static_cast<int>(TAG_SIZE),
+                static_cast<int>(last_size));
     return TEE_ERROR_GENERIC;
   }
   byte_span room;
@@ -93,8 +93,8 @@ TEE_Result seal(byte_view key, byte_view characteristics, byte_span blob, trace_
     return res;
   }
   if (ciphertext.left() != 0) {
-    trace(TEE_TRACE_ERROR, at, "Unmatched total size, expected: %d actual: %d\n",
-          static_cast<int>(blob.size()), static_cast<int>(blob.size() - ciphertext.left()));
+    trace_error(at, "Unmatched total size, expected: %d actual: %d\n",
+                static_cast<int>(blob.size()), static_cast<int>(blob.size() - ciphertext.left()));
     return TEE_ERROR_GENERIC;
   }
   return TEE_SUCCESS;
@@ -110,10 +110,10 @@ TEE_Result choose_ksk(uint8_t protection, TEE_ObjectHandle* ksk, keymaster_error
     case PROTECTED_BY_RPMB_KSK:
       *ksk = rpmb_ksk();
       if (*ksk != TEE_HANDLE_NULL) return TEE_SUCCESS;
-      trace(TEE_TRACE_ERROR, at, "RPMB KSK died, fail to open key");
+      trace_error(at, "RPMB KSK died, fail to open key");
       return KEY_STORE_ERROR_KSK_MISSING;
     default:
-      trace(TEE_TRACE_ERROR, at, "Unknown key protection");
+      trace_error(at, "Unknown key protection");
       *km_error = KM_ERROR_INVALID_KEY_BLOB;
       return TEE_SUCCESS;
   }
@@ -129,7 +129,7 @@ TEE_Result decrypt(tee_operation* gcm, byte_view ciphertext, byte_view tag, byte
   if (TEE_Result res =
           TEE_AEDecryptFinal(gcm->get(), nullptr, 0, last.data(), &last_size,
                              const_cast<uint8_t*>(tag.data()), static_cast<tee_size>(tag.size()))) {
-    trace(TEE_TRACE_ERROR, at, "AEDecryptFinal failed with 0x%08x\n", res);
+    trace_error(at, "AEDecryptFinal failed with 0x%08x\n", res);
     return res;
   }
   *produced = updated + last_size;
@@ -146,7 +146,7 @@ TEE_Result unseal(byte_view blob, heap_buffer* plaintext, keymaster_error_t* km_
   if (TEE_Result res = start_gcm(blob, ksk, TEE_MODE_DECRYPT, &gcm, at)) return res;
   const byte_view ciphertext = blob.subspan(HEADER_SIZE);
   if (!plaintext->allocate(ciphertext.size())) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
@@ -156,8 +156,8 @@ TEE_Result unseal(byte_view blob, heap_buffer* plaintext, keymaster_error_t* km_
     return res;
   }
   if (produced != ciphertext.size()) {
-    trace(TEE_TRACE_ERROR, at, "Too short output of AES, expect %dB, got %dB",
-          static_cast<int>(ciphertext.size()), static_cast<int>(produced));
+    trace_error(at, "Too short output of AES, expect %dB, got %dB",
+                static_cast<int>(ciphertext.size()), static_cast<int>(produced));
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;
@@ -172,11 +172,11 @@ TEE_Result parse_plaintext(heap_buffer* plaintext, keymaster_error_t unreadable_
   byte_view key;
   byte_view marshalled;
   if (!in.read_field(&key) || !in.read_field(&marshalled)) {
-    trace(TEE_TRACE_ERROR, at, "Too short input");
+    trace_error(at, "Too short input");
     return TEE_ERROR_GENERIC;
   }
   if (unmarshal(marshalled, characteristics) != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "Unmarshal failed");
+    trace_error(at, "Unmarshal failed");
     *km_error = unreadable_set;
     return TEE_SUCCESS;
   }

@@ -64,7 +64,7 @@ TEE_Result create_rpmb_ksk(tee_object* ksk, trace_site at) {
   if (TEE_Result res = ksk->generate(KSK_BITS, {}, at)) return res;
   heap_buffer secret;
   if (!secret.allocate(KSK_SIZE)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   size_t length = 0;
@@ -72,8 +72,8 @@ TEE_Result create_rpmb_ksk(tee_object* ksk, trace_site at) {
     return res;
   }
   if (length != KSK_SIZE) {
-    trace(TEE_TRACE_ERROR, at, "Wrong key size, expected %dB, got %dB", static_cast<int>(KSK_SIZE),
-          static_cast<int>(length));
+    trace_error(at, "Wrong key size, expected %dB, got %dB", static_cast<int>(KSK_SIZE),
+                static_cast<int>(length));
     return TEE_ERROR_GENERIC;
   }
   tee_object stored;
@@ -81,7 +81,7 @@ TEE_Result create_rpmb_ksk(tee_object* ksk, trace_site at) {
       TEE_STORAGE_RPMB, KSK_OBJECT_ID, sizeof(KSK_OBJECT_ID), TEE_DATA_FLAG_ACCESS_READ,
       TEE_HANDLE_NULL, secret.data(), KSK_SIZE, stored.receive());
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "CreatePersistentObject failed with 0x%08x\n", res);
+    trace_error(at, "CreatePersistentObject failed with 0x%08x\n", res);
   }
   return res;
 }
@@ -89,17 +89,16 @@ TEE_Result create_rpmb_ksk(tee_object* ksk, trace_site at) {
 // A stored KSK of another length is of no use. Deletes it and fails this creation; the next one
 // finds no object and makes a new KSK. That it takes two starts is intended: the failure is seen.
 TEE_Result delete_wrong_ksk(tee_object* stored, size_t length, trace_site at) {
-  trace(TEE_TRACE_ERROR, at, "Wrong persistent data length, expected %dB, got %dB",
-        static_cast<int>(KSK_SIZE), static_cast<int>(length));
-  trace(TEE_TRACE_ERROR, at,
-        "Now, delete the key and recreate it, but all previous keymaster key will die");
+  trace_error(at, "Wrong persistent data length, expected %dB, got %dB", static_cast<int>(KSK_SIZE),
+              static_cast<int>(length));
+  trace_error(at, "Now, delete the key and recreate it, but all previous keymaster key will die");
   stored->reset();  // still open, it would conflict with the access that deletes
   if (TEE_Result res = open_ksk_object(TEE_DATA_FLAG_ACCESS_WRITE_META, stored)) {
-    trace(TEE_TRACE_ERROR, at, "OpenPersistentObject failed with 0x%08x\n", res);
+    trace_error(at, "OpenPersistentObject failed with 0x%08x\n", res);
     return res;
   }
   if (TEE_Result res = TEE_CloseAndDeletePersistentObject1(stored->release())) {
-    trace(TEE_TRACE_ERROR, at, "CloseAndDeletePersistentObject failed with 0x%08x\n", res);
+    trace_error(at, "CloseAndDeletePersistentObject failed with 0x%08x\n", res);
     return res;
   }
   return KEY_STORE_ERROR_KSK_DELETED;
@@ -111,7 +110,7 @@ TEE_Result load_rpmb_ksk(tee_object* stored, tee_object* ksk, trace_site at) {
   tee_size length = 0;
   TEE_Result res = TEE_ReadObjectData(stored->get(), secret, sizeof(secret), &length);
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "ReadObjectData failed with 0x%08x\n", res);
+    trace_error(at, "ReadObjectData failed with 0x%08x\n", res);
   } else if (length != KSK_SIZE) {
     res = delete_wrong_ksk(stored, length, at);
   } else {
@@ -129,7 +128,7 @@ TEE_Result key_store_init_rpmb_ksk() {
   if (res == TEE_ERROR_ITEM_NOT_FOUND) {
     res = create_rpmb_ksk(&ksk, at);
   } else if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "Open KSK failed with 0x%08x\n", res);
+    trace_error(at, "Open KSK failed with 0x%08x\n", res);
   } else {
     res = load_rpmb_ksk(&stored, &ksk, at);
   }

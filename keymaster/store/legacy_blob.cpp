@@ -19,19 +19,19 @@ constexpr uint32_t OPEN_BLOB_TYPES = TEE_PARAM_TYPES(
 TEE_Result ask_earlier_keymaster(heap_buffer* copy, trace_site at) {
   tee_session session;
   if (TEE_Result res = session.open(EARLIER_KEYMASTER, 0)) {
-    trace(TEE_TRACE_ERROR, at, "OpenTASession failed with 0x%08x\n", res);
+    trace_error(at, "OpenTASession failed with 0x%08x\n", res);
     return res;
   }
   TEE_Param params[4] = {};
   params[0].memref.buffer = copy->data();
   params[0].memref.size = static_cast<tee_size>(copy->size());
   if (TEE_Result res = session.invoke(COMMAND_OPEN_BLOB, OPEN_BLOB_TYPES, params)) {
-    trace(TEE_TRACE_ERROR, at, "InvokeTACommand failed with 0x%08x\n", res);
+    trace_error(at, "InvokeTACommand failed with 0x%08x\n", res);
     return res;
   }
   // A size above what was offered comes back as it is.
   if (params[0].memref.size > copy->size()) {
-    trace(TEE_TRACE_ERROR, at, "Too long answer");
+    trace_error(at, "Too long answer");
     return TEE_ERROR_GENERIC;
   }
   copy->truncate(params[0].memref.size);

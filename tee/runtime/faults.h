@@ -18,7 +18,7 @@ struct fault_state {
 extern fault_state faults;
 
 // fire_fault: the armed call has come. Disarms and returns the code.
-TEE_Result fire_fault();
+[[gnu::cold]] TEE_Result fire_fault();
 
 // fault_point: counts one fallible call; TEE_SUCCESS, or the code with which the call is to fail.
 // The count is exact while calls come from one thread at a time; a locked increment would cost more

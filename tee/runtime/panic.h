@@ -13,8 +13,8 @@ namespace tee {
 // panic: reports "panic: CALL: MESSAGE" on standard error and ends the trusted application that
 // made `call`; today that is the whole process (abort). The message names the argument and the rule
 // that was broken, never the content of a buffer.
-[[noreturn]] __attribute__((format(printf, 2, 3))) void panic(const char* call, const char* format,
-                                                              ...);
+[[noreturn]] __attribute__((format(printf, 2, 3), cold)) void panic(const char* call,
+                                                                    const char* format, ...);
 
 // guarded: runs the body of the API function `call`. Lack of host memory becomes
 // TEE_ERROR_OUT_OF_MEMORY where the body returns a result; whatever else the body throws, and lack

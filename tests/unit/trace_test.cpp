@@ -44,7 +44,7 @@ TEST_F(Trace, CutsLinesAt256BytesAndKeepsTheirNewline) {
   for (const size_t length : {255 - prefix, 256 - prefix, size_t{300}, size_t{5000}}) {
     platform::trace_lines.clear();
     const std::string message(length, 'x');
-    trace(TEE_TRACE_ERROR, AT, "%s", message.c_str());
+    trace_error(AT, "%s", message.c_str());
     ASSERT_EQ(platform::trace_lines.size(), 1u);
     const std::string& line = platform::trace_lines[0];
     EXPECT_EQ(line.size(), 256u) << length;
@@ -52,7 +52,7 @@ TEST_F(Trace, CutsLinesAt256BytesAndKeepsTheirNewline) {
   }
   platform::trace_lines.clear();
   const std::string name(400, 'f');
-  trace(TEE_TRACE_ERROR, {name.c_str(), 1}, "message");
+  trace_error({name.c_str(), 1}, "message");
   EXPECT_EQ(platform::trace_lines[0].size(), 256u);
   EXPECT_EQ(platform::trace_lines[0].back(), '\n');
 }

@@ -93,12 +93,12 @@ TEE_Result check_tag(aes_decrypt_operation_t* operation, keymaster_error_t* km_e
     return TEE_SUCCESS;
   }
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "AEDecryptFinal failed with 0x%08x\n", res);
+    trace_error(at, "AEDecryptFinal failed with 0x%08x\n", res);
     return res;
   }
   if (made != 0) {
     // The name is that of the encryption's call, which is intended.
-    trace(TEE_TRACE_ERROR, at, "AEEncryptFinal make output %dB", static_cast<int>(made));
+    trace_error(at, "AEEncryptFinal make output %dB", static_cast<int>(made));
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;
@@ -121,10 +121,10 @@ TEE_Result strip_padding(const aes_decrypt_operation_t& operation, heap_buffer* 
                          keymaster_error_t* km_error, trace_site at) {
   const byte_view block = operation.held_block;
   if (!is_padded(block)) {
-    trace(TEE_TRACE_ERROR, at, "Illegal padding");
+    trace_error(at, "Illegal padding");
     *km_error = KM_ERROR_INVALID_ARGUMENT;
   } else if (!output->copy_of(block.first(AES_BLOCK_SIZE - block.back()))) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return TEE_SUCCESS;

@@ -37,8 +37,8 @@ TEE_Result put_padding(aes_encrypt_operation_t* operation, byte_span block,
     return res;
   }
   if (produced != AES_BLOCK_SIZE) {
-    trace(TEE_TRACE_ERROR, at, "Padding input got wrong output length %dB, expected %dB",
-          static_cast<int>(produced), static_cast<int>(AES_BLOCK_SIZE));
+    trace_error(at, "Padding input got wrong output length %dB, expected %dB",
+                static_cast<int>(produced), static_cast<int>(AES_BLOCK_SIZE));
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;
@@ -51,16 +51,15 @@ TEE_Result put_tag(const aes_encrypt_operation_t& operation, byte_span tag,
   const TEE_Result res =
       TEE_AEEncryptFinal(operation.main.get(), nullptr, 0, nullptr, &made, tag.data(), &tag_size);
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "AEEncryptFinal failed with 0x%08x\n", res);
+    trace_error(at, "AEEncryptFinal failed with 0x%08x\n", res);
     return res;
   }
   if (made != 0) {
-    trace(TEE_TRACE_ERROR, at, "AEEncryptFinal make output %dB, expected %dB",
-          static_cast<int>(made), 0);
+    trace_error(at, "AEEncryptFinal make output %dB, expected %dB", static_cast<int>(made), 0);
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   } else if (tag_size != tag.size()) {
-    trace(TEE_TRACE_ERROR, at, "AEEncryptFinal make wrong tag size %dB, expected %dB",
-          static_cast<int>(tag_size), static_cast<int>(tag.size()));
+    trace_error(at, "AEEncryptFinal make wrong tag size %dB, expected %dB",
+                static_cast<int>(tag_size), static_cast<int>(tag.size()));
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;

@@ -15,7 +15,7 @@ constexpr size_t HEADER_SIZE = sizeof(uint32_t);
 
 keymaster_error_t check_key_size(uint32_t key_bits, trace_site at) {
   if (key_bits == 128 || key_bits == 192 || key_bits == 256) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Invalid AES key size %d", static_cast<int>(key_bits));
+  trace_error(at, "Invalid AES key size %d", static_cast<int>(key_bits));
   return KM_ERROR_UNSUPPORTED_KEY_SIZE;
 }
 
@@ -30,12 +30,12 @@ bool lists_gcm(const keymaster_key_param_set_t& description) {
 keymaster_error_t check_min_mac(const keymaster_key_param_set_t& description, trace_site at) {
   if (!lists_gcm(description)) {
     if (!contains_tag(description, KM_TAG_MIN_MAC_LENGTH)) return KM_ERROR_OK;
-    trace(TEE_TRACE_ERROR, at, "Found KM_TAG_MIN_MAC_LENGTH without GCM");
+    trace_error(at, "Found KM_TAG_MIN_MAC_LENGTH without GCM");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   const auto* min_mac = get_unique(description, KM_TAG_MIN_MAC_LENGTH);
   if (min_mac == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_MIN_MAC_LENGTH");
+    trace_error(at, "No or too many KM_TAG_MIN_MAC_LENGTH");
     return KM_ERROR_MISSING_MIN_MAC_LENGTH;
   }
   return check_min_mac_bits(min_mac->integer, MIN_MIN_MAC_BITS, MAX_MIN_MAC_BITS, at);

@@ -37,7 +37,7 @@ bool aes_block_mode(const keymaster_key_param_set_t& params, uint32_t* value) {
 
 TEE_Result load_key(aes_encrypt_operation_t* operation, byte_view key_material, trace_site at) {
   const TEE_Result res = aes_resolve_key_data(key_material, &operation->key, &operation->key_bits);
-  if (res != TEE_SUCCESS) trace(TEE_TRACE_ERROR, at, "Resolve key data failed");
+  if (res != TEE_SUCCESS) trace_error(at, "Resolve key data failed");
   return res;
 }
 
@@ -47,12 +47,12 @@ keymaster_error_t read_mac_length(aes_encrypt_operation_t* operation,
                                   const keymaster_key_param_set_t& begin_params, trace_site at) {
   const keymaster_key_param_t* mac_length = get_unique(begin_params, KM_TAG_MAC_LENGTH);
   if (mac_length == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_MAC_LENGTH");
+    trace_error(at, "No or too many KM_TAG_MAC_LENGTH");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   operation->mac_bits = mac_length->integer;
   if (operation->mac_bits > MAX_MAC_BITS || operation->mac_bits % 8 != 0) {
-    trace(TEE_TRACE_ERROR, at, "Unsupported mac length %d", static_cast<int>(operation->mac_bits));
+    trace_error(at, "Unsupported mac length %d", static_cast<int>(operation->mac_bits));
     return KM_ERROR_UNSUPPORTED_MAC_LENGTH;
   }
   return KM_ERROR_OK;
@@ -63,7 +63,7 @@ keymaster_error_t read_request(aes_encrypt_operation_t* operation,
                                const keymaster_key_param_set_t& begin_params, trace_site at) {
   uint32_t block_mode = 0;
   if (!aes_block_mode(begin_params, &block_mode)) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_BLOCK_MODE");
+    trace_error(at, "No or too many KM_TAG_BLOCK_MODE");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   aes_padding(begin_params, &operation->padding);
@@ -112,7 +112,7 @@ TEE_Result start_stream(aes_encrypt_operation_t* operation,
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   if (TEE_Result res = init_platform(operation, nonce, at)) return res;
   if (!nonce.empty() && !add_blob(out_params, KM_TAG_NONCE, nonce)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return TEE_SUCCESS;
@@ -185,7 +185,7 @@ TEE_Result aes_feed(aes_encrypt_operation_t* operation, byte_view input, byte_sp
   const TEE_Result res = TEE_CipherUpdate(operation->main.get(), input.data(),
                                           static_cast<tee_size>(input.size()), room.data(), &size);
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "CipherUpdate failed with 0x%08x\n", res);
+    trace_error(at, "CipherUpdate failed with 0x%08x\n", res);
     return res;
   }
   *produced += size;
@@ -197,12 +197,11 @@ TEE_Result aes_end_cipher(const aes_encrypt_operation_t& operation, keymaster_er
   tee_size made = 0;
   const TEE_Result res = TEE_CipherDoFinal(operation.main.get(), nullptr, 0, nullptr, &made);
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "CipherDoFinal failed with 0x%08x\n", res);
+    trace_error(at, "CipherDoFinal failed with 0x%08x\n", res);
     return res;
   }
   if (made != 0) {
-    trace(TEE_TRACE_ERROR, at, "CipherDoFinal make output %dB, expected %dB",
-          static_cast<int>(made), 0);
+    trace_error(at, "CipherDoFinal make output %dB, expected %dB", static_cast<int>(made), 0);
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;

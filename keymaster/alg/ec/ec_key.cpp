@@ -30,7 +30,7 @@ constexpr size_t PUBLIC_NUMBER_COUNT = 2;
 keymaster_error_t choose_curve(uint32_t key_bits, const ec_curve_t** curve, trace_site at) {
   *curve = find_ec_curve(key_bits);
   if (*curve != nullptr && (*curve)->km_curve != NO_EC_CURVE) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Invalid EC key size %d", static_cast<int>(key_bits));
+  trace_error(at, "Invalid EC key size %d", static_cast<int>(key_bits));
   return KM_ERROR_UNSUPPORTED_KEY_SIZE;
 }
 
@@ -40,11 +40,11 @@ keymaster_error_t add_own_tags(keymaster_key_param_set_t* description, uint32_t 
                                const ec_curve_t& curve, trace_site at) {
   if (auto error = add_provenance(description, origin, creation_time::ADDED, at)) return error;
   if (contains_tag(*description, KM_TAG_EC_CURVE)) {
-    trace(TEE_TRACE_ERROR, at, "Shouldn't specify KM_TAG_EC_CURVE");
+    trace_error(at, "Shouldn't specify KM_TAG_EC_CURVE");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   if (!add_integer(description, KM_TAG_EC_CURVE, curve.km_curve)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;

@@ -35,7 +35,7 @@ TEE_Result load(ec_operation_t* operation, byte_view key_material, keymaster_err
   uint32_t key_bits = 0;
   const TEE_Result res = ec_resolve_key_data(key_material, &operation->key, &key_bits, km_error);
   if (failed(res, *km_error)) {
-    trace(TEE_TRACE_ERROR, at, "Resolve key data failed");
+    trace_error(at, "Resolve key data failed");
     return res;
   }
   operation->curve = find_ec_curve(key_bits);
@@ -45,7 +45,7 @@ TEE_Result load(ec_operation_t* operation, byte_view key_material, keymaster_err
 keymaster_error_t read_digest(const keymaster_key_param_set_t& begin_params, uint32_t* digest,
                               trace_site at) {
   if (!requested_digest(begin_params, digest)) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_DIGEST");
+    trace_error(at, "No or too many KM_TAG_DIGEST");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   if (*digest == KM_DIGEST_MD5) return KM_ERROR_INCOMPATIBLE_DIGEST;
@@ -63,7 +63,7 @@ TEE_Result prepare_message(ec_operation_t* operation, const keymaster_key_param_
     if (TEE_Result res = message.start_hash(at)) return res;
   }
   if (!message.buffer.allocate(hashes ? MAX_DIGEST_SIZE : operation->curve->size())) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return TEE_SUCCESS;
@@ -153,13 +153,13 @@ keymaster_error_t decode(byte_view signature, heap_buffer* raw, const ec_curve_t
                          trace_site at) {
   heap_buffer der;
   if (!der.copy_of(signature) || !raw->allocate(2 * curve.size())) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   const byte_span r = raw->span().first(curve.size());
   const byte_span s = raw->span().subspan(curve.size());
   if (TEE_Result res = der_decode_ec_signature(der.view(), r, s)) {
-    trace(TEE_TRACE_ERROR, at, "Decode signature failed, 0x%08x", res);
+    trace_error(at, "Decode signature failed, 0x%08x", res);
     return KM_ERROR_VERIFICATION_FAILED;
   }
   return KM_ERROR_OK;

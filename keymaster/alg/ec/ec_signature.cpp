@@ -75,11 +75,11 @@ bool read_header(input_cursor* in, uint8_t tag, uint32_t* length, trace_site at)
   uint8_t found = 0;
   const bool is_there = read_byte(in, &found);
   if (!is_there || found != tag) {
-    trace(TEE_TRACE_ERROR, at, "Wrong tag, expect 0x%02x, got 0x%02x", tag, found);
+    trace_error(at, "Wrong tag, expect 0x%02x, got 0x%02x", tag, found);
     return false;
   }
   if (!decode_length(in, length)) {
-    trace(TEE_TRACE_ERROR, at, "Decode length failed");
+    trace_error(at, "Decode length failed");
     return false;
   }
   return true;
@@ -92,14 +92,14 @@ bool read_integer(input_cursor* in, byte_span number, char name, trace_site at) 
   const size_t available = in->left();
   byte_view content;
   if (!in->read_bytes(length, &content)) {
-    trace(TEE_TRACE_ERROR, at, "Wrong length of integer, %dB available, got %dB",
-          static_cast<int>(available), static_cast<int>(length));
+    trace_error(at, "Wrong length of integer, %dB available, got %dB", static_cast<int>(available),
+                static_cast<int>(length));
     return false;
   }
   if (!content.empty() && content.front() == 0) content = content.subspan(1);
   if (content.size() > number.size()) {
-    trace(TEE_TRACE_ERROR, at, "Wrong length of %c, expect max %dB, got %dB", name,
-          static_cast<int>(number.size()), static_cast<int>(content.size()));
+    trace_error(at, "Wrong length of %c, expect max %dB, got %dB", name,
+                static_cast<int>(number.size()), static_cast<int>(content.size()));
     return false;
   }
   copy_bytes(number, content);
@@ -112,11 +112,11 @@ TEE_Result check_canonical(byte_view der, byte_view r, byte_view s, trace_site a
   heap_buffer encoded;
   if (TEE_Result res = der_encode_ec_signature(r, s, &encoded)) return res;
   if (encoded.size() != der.size()) {
-    trace(TEE_TRACE_ERROR, at, "Encoding size mismatch");
+    trace_error(at, "Encoding size mismatch");
     return TEE_ERROR_GENERIC;
   }
   if (!std::ranges::equal(encoded.view(), der)) {
-    trace(TEE_TRACE_ERROR, at, "Encoding mismatch");
+    trace_error(at, "Encoding mismatch");
     return TEE_ERROR_GENERIC;
   }
   return TEE_SUCCESS;

@@ -26,7 +26,7 @@ constexpr hmac_hash_t HASHES[] = {
 
 keymaster_error_t check_key_size(uint32_t key_bits, trace_site at) {
   if (key_bits != 0 && key_bits <= MAX_KEY_BITS && key_bits % 8 == 0) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Invalid hmac key size %d", static_cast<int>(key_bits));
+  trace_error(at, "Invalid hmac key size %d", static_cast<int>(key_bits));
   return KM_ERROR_UNSUPPORTED_KEY_SIZE;
 }
 
@@ -35,7 +35,7 @@ keymaster_error_t check_mac_and_digest(const keymaster_key_param_set_t& descript
                                        const hmac_hash_t** hash, trace_site at) {
   const auto* min_mac = get_unique(description, KM_TAG_MIN_MAC_LENGTH);
   if (min_mac == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_MIN_MAC_LENGTH or specified");
+    trace_error(at, "No or too many KM_TAG_MIN_MAC_LENGTH or specified");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   if (auto error = check_min_mac_bits(min_mac->integer, MIN_MIN_MAC_BITS, UINT32_MAX, at)) {
@@ -43,7 +43,7 @@ keymaster_error_t check_mac_and_digest(const keymaster_key_param_set_t& descript
   }
   const auto* digest = get_unique(description, KM_TAG_DIGEST);
   if (digest == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_DIGEST");
+    trace_error(at, "No or too many KM_TAG_DIGEST");
     return KM_ERROR_UNSUPPORTED_DIGEST;
   }
   *hash = hmac_hash_of_digest(digest->enumerated);

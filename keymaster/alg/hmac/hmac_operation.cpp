@@ -34,21 +34,21 @@ TEE_Result prepare(hmac_operation_t* operation, byte_view key_material,
   hmac_key_t key;
   const TEE_Result resolved = hmac_resolve_key_data(key_material, &key, km_error);
   if (failed(resolved, *km_error)) {
-    trace(TEE_TRACE_ERROR, at, "Resolve key data failed");
+    trace_error(at, "Resolve key data failed");
     return resolved;
   }
   operation->key = std::move(key.object);
   operation->key_bits = key.key_bits;
   const auto* mac_length = get_unique(begin_params, KM_TAG_MAC_LENGTH);
   if (mac_length == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_MAC_LENGTH");
+    trace_error(at, "No or too many KM_TAG_MAC_LENGTH");
     *km_error = KM_ERROR_INVALID_ARGUMENT;
     return TEE_SUCCESS;
   }
   operation->mac_bits = mac_length->integer;
   const hmac_hash_t* hash = hmac_hash_of_type(key.object_type);
   if (hash == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Unsupported key type");
+    trace_error(at, "Unsupported key type");
     *km_error = KM_ERROR_INVALID_KEY_BLOB;
     return TEE_SUCCESS;
   }

@@ -15,7 +15,7 @@ keymaster_error_t padding_overhead(const rsa_operation_t& operation, size_t* ove
   if (operation.padding != KM_PAD_RSA_OAEP) return KM_ERROR_OK;
   const digest_t* digest = find_digest(operation.message.digest);
   if (digest == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "Unknown digest %d", static_cast<int>(operation.message.digest));
+    trace_error(at, "Unknown digest %d", static_cast<int>(operation.message.digest));
     return KM_ERROR_INCOMPATIBLE_DIGEST;
   }
   *overhead = 2 * digest->size + 2;
@@ -27,8 +27,8 @@ keymaster_error_t check_message_length(const rsa_operation_t& operation, trace_s
   if (auto error = padding_overhead(operation, &overhead, at)) return error;
   if (operation.message.length + overhead <= operation.key_size()) return KM_ERROR_OK;
   const int longest = static_cast<int>(operation.key_size()) - static_cast<int>(overhead);
-  trace(TEE_TRACE_ERROR, at, "Message too long, max %dB, got %dB", longest,
-        static_cast<int>(operation.message.length));
+  trace_error(at, "Message too long, max %dB, got %dB", longest,
+              static_cast<int>(operation.message.length));
   return KM_ERROR_INVALID_INPUT_LENGTH;
 }
 

@@ -27,7 +27,7 @@ constexpr size_t PUBLIC_EXPONENT = 1;
 
 keymaster_error_t check_key_size(uint32_t key_bits, trace_site at) {
   if (key_bits % 8 == 0 && key_bits <= MAX_KEY_BITS) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Invalid RSA key size %d", static_cast<int>(key_bits));
+  trace_error(at, "Invalid RSA key size %d", static_cast<int>(key_bits));
   return KM_ERROR_UNSUPPORTED_KEY_SIZE;
 }
 
@@ -38,7 +38,7 @@ keymaster_error_t check_generate(keymaster_key_param_set_t* description, uint64_
   }
   const auto* given = get_unique(*description, KM_TAG_RSA_PUBLIC_EXPONENT);
   if (given == nullptr) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified");
+    trace_error(at, "No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   *exponent = given->long_integer;
@@ -61,12 +61,12 @@ keymaster_error_t settle_exponent(keymaster_key_param_set_t* description, byte_v
   const bool fits = given != nullptr ? ends_with(given->long_integer, field)
                                      : significant.size() <= EXPONENT_SIZE;
   if (!fits) {
-    trace(TEE_TRACE_ERROR, at, "Public exponent mismatch");
+    trace_error(at, "Public exponent mismatch");
     return KM_ERROR_IMPORT_PARAMETER_MISMATCH;
   }
   if (given == nullptr &&
       !add_long(description, KM_TAG_RSA_PUBLIC_EXPONENT, load_u64_big_endian(significant))) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;
@@ -94,18 +94,18 @@ TEE_Result export_public_key(const tee_object& key, byte_span output, size_t* pr
   tee_operation operation;
   operation.reset(handle);
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "TEE_AllocateOperation failed: %08x\n", res);
+    trace_error(at, "TEE_AllocateOperation failed: %08x\n", res);
     return res;
   }
   res = TEE_SetOperationKey(operation.get(), key.get());
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "TEE_SetOperationKey failed: %08x\n", res);
+    trace_error(at, "TEE_SetOperationKey failed: %08x\n", res);
     return res;
   }
   auto size = static_cast<tee_size>(output.size());
   res = TEE_AsymmetricExport(operation.get(), TEE_EXPORT_FORMAT_SPKI, output.data(), &size);
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "TEE_AsymmetricExport failed: %08x\n", res);
+    trace_error(at, "TEE_AsymmetricExport failed: %08x\n", res);
     return res;
   }
   *produced = size;

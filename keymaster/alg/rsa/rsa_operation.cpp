@@ -38,11 +38,11 @@ constexpr rsa_choice_t ENCRYPTION_CHOICES[] = {
 
 keymaster_error_t load(rsa_operation_t* operation, byte_view key_material, trace_site at) {
   if (rsa_resolve_key_data(key_material, &operation->key, &operation->key_bits) != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "Resolve key data failed");
+    trace_error(at, "Resolve key data failed");
     return KM_ERROR_UNKNOWN_ERROR;
   }
   if (!operation->message.buffer.allocate(operation->key_bits / 8)) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;
@@ -51,11 +51,11 @@ keymaster_error_t load(rsa_operation_t* operation, byte_view key_material, trace
 keymaster_error_t read_request(rsa_operation_t* operation, bool is_signature,
                                const keymaster_key_param_set_t& begin_params, trace_site at) {
   if (!requested_padding(begin_params, &operation->padding)) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_PADDING");
+    trace_error(at, "No or too many KM_TAG_PADDING");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   if (!requested_digest(begin_params, &operation->message.digest) && is_signature) {
-    trace(TEE_TRACE_ERROR, at, "No or too many KM_TAG_DIGEST");
+    trace_error(at, "No or too many KM_TAG_DIGEST");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   return KM_ERROR_OK;
@@ -75,8 +75,8 @@ keymaster_error_t check_pss_fits(const rsa_operation_t& operation, trace_site at
   if (operation.padding != KM_PAD_RSA_PSS) return KM_ERROR_OK;
   const size_t needed = find_digest(operation.message.digest)->size + PSS_OVERHEAD;
   if (needed <= operation.key_size()) return KM_ERROR_OK;
-  trace(TEE_TRACE_ERROR, at, "Too short key to fit digest, flag and salt, key_size %d, need %d",
-        static_cast<int>(operation.key_bits), static_cast<int>(needed * 8));
+  trace_error(at, "Too short key to fit digest, flag and salt, key_size %d, need %d",
+              static_cast<int>(operation.key_bits), static_cast<int>(needed * 8));
   return KM_ERROR_INCOMPATIBLE_DIGEST;
 }
 
@@ -178,8 +178,8 @@ TEE_Result rsa_keep(rsa_operation_t* operation, byte_view input, size_t reserved
                     trace_site at) {
   const uint64_t total = uint64_t{operation->message.length} + input.size();
   if (total + reserved > operation->key_size()) {
-    trace(TEE_TRACE_ERROR, at, "Input too long to %s, key_size %d, input %dB", purpose,
-          static_cast<int>(operation->key_bits), static_cast<int>(total));
+    trace_error(at, "Input too long to %s, key_size %d, input %dB", purpose,
+                static_cast<int>(operation->key_bits), static_cast<int>(total));
     *consumed = 0;
     *km_error = KM_ERROR_INVALID_INPUT_LENGTH;
     return TEE_SUCCESS;
@@ -218,7 +218,7 @@ TEE_Result rsa_crypt(rsa_call call, const rsa_operation_t& operation, byte_view 
                      trace_site at) {
   *produced = 0;
   if (!result->allocate(operation.key_size())) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
@@ -235,7 +235,7 @@ TEE_Result rsa_settle_crypt(TEE_Result res, const char* failure, keymaster_error
     *km_error = KM_ERROR_INVALID_ARGUMENT;
     return TEE_SUCCESS;
   }
-  if (res != TEE_SUCCESS) trace(TEE_TRACE_ERROR, at, "%s 0x%08x", failure, res);
+  if (res != TEE_SUCCESS) trace_error(at, "%s 0x%08x", failure, res);
   return res;
 }
 

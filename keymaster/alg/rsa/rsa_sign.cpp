@@ -16,10 +16,10 @@ TEE_Result start_soter(rsa_sign_operation_t* operation, keymaster_error_t* km_er
                        trace_site at) {
   trace(TEE_TRACE_DEBUG, at, "sign from soter, allocate raw message buffer");
   if (TEE_Result res = soter_check_resources()) {
-    trace(TEE_TRACE_ERROR, at, "soter resources is not ready, error 0x%x\n", res);
+    trace_error(at, "soter resources is not ready, error 0x%x\n", res);
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   } else if (!operation->soter_message.allocate(FIRST_SOTER_CAPACITY)) {
-    trace(TEE_TRACE_ERROR, at, "No memory for soter");
+    trace_error(at, "No memory for soter");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return TEE_SUCCESS;
@@ -32,7 +32,7 @@ keymaster_error_t expand_soter_message(rsa_sign_operation_t* operation, uint64_t
   const uint64_t capacity = std::max(needed, 2 * uint64_t{held.size()});
   heap_buffer larger;
   if (capacity > UINT32_MAX || !larger.allocate(static_cast<size_t>(capacity))) {
-    trace(TEE_TRACE_ERROR, at, "no memory to expand soter buf %u", static_cast<unsigned>(capacity));
+    trace_error(at, "no memory to expand soter buf %u", static_cast<unsigned>(capacity));
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   copy_bytes(larger.span(), held.view().first(operation->soter_length));
@@ -63,7 +63,7 @@ TEE_Result finish_soter(rsa_sign_operation_t* operation, heap_buffer* output,
   const byte_view message = operation->soter_message.view().first(operation->soter_length);
   if (TEE_Result res =
           soter_enhance_sign_finish(operation, operation->key_characteristics, message, output)) {
-    trace(TEE_TRACE_ERROR, at, "soter enhance error %x", res);
+    trace_error(at, "soter enhance error %x", res);
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;
@@ -79,7 +79,7 @@ TEE_Result sign_hashed(rsa_sign_operation_t* operation, heap_buffer* signature,
                        keymaster_error_t* km_error, trace_site at) {
   if (TEE_Result res = operation->message.finish_hash(at)) return res;
   if (!signature->allocate(operation->key_size())) {
-    trace(TEE_TRACE_ERROR, at, "Out of memory");
+    trace_error(at, "Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }

@@ -29,7 +29,7 @@ TEE_Result verify_raw(rsa_verify_operation_t* operation, byte_view signature,
   const TEE_Result res =
       rsa_crypt(TEE_AsymmetricEncrypt, *operation, signature, &found, &size, km_error, at);
   if (res != TEE_SUCCESS) {
-    trace(TEE_TRACE_ERROR, at, "AsymmetricEncrypt failed with 0x%08x\n", res);
+    trace_error(at, "AsymmetricEncrypt failed with 0x%08x\n", res);
     return res;
   }
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
