@@ -8,6 +8,7 @@
 #include <array>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <utility>
 #include <vector>
 
@@ -36,7 +37,7 @@ struct handle_traits<operation> {
   static constexpr uint32_t KIND = 2;
 };
 template <>
-struct handle_traits<ta_session> {
+struct handle_traits<std::shared_ptr<ta_session>> {
   using type = TEE_TASessionHandle;
   static constexpr const char* NAME = "session";
   static constexpr uint32_t KIND = 3;
@@ -55,75 +56,72 @@ class handle_table {
   using handle = typename traits::type;
   static constexpr uint32_t SLOTS = 1024;
 
-  // insert: takes ownership; null when the table is full, and then the value is destroyed.
-  handle insert(std::shared_ptr<T> value) {
-    uint32_t slot = 0;
-    if (!free_.empty()) {
-      slot = free_.back();
-      free_.pop_back();
-    } else if (slots_.size() < SLOTS) {
-      slot = static_cast<uint32_t>(slots_.size());
-      slots_.emplace_back();
-      free_.reserve(slots_.size());  // so that remove() needs no memory
-    } else {
-      return nullptr;
-    }
-    slots_[slot] = {next_handle_generation(), std::move(value)};
+  // emplace: makes a value of the arguments, in a place that it keeps; null when the table is full.
+  template <typename... Arguments>
+  handle emplace(Arguments&&... arguments) {
+    if (free_.empty() && !grow()) return nullptr;
+    const uint32_t slot = free_.back();
+    slots_[slot]->value.emplace(std::forward<Arguments>(arguments)...);
+    slots_[slot]->generation = next_handle_generation();
+    free_.pop_back();
     return to_handle(slot);
   }
 
   // find: what the handle stands for; null when it is not a live handle of this table.
-  const std::shared_ptr<T>* find(handle value) const {
-    auto number = reinterpret_cast<uintptr_t>(value);
-    size_t slot = number & (SLOTS - 1);
-    bool live = slot < slots_.size() && slots_[slot].value && to_handle(slot) == value;
-    return live ? &slots_[slot].value : nullptr;
+  T* find(handle value) const {
+    const size_t slot = slot_of(value);
+    const bool live = slot < slots_.size() && slots_[slot]->value && to_handle(slot) == value;
+    return live ? &*slots_[slot]->value : nullptr;
   }
 
   // get: likewise; panics in the name of `call` when it is not a live handle of this table.
   T& get(handle value, const char* call) const {
-    const std::shared_ptr<T>* found = find(value);
+    T* found = find(value);
     if (!found) panic(call, "%s handle %p is not valid", traits::NAME, static_cast<void*>(value));
-    return **found;
+    return *found;
   }
 
-  // remove: forgets the handle and returns what it stood for; panics like get.
-  std::shared_ptr<T> remove(handle value, const char* call) {
+  // remove: ends the value and its handle; panics like get.
+  void remove(handle value, const char* call) {
     get(value, call);
-    size_t slot = reinterpret_cast<uintptr_t>(value) & (SLOTS - 1);
-    free_.push_back(static_cast<uint32_t>(slot));
-    return std::exchange(slots_[slot].value, nullptr);
+    slots_[slot_of(value)]->value.reset();
+    free_.push_back(static_cast<uint32_t>(slot_of(value)));
   }
 
   size_t size() const { return slots_.size() - free_.size(); }
-
-  // clear: forgets all handles.
-  void clear() {
-    slots_.clear();
-    free_.clear();
-  }
 
   // for_each: visit(handle, T&) for every live handle.
   template <typename Visit>
   void for_each(Visit&& visit) const {
     for (size_t slot = 0; slot < slots_.size(); ++slot) {
-      if (slots_[slot].value) visit(to_handle(slot), *slots_[slot].value);
+      if (slots_[slot]->value) visit(to_handle(slot), *slots_[slot]->value);
     }
   }
 
  private:
   struct slot_record {
     uint32_t generation = 0;
-    std::shared_ptr<T> value;
+    std::optional<T> value;
   };
 
+  // Adds a free slot, unless the table is full.
+  bool grow() {
+    if (slots_.size() == SLOTS) return false;
+    free_.reserve(slots_.size() + 1);  // so that remove() needs no memory
+    slots_.push_back(std::make_unique<slot_record>());
+    free_.push_back(static_cast<uint32_t>(slots_.size() - 1));
+    return true;
+  }
+
+  static size_t slot_of(handle value) { return reinterpret_cast<uintptr_t>(value) & (SLOTS - 1); }
+
   handle to_handle(size_t slot) const {
-    uintptr_t number = (uintptr_t{traits::KIND} << 29) |
-                       (uintptr_t{slots_[slot].generation} << 10) | uintptr_t{slot};
+    const uintptr_t number = (uintptr_t{traits::KIND} << 29) |
+                             (uintptr_t{slots_[slot]->generation} << 10) | uintptr_t{slot};
     return reinterpret_cast<handle>(number);
   }
 
-  std::vector<slot_record> slots_;
+  std::vector<std::unique_ptr<slot_record>> slots_;  // values stay in place while the table grows
   std::vector<uint32_t> free_;
 };
 

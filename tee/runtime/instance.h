@@ -13,6 +13,8 @@
 #include "tee/runtime/handles.h"
 #include "tee/runtime/heap.h"
 #include "tee/runtime/host_control.h"
+#include "tee/runtime/object.h"
+#include "tee/runtime/operation.h"
 #include "tee/runtime/properties.h"
 
 namespace tee {
@@ -30,7 +32,7 @@ class instance {
   heap& memory() { return memory_; }
   handle_table<object>& objects() { return objects_; }
   handle_table<operation>& operations() { return operations_; }
-  handle_table<ta_session>& sessions() { return sessions_; }
+  handle_table<std::shared_ptr<ta_session>>& sessions() { return sessions_; }
   crypto::key_cache& keys() { return keys_; }
 
   // client: who called the entry point that runs; null in create and destroy. set_client copies.
@@ -51,7 +53,7 @@ class instance {
   crypto::key_cache keys_;
   handle_table<object> objects_;
   handle_table<operation> operations_;
-  handle_table<ta_session> sessions_;
+  handle_table<std::shared_ptr<ta_session>> sessions_;
   std::optional<TEE_Identity> client_;
   property_map properties_;
 };

@@ -20,9 +20,9 @@ struct object {
   uint32_t usage = ALL_USAGES;  // TEE_USAGE_ bits
   // The key, shared with the operations that were given it; null while the object is uninitialised
   // and in pure data objects.
-  std::shared_ptr<crypto::key> key;
+  crypto::key_ptr key{};
   // Null for transient objects. Shared ownership so that only its makers need the definition.
-  std::shared_ptr<persistent_stream> stream;
+  std::shared_ptr<persistent_stream> stream{};
 
   bool persistent() const { return stream != nullptr; }
   bool initialized() const { return key || stream; }

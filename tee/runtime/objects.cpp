@@ -104,10 +104,7 @@ TEE_Result TEE_AllocateTransientObject(uint32_t objectType, uint32_t maxObjectSi
     if (TEE_Result fault = fault_point()) return fault;
     const key_type* type = find_key_type(objectType);
     if (!type || !type->allows(maxObjectSize)) return TEE_ERROR_NOT_SUPPORTED;
-    auto made = std::make_shared<tee::object>();
-    made->type = objectType;
-    made->max_bits = maxObjectSize;
-    *object = running.objects().insert(std::move(made));
+    *object = running.objects().emplace(tee::object{objectType, maxObjectSize});
     return *object ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
   });
 }

@@ -133,9 +133,9 @@ TEE_Result TEE_AllocateOperation(TEE_OperationHandle* operation, uint32_t algori
     if (!row || !row->allows(mode) || !size_fits(*row, mode, maxKeySize)) {
       return TEE_ERROR_NOT_SUPPORTED;
     }
-    auto made = std::make_shared<tee::operation>(tee::operation{*row, mode, maxKeySize});
-    if (row->kind == family::DIGEST) start_engine(made.get());
-    *operation = running.operations().insert(std::move(made));
+    tee::operation made{*row, mode, maxKeySize};
+    if (row->kind == family::DIGEST) start_engine(&made);
+    *operation = running.operations().emplace(std::move(made));
     return *operation ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
   });
 }

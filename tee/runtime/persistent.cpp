@@ -77,13 +77,13 @@ stored_object content_of(const char* call, TEE_ObjectHandle attributes, const vo
 template <typename Open>
 TEE_Result open_with_handle(const char* call, TEE_ObjectHandle* handle, Open open) {
   auto& objects = tee::current_instance(call).objects();
-  auto opened = std::make_shared<object>();
-  TEE_ObjectHandle made = objects.insert(opened);
+  TEE_ObjectHandle made = objects.emplace();
   if (made == TEE_HANDLE_NULL) return TEE_ERROR_OUT_OF_MEMORY;
+  object& opened = objects.get(made, call);
   TEE_Result res = TEE_ERROR_OUT_OF_MEMORY;
   try {
-    res = open(&opened->stream);
-    if (res == TEE_SUCCESS) res = take_attributes(call, opened->stream->attributes(), opened.get());
+    res = open(&opened.stream);
+    if (res == TEE_SUCCESS) res = take_attributes(call, opened.stream->attributes(), &opened);
   } catch (const std::bad_alloc&) {  // and the result says so
   }
   if (res != TEE_SUCCESS) {
@@ -136,9 +136,11 @@ TEE_Result TEE_CloseAndDeletePersistentObject1(TEE_ObjectHandle object) {
   return guarded(CALL, [&]() -> TEE_Result {
     if (object == TEE_HANDLE_NULL) return TEE_SUCCESS;
     stream_of(CALL, object, TEE_DATA_FLAG_ACCESS_WRITE_META);
-    auto closed = tee::current_instance(CALL).objects().remove(object, CALL);
+    auto& objects = tee::current_instance(CALL).objects();
+    const auto stream = objects.get(object, CALL).stream;  // the handle ends first
+    objects.remove(object, CALL);
     if (TEE_Result res = fault_point()) return res;
-    return closed->stream->remove() == TEE_SUCCESS ? TEE_SUCCESS : TEE_ERROR_STORAGE_NOT_AVAILABLE;
+    return stream->remove() == TEE_SUCCESS ? TEE_SUCCESS : TEE_ERROR_STORAGE_NOT_AVAILABLE;
   });
 }
 

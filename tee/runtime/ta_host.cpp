@@ -92,9 +92,10 @@ void ta_host::end_sessions_with(const ta_instance& target) {
   auto others = instances_;
   lock.unlock();
   for (auto& [uuid, other] : others) {
-    other->core().sessions().for_each([&](TEE_TASessionHandle, ta_session& session) {
-      if (session.is_with(target)) session.end();
-    });
+    other->core().sessions().for_each(
+        [&](TEE_TASessionHandle, const std::shared_ptr<ta_session>& session) {
+          if (session->is_with(target)) session->end();
+        });
   }
 }
 

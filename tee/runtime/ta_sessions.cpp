@@ -44,7 +44,7 @@ TEE_Result open_session(const char* call, const TEE_UUID& destination, uint32_t 
   std::shared_ptr<ta_session> session;
   TEE_Result res = ta_session::open(*host, destination, client, types, params, &session, origin);
   if (res != TEE_SUCCESS) return res;
-  *handle = caller.sessions().insert(std::move(session));
+  *handle = caller.sessions().emplace(std::move(session));
   if (*handle != TEE_HANDLE_NULL) return TEE_SUCCESS;
   *origin = TEE_ORIGIN_TEE;
   return TEE_ERROR_OUT_OF_MEMORY;
@@ -71,7 +71,7 @@ TEE_Result TEE_InvokeTACommand(TEE_TASessionHandle session, uint32_t /*cancellat
                                uint32_t* returnOrigin) {
   constexpr const char* CALL = "TEE_InvokeTACommand";
   return guarded(CALL, [&]() -> TEE_Result {
-    ta_session& target = tee::current_instance(CALL).sessions().get(session, CALL);
+    ta_session& target = *tee::current_instance(CALL).sessions().get(session, CALL);
     return call_out(CALL, paramTypes, params, returnOrigin, [&](TEE_Param* own, uint32_t* origin) {
       return target.invoke(commandID, paramTypes, own, origin);
     });
