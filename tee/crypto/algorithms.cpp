@@ -117,6 +117,7 @@ constexpr std::array RSA_PAIR{attribute_rule{TEE_ATTR_RSA_MODULUS, MANDATORY},
                               attribute_rule{TEE_ATTR_RSA_EXPONENT1, OPTIONAL},
                               attribute_rule{TEE_ATTR_RSA_EXPONENT2, OPTIONAL},
                               attribute_rule{TEE_ATTR_RSA_COEFFICIENT, OPTIONAL}};
+static_assert(RSA_PAIR.size() == MAX_ATTRIBUTES);
 constexpr std::array EC_PAIR{attribute_rule{TEE_ATTR_ECC_CURVE, MANDATORY},
                              attribute_rule{TEE_ATTR_ECC_PUBLIC_VALUE_X, MANDATORY},
                              attribute_rule{TEE_ATTR_ECC_PUBLIC_VALUE_Y, MANDATORY},
@@ -163,9 +164,11 @@ bool key_type::allows(uint32_t bits) const {
   return bits >= min_bits && bits <= max_bits && (bits - min_bits) % step_bits == 0;
 }
 
-bool key_type::has(uint32_t attribute_id) const {
-  return std::any_of(attributes.begin(), attributes.end(),
-                     [=](const attribute_rule& rule) { return rule.id == attribute_id; });
+size_t key_type::place_of(uint32_t attribute_id) const {
+  size_t place = 0;
+  while (place < attributes.size() && attributes[place].id != attribute_id)
+    ++place;
+  return place;
 }
 
 const key_type* find_key_type(uint32_t id) {

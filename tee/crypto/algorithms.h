@@ -34,6 +34,8 @@ struct algorithm {
 // find_algorithm: the row; null when the platform has no such algorithm.
 const algorithm* find_algorithm(uint32_t id);
 
+constexpr size_t MAX_ATTRIBUTES = 8;  // of any key type
+
 // An attribute that a key type has.
 struct attribute_rule {
   uint32_t id;
@@ -49,7 +51,9 @@ struct key_type {
 
   // allows: whether keys of this size can be made.
   bool allows(uint32_t bits) const;
-  bool has(uint32_t attribute_id) const;
+  // place_of: where in `attributes` it is; their number when it does not belong here.
+  size_t place_of(uint32_t attribute_id) const;
+  bool has(uint32_t attribute_id) const { return place_of(attribute_id) < attributes.size(); }
   bool symmetric() const { return attributes.size() == 1; }
 };
 

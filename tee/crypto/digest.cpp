@@ -11,13 +11,20 @@ digest::digest(hash which) : length_(length_of(which)), context_(EVP_MD_CTX_new(
 }
 
 void digest::update(std::span<const uint8_t> bytes) {
+  if (ended_) restart();
   must(EVP_DigestUpdate(context_.get(), bytes.data(), bytes.size()) == 1, "EVP_DigestUpdate");
 }
 
 void digest::finish(uint8_t* result) {
-  must(EVP_DigestFinal_ex(context_.get(), result, nullptr) == 1 &&
-           EVP_DigestInit_ex2(context_.get(), nullptr, nullptr) == 1,
-       "EVP_DigestFinal_ex");
+  if (ended_) restart();
+  must(EVP_DigestFinal_ex(context_.get(), result, nullptr) == 1, "EVP_DigestFinal_ex");
+  ended_ = true;
+}
+
+// Not at once in finish: most operations compute one digest and no more.
+void digest::restart() {
+  must(EVP_DigestInit_ex2(context_.get(), nullptr, nullptr) == 1, "EVP_DigestInit_ex2");
+  ended_ = false;
 }
 
 }  // namespace tee::crypto

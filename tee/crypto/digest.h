@@ -16,11 +16,14 @@ class digest {
   size_t length() const { return length_; }  // of the result, in bytes
   void update(std::span<const uint8_t> bytes);
 
-  // finish: writes length() bytes and starts afresh.
+  // finish: writes length() bytes; what follows is a new message.
   void finish(uint8_t* result);
 
  private:
+  void restart();
+
   size_t length_;
+  bool ended_ = false;  // the context holds a finished message
   md_ctx_ptr context_;
 };
 

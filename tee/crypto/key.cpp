@@ -32,11 +32,6 @@ TEE_Result generate_symmetric(const key_type& type, uint32_t bits,
   return TEE_SUCCESS;
 }
 
-size_t times_given(std::span<const attribute_view> attributes, uint32_t id) {
-  return static_cast<size_t>(std::count_if(attributes.begin(), attributes.end(),
-                                           [=](const attribute_view& a) { return a.id == id; }));
-}
-
 template <typename List>
 auto find_in(const List& attributes, uint32_t id) {
   auto found =
@@ -54,40 +49,22 @@ const attribute_view* find_attribute(std::span<const attribute_view> attributes,
   return find_in(attributes, id);
 }
 
-std::vector<attribute_view> views_of(std::span<const attribute> attributes) {
-  std::vector<attribute_view> views;
-  views.reserve(attributes.size());
-  for (const attribute& held : attributes)
-    views.push_back({held.id, held.bytes, held.a, held.b});
-  return views;
-}
-
-const char* broken_rule(uint32_t type, std::span<const attribute_view> attributes) {
-  const key_type& row = *find_key_type(type);
-  for (const attribute_view& given : attributes) {
-    if (!row.has(given.id)) return "an attribute does not belong to the object's type";
-    if (times_given(attributes, given.id) > 1) return "an attribute is given twice";
-  }
-  for (const attribute_rule& rule : row.attributes) {
-    if (rule.presence == attribute_rule::MANDATORY && times_given(attributes, rule.id) == 0) {
-      return "a mandatory attribute is missing";
-    }
-  }
+const char* attribute_list::add(const attribute_view& given) {
+  const size_t place = type_.place_of(given.id);
+  if (place == type_.attributes.size()) return "an attribute does not belong to the object's type";
+  if (given_[place]) return "an attribute is given twice";
+  given_[place] = true;
+  views_[place] = given;
   return nullptr;
 }
 
-std::vector<attribute_view> in_table_order(uint32_t type,
-                                           std::span<const attribute_view> attributes) {
-  std::vector<attribute_view> ordered;
-  ordered.reserve(attributes.size());
-  for (const attribute_rule& rule : find_key_type(type)->attributes) {
-    for (const attribute_view& given : attributes) {
-      if (given.id != rule.id) continue;
-      bool absent = rule.presence == attribute_rule::OPTIONAL && given.bytes.empty();
-      if (!absent) ordered.push_back(given);
-    }
+const char* attribute_list::complete() {
+  for (size_t place = 0; place < type_.attributes.size(); ++place) {
+    const bool mandatory = type_.attributes[place].presence == attribute_rule::MANDATORY;
+    if (mandatory && !given_[place]) return "a mandatory attribute is missing";
+    if (mandatory || !views_[place].bytes.empty()) views_[count_++] = views_[place];
   }
-  return ordered;
+  return nullptr;
 }
 
 std::span<const uint8_t> without_leading_zeros(std::span<const uint8_t> number) {
@@ -96,17 +73,17 @@ std::span<const uint8_t> without_leading_zeros(std::span<const uint8_t> number) 
   return number;
 }
 
-TEE_Result load_key(uint32_t type, uint32_t max_bits, std::span<const attribute_view> attributes,
-                    key_ptr* result) {
-  const key_type& row = *find_key_type(type);
-  std::vector<attribute> ordered;
-  for (const attribute_view& given : in_table_order(type, attributes)) {
-    ordered.push_back(
+TEE_Result load_key(const attribute_list& attributes, uint32_t max_bits, key_ptr* result) {
+  const key_type& row = attributes.type();
+  std::vector<attribute> own;
+  own.reserve(attributes.views().size());
+  for (const attribute_view& given : attributes.views()) {
+    own.push_back(
         {given.id, secret_bytes(given.bytes.begin(), given.bytes.end()), given.a, given.b});
   }
-  if (row.symmetric()) return load_symmetric(row, max_bits, std::move(ordered), result);
-  if (row.has(TEE_ATTR_ECC_CURVE)) return load_ec_key(type, max_bits, std::move(ordered), result);
-  return load_rsa_key(type, max_bits, std::move(ordered), result);
+  if (row.symmetric()) return load_symmetric(row, max_bits, std::move(own), result);
+  if (row.has(TEE_ATTR_ECC_CURVE)) return load_ec_key(row.id, max_bits, std::move(own), result);
+  return load_rsa_key(row.id, max_bits, std::move(own), result);
 }
 
 TEE_Result generate_key(uint32_t type, uint32_t bits, std::span<const attribute_view> parameters,

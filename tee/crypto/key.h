@@ -3,11 +3,13 @@
 
 #include "tee_internal_api.h"
 
+#include <array>
 #include <cstdint>
 #include <memory>
 #include <span>
 #include <vector>
 
+#include "tee/crypto/algorithms.h"
 #include "tee/crypto/context_pool.h"
 #include "tee/crypto/openssl.h"
 #include "tee/device/secret_bytes.h"
@@ -31,8 +33,6 @@ struct attribute_view {
   uint32_t a = 0;
   uint32_t b = 0;
 };
-
-std::vector<attribute_view> views_of(std::span<const attribute> attributes);
 
 // A key never changes after it is made; objects and operations share it. Its spare contexts are
 // working memory: those who share a key must not use it at the same time.
@@ -76,24 +76,39 @@ using key_ptr = std::shared_ptr<key>;
 // find_attribute: the first one with this identifier, or null.
 const attribute_view* find_attribute(std::span<const attribute_view> attributes, uint32_t id);
 
-// broken_rule: which rule about the presence of attributes a list breaks for a type that is in the
-// table: a mandatory one missing or given twice, one that does not belong to the type. Null: none.
-// An empty optional attribute counts as absent.
-const char* broken_rule(uint32_t type, std::span<const attribute_view> attributes);
+// The attributes of a key that is to be made: given in any order, held in the order of the type's
+// table.
+class attribute_list {
+ public:
+  // The type must be in the table.
+  explicit attribute_list(const key_type& type) : type_(type) {}
 
-// in_table_order: the attributes in the order of the type's table, the empty optional ones left
-// out.
-std::vector<attribute_view> in_table_order(uint32_t type,
-                                           std::span<const attribute_view> attributes);
+  const key_type& type() const { return type_; }
+
+  // add, complete: null, or the rule that the list breaks: an attribute that does not belong to the
+  // type or is given twice; a mandatory one that is missing. complete() is called once, after the
+  // last add().
+  [[nodiscard]] const char* add(const attribute_view& given);
+  [[nodiscard]] const char* complete();
+
+  // views: what a complete list holds. An empty optional attribute counts as absent.
+  std::span<const attribute_view> views() const { return {views_.data(), count_}; }
+
+ private:
+  const key_type& type_;
+  std::array<attribute_view, MAX_ATTRIBUTES> views_{};  // by place in the table, then moved up
+  std::array<bool, MAX_ATTRIBUTES> given_{};
+  size_t count_ = 0;
+};
 
 // without_leading_zeros: the significant bytes of a big-endian number.
 std::span<const uint8_t> without_leading_zeros(std::span<const uint8_t> number);
 
-// load_key: makes a key of `attributes`, whose list breaks no rule, in any order and with leading
-// zeros or without. TEE_ERROR_BAD_PARAMETERS when the values are wrong or do not fit each other, or
-// when the key is larger than `max_bits`; *result is untouched then.
-[[nodiscard]] TEE_Result load_key(uint32_t type, uint32_t max_bits,
-                                  std::span<const attribute_view> attributes, key_ptr* result);
+// load_key: makes a key of a complete list, whose numbers may have leading zeros.
+// TEE_ERROR_BAD_PARAMETERS when the values are wrong or do not fit each other, or when the key is
+// larger than `max_bits`; *result is untouched then.
+[[nodiscard]] TEE_Result load_key(const attribute_list& attributes, uint32_t max_bits,
+                                  key_ptr* result);
 
 // generate_key: makes a new key of exactly `bits`, a size that the type's table allows.
 // `parameters`: RSA takes an optional public exponent (default 65537), EC needs the curve,

@@ -18,35 +18,33 @@ bool same_bytes(const key_type& type, std::span<const uint8_t> a, std::span<cons
   return a.size() == b.size() && CRYPTO_memcmp(a.data(), b.data(), a.size()) == 0;
 }
 
-// Whether `held` is what load_key would make of `attributes`. Every attribute is looked at, so that
-// the time does not tell how far two keys agree.
-bool same_key(const key& held, const key_type& type, std::span<const attribute_view> attributes) {
-  if (held.type() != type.id || held.attributes().size() != attributes.size()) return false;
+// Whether `held` is what load_key would make of `wanted`. Every attribute is looked at, so that the
+// time does not tell how far two keys agree.
+bool same_key(const key& held, const attribute_list& wanted) {
+  std::span<const attribute_view> views = wanted.views();
+  if (held.type() != wanted.type().id || held.attributes().size() != views.size()) return false;
   bool same = true;
-  for (size_t i = 0; i < attributes.size(); ++i) {
+  for (size_t i = 0; i < views.size(); ++i) {
     const attribute& ours = held.attributes()[i];
-    const attribute_view& given = attributes[i];
-    same &= ours.id == given.id && ours.a == given.a && same_bytes(type, ours.bytes, given.bytes);
+    const attribute_view& given = views[i];
+    same &= ours.id == given.id && ours.a == given.a &&
+            same_bytes(wanted.type(), ours.bytes, given.bytes);
   }
   return same;
 }
 
 }  // namespace
 
-TEE_Result key_cache::load(uint32_t type, uint32_t max_bits,
-                           std::span<const attribute_view> attributes, key_ptr* result) {
-  const key_type& row = *find_key_type(type);
-  std::vector<attribute_view> ordered;
-  if (attributes.size() > 1) attributes = ordered = in_table_order(type, attributes);
+TEE_Result key_cache::load(const attribute_list& attributes, uint32_t max_bits, key_ptr* result) {
   auto found = std::find_if(held_.begin(), held_.end(),
-                            [&](const key_ptr& held) { return same_key(*held, row, attributes); });
+                            [&](const key_ptr& held) { return same_key(*held, attributes); });
   if (found != held_.end()) {
     if ((*found)->bits() > max_bits) return TEE_ERROR_BAD_PARAMETERS;
     std::rotate(held_.begin(), found, found + 1);
     *result = held_.front();
     return TEE_SUCCESS;
   }
-  if (TEE_Result res = load_key(type, max_bits, attributes, result)) return res;
+  if (TEE_Result res = load_key(attributes, max_bits, result)) return res;
   add(*result);
   return TEE_SUCCESS;
 }

@@ -17,8 +17,8 @@ class key_cache {
 
   // load: as load_key, but gives the key that is held already for the same type and attributes.
   // Bytes are compared in constant time.
-  [[nodiscard]] TEE_Result load(uint32_t type, uint32_t max_bits,
-                                std::span<const attribute_view> attributes, key_ptr* result);
+  [[nodiscard]] TEE_Result load(const attribute_list& attributes, uint32_t max_bits,
+                                key_ptr* result);
 
   // add: keeps a key that was generated, which is often populated next.
   void add(const key_ptr& made);

@@ -16,6 +16,7 @@ using tee::guarded;
 using tee::object;
 using tee::panic;
 using tee::crypto::attribute;
+using tee::crypto::attribute_list;
 using tee::crypto::attribute_view;
 using tee::crypto::find_key_type;
 using tee::crypto::key_type;
@@ -26,23 +27,33 @@ bool is_value(uint32_t attribute_id) {
   return (attribute_id & TEE_ATTR_FLAG_VALUE) != 0;
 }
 
-// A list of attributes in the trusted application's memory.
-std::vector<attribute_view> view_attributes(const char* call, const TEE_Attribute* attributes,
+// An attribute in the trusted application's memory.
+attribute_view view_of(const char* call, const TEE_Attribute& given) {
+  const auto& content = given.content;
+  if (is_value(given.attributeID)) {
+    return {given.attributeID, {}, content.value.a, content.value.b};
+  }
+  return {given.attributeID,
+          tee::input_bytes(call, "an attribute's buffer", content.ref.buffer, content.ref.length)};
+}
+
+std::span<const TEE_Attribute> checked_list(const char* call, const TEE_Attribute* attributes,
                                             uint32_t count) {
   if (!attributes && count > 0) panic(call, "attributes are null with count %u", count);
-  std::vector<attribute_view> views(count);
-  for (uint32_t i = 0; i < count; ++i) {
-    const TEE_Attribute& given = attributes[i];
-    views[i].id = given.attributeID;
-    if (is_value(given.attributeID)) {
-      views[i].a = given.content.value.a;
-      views[i].b = given.content.value.b;
-    } else {
-      views[i].bytes = tee::input_bytes(call, "an attribute's buffer", given.content.ref.buffer,
-                                        given.content.ref.length);
-    }
+  return {attributes, count};
+}
+
+// What populates an object of that type; panics when the list breaks a rule.
+attribute_list arrange(const char* call, const key_type& type,
+                       std::span<const TEE_Attribute> attributes) {
+  attribute_list list(type);
+  const char* broken = nullptr;
+  for (const TEE_Attribute& given : attributes) {
+    if (!broken) broken = list.add(view_of(call, given));
   }
-  return views;
+  if (!broken) broken = list.complete();
+  if (broken) panic(call, "%s (type 0x%08x)", broken, type.id);
+  return list;
 }
 
 // The object behind a handle that is to receive a key.
@@ -55,10 +66,9 @@ object& empty_object(const char* call, TEE_ObjectHandle handle) {
 
 // Which size the trusted application may not go beyond is its own business only where it hands over
 // one secret; the numbers of a key pair often come from a client.
-void check_secret_size(const char* call, const object& target,
-                       const std::vector<attribute_view>& attributes) {
-  if (!find_key_type(target.type)->symmetric()) return;
-  size_t length = attributes.front().bytes.size();
+void check_secret_size(const char* call, const object& target, const attribute_list& attributes) {
+  if (!attributes.type().symmetric()) return;
+  size_t length = attributes.views().front().bytes.size();
   if (length > target.max_bits / 8) {
     panic(call, "a secret of %zu bytes exceeds the object's %u bits", length, target.max_bits);
   }
@@ -131,14 +141,11 @@ TEE_Result TEE_PopulateTransientObject(TEE_ObjectHandle object, const TEE_Attrib
   constexpr const char* CALL = "TEE_PopulateTransientObject";
   return guarded(CALL, [&]() -> TEE_Result {
     tee::object& target = empty_object(CALL, object);
-    auto attributes = view_attributes(CALL, attrs, attrCount);
-    if (const char* rule = tee::crypto::broken_rule(target.type, attributes)) {
-      panic(CALL, "%s (type 0x%08x)", rule, target.type);
-    }
+    auto attributes =
+        arrange(CALL, *find_key_type(target.type), checked_list(CALL, attrs, attrCount));
     check_secret_size(CALL, target, attributes);
     if (TEE_Result fault = fault_point()) return fault;
-    return current_instance(CALL).keys().load(target.type, target.max_bits, attributes,
-                                              &target.key);
+    return current_instance(CALL).keys().load(attributes, target.max_bits, &target.key);
   });
 }
 
@@ -152,7 +159,9 @@ TEE_Result TEE_GenerateKey(TEE_ObjectHandle object, uint32_t keySize, const TEE_
       panic(CALL, "key size %u does not fit type 0x%08x with at most %u bits", keySize, target.type,
             target.max_bits);
     }
-    auto parameters = view_attributes(CALL, params, paramCount);
+    std::vector<attribute_view> parameters;
+    for (const TEE_Attribute& given : checked_list(CALL, params, paramCount))
+      parameters.push_back(view_of(CALL, given));
     if (TEE_Result fault = fault_point()) return fault;
     if (TEE_Result res = tee::crypto::generate_key(target.type, keySize, parameters, &target.key)) {
       return res;

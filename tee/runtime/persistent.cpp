@@ -49,8 +49,14 @@ TEE_Result take_attributes(const char* call, const stored_object& stored, object
   target->max_bits = stored.max_bits;
   target->usage = stored.usage;
   if (stored.attributes.empty()) return TEE_SUCCESS;
-  TEE_Result res = tee::current_instance(call).keys().load(
-      stored.type, stored.max_bits, tee::crypto::views_of(stored.attributes), &target->key);
+  const auto* type = tee::crypto::find_key_type(stored.type);
+  if (type == nullptr) return TEE_ERROR_CORRUPT_OBJECT;
+  tee::crypto::attribute_list list(*type);
+  for (const auto& held : stored.attributes) {
+    if (list.add({held.id, held.bytes, held.a, held.b})) return TEE_ERROR_CORRUPT_OBJECT;
+  }
+  if (list.complete()) return TEE_ERROR_CORRUPT_OBJECT;
+  TEE_Result res = tee::current_instance(call).keys().load(list, stored.max_bits, &target->key);
   return res == TEE_ERROR_BAD_PARAMETERS ? TEE_ERROR_CORRUPT_OBJECT : res;
 }
 
