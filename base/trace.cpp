@@ -47,7 +47,6 @@ size_t write_prefix(char* line, size_t room, uint32_t level, trace_site at) {
 
 // The last byte is kept for the newline; the terminating zero that snprintf puts there is dropped.
 void write_line(uint32_t level, trace_site at, const char* format, va_list arguments) {
-  if (level > TEE_TraceThreshold()) return;
   char line[MAX_LINE_SIZE];
   size_t length = write_prefix(line, sizeof(line), level, at);
   const size_t room = sizeof(line) - length;
@@ -59,6 +58,7 @@ void write_line(uint32_t level, trace_site at, const char* format, va_list argum
 }  // namespace
 
 void trace(uint32_t level, trace_site at, const char* format, ...) {
+  if (level > TEE_TraceThreshold()) return;
   va_list arguments;
   va_start(arguments, format);
   write_line(level, at, format, arguments);
@@ -66,6 +66,7 @@ void trace(uint32_t level, trace_site at, const char* format, ...) {
 }
 
 void trace_error(trace_site at, const char* format, ...) {
+  if (TEE_TRACE_ERROR > TEE_TraceThreshold()) return;
   va_list arguments;
   va_start(arguments, format);
   write_line(TEE_TRACE_ERROR, at, format, arguments);

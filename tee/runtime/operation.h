@@ -21,6 +21,12 @@ struct operation {
     INITIALIZED  // between init and final
   };
 
+  // A digest can begin at once; the others wait for their key.
+  operation(const crypto::algorithm& row, uint32_t mode_id, uint32_t max_key_bits)
+      : algorithm(row), mode(mode_id), max_bits(max_key_bits) {
+    if (row.kind == crypto::family::DIGEST) engine.emplace<crypto::digest>(row.digest);
+  }
+
   const crypto::algorithm& algorithm;
   uint32_t mode;      // TEE_MODE_
   uint32_t max_bits;  // largest key it takes; 0: no limit

@@ -102,9 +102,6 @@ void start_engine(operation* op) {
   const algorithm& row = op->algorithm;
   bool encrypt = op->mode == TEE_MODE_ENCRYPT;
   switch (row.kind) {
-    case family::DIGEST:
-      op->engine.emplace<tee::crypto::digest>(row.digest);
-      break;
     case family::MAC:
       op->engine.emplace<tee::crypto::hmac>(op->key, row.digest);
       break;
@@ -133,9 +130,7 @@ TEE_Result TEE_AllocateOperation(TEE_OperationHandle* operation, uint32_t algori
     if (!row || !row->allows(mode) || !size_fits(*row, mode, maxKeySize)) {
       return TEE_ERROR_NOT_SUPPORTED;
     }
-    tee::operation made{*row, mode, maxKeySize};
-    if (row->kind == family::DIGEST) start_engine(&made);
-    *operation = running.operations().emplace(std::move(made));
+    *operation = running.operations().emplace(*row, mode, maxKeySize);
     return *operation ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
   });
 }
