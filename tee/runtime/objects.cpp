@@ -46,13 +46,13 @@ std::span<const TEE_Attribute> checked_list(const char* call, const TEE_Attribut
 // What populates an object of that type; panics when the list breaks a rule.
 attribute_list arrange(const char* call, const key_type& type,
                        std::span<const TEE_Attribute> attributes) {
+  auto keep = [&](const char* broken_rule) {
+    if (broken_rule) panic(call, "%s (type 0x%08x)", broken_rule, type.id);
+  };
   attribute_list list(type);
-  const char* broken = nullptr;
-  for (const TEE_Attribute& given : attributes) {
-    if (!broken) broken = list.add(view_of(call, given));
-  }
-  if (!broken) broken = list.complete();
-  if (broken) panic(call, "%s (type 0x%08x)", broken, type.id);
+  for (const TEE_Attribute& given : attributes)
+    keep(list.add(view_of(call, given)));
+  keep(list.complete());
   return list;
 }
 

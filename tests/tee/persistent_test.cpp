@@ -4,8 +4,11 @@
 #include <gtest/gtest.h>
 #include <string>
 
+#include "tee/device/object_store.h"
+#include "tee/device/uuid.h"
 #include "tee/runtime/host_control.h"
 #include "tee/runtime/instance.h"
+#include "tee/runtime/stored_object.h"
 #include "tests/tee/support.h"
 #include "tests/tee/temp_device.h"
 
@@ -134,6 +137,25 @@ TEST_F(persistent, keys_and_deletion) {
   host::clear_fault();
   EXPECT_EQ(owner.objects().size(), 0u);
   EXPECT_EQ(open_object(META, &object), TEE_SUCCESS);
+}
+
+TEST_F(persistent, stored_attributes_that_make_no_key_are_corrupt) {
+  const crypto::attribute secret{TEE_ATTR_SECRET_VALUE, secret_bytes(16)};
+  const crypto::attribute odd{TEE_ATTR_SECRET_VALUE, secret_bytes(5)};
+  const crypto::attribute modulus{TEE_ATTR_RSA_MODULUS, secret_bytes(64)};
+  const std::pair<uint32_t, std::vector<crypto::attribute>> rows[] = {
+      {TEE_TYPE_AES + 0xFF, {secret}},  {TEE_TYPE_AES, {modulus}},         {TEE_TYPE_AES, {odd}},
+      {TEE_TYPE_AES, {secret, secret}}, {TEE_TYPE_RSA_KEYPAIR, {modulus}},
+  };
+  for (const auto& [type, attributes] : rows) {
+    stored_object content;
+    content.type = type;
+    content.max_bits = 512;
+    content.attributes = attributes;
+    dev->objects().save({TEE_STORAGE_PRIVATE, to_bytes(OWNER), {'i', 'd', 0}}, encode(content));
+    EXPECT_EQ(open_object(READ, &object), TEE_ERROR_CORRUPT_OBJECT) << type;
+  }
+  EXPECT_EQ(owner.objects().size(), 0u);
 }
 
 using persistent_death = persistent;
