@@ -76,9 +76,9 @@ reply ta_under_test::expect_refused(const request& what, int32_t km_error,
 void ta_under_test::expect_refused_keys(const std::string& prefix, std::span<const bad_key> keys) {
   for (const auto& [description, km_error, message, data] : keys) {
     const std::string line = prefix + (data ? "import_key: " : "generate_key: ") + message;
-    const reply answer =
-        expect_refused(data ? import_request(description, *data) : generate_request(description),
-                       km_error, message.empty() ? "" : line);
+    const reply answer = expect_refused(
+        data ? import_request(description, *data) : generate_request(description), km_error);
+    EXPECT_EQ(trace_.errors(), message.empty() ? "" : line);
     EXPECT_EQ(answer.buffer, bytes(AMPLE)) << line;
     EXPECT_EQ(answer.output_size, data ? AMPLE : 0) << line;
   }

@@ -103,8 +103,8 @@ request step_request(command id, uint32_t handle, byte_view input = {},
 request abort_request(uint32_t handle);
 request attest_request(byte_view blob, const param_set& params = {}, size_t capacity = AMPLE);
 
-// bad_key: a description of a key that is not made. Its data: none, and it is generated. The traced
-// message: empty, and none is looked for.
+// bad_key: a description of a key that is not made. Its data: none, and it is generated. The one
+// error message that is traced: empty, and there is none.
 struct bad_key {
   param_set description;
   int32_t km_error;

@@ -3,8 +3,7 @@
 #include <openssl/x509.h>
 #include <openssl/x509v3.h>
 
-#include "support/sets.h"
-#include "support/ta_under_test.h"
+#include "ta/pkey.h"
 
 namespace keymaster::test {
 namespace {
@@ -89,6 +88,14 @@ bytes extension_value(const certificate& from, int id) {
   return client::copy_of(client::as_bytes(text_of(value)));
 }
 
+// What it certifies, as a SubjectPublicKeyInfo.
+bytes subject_of(const certificate& from) {
+  bytes spki(1024);
+  uint8_t* end = spki.data();
+  spki.resize(static_cast<size_t>(i2d_PUBKEY(X509_get0_pubkey(from.get()), &end)));
+  return spki;
+}
+
 TEST(Attestation, ChainsVerifyForRsaAndEc) {
   EXPECT_TRUE(is_der(bytes{2, 2, 0, 0x80, 1, 1, 0xFF}));
   EXPECT_FALSE(is_der(bytes{2, 0x81, 1, 5}) || is_der(bytes{2, 2, 0, 5}) || is_der(bytes{1, 1, 1}));
@@ -129,10 +136,7 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     EXPECT_EQ(common_name(X509_get_issuer_name(chain[0].get())).size(), 18u);
     EXPECT_EQ(X509_get_signature_nid(chain[0].get()), NID_sha256WithRSAEncryption);
     if (row.description.number(KM_TAG_ALGORITHM) == KM_ALGORITHM_EC) continue;
-    bytes subject(1024);
-    uint8_t* end = subject.data();
-    subject.resize(static_cast<size_t>(i2d_PUBKEY(X509_get0_pubkey(chain[0].get()), &end)));
-    EXPECT_EQ(subject,
+    EXPECT_EQ(subject_of(chain[0]),
               client::copy_of(ta.send_well(key_request(command::EXPORT_KEY, blob)).output()));
   }
 }
@@ -178,14 +182,34 @@ TEST(Attestation, Refusals) {
   EXPECT_TRUE(
       refused(ta.send(attest_request(ta.generate(hmac_key(256)))), KM_ERROR_UNSUPPORTED_ALGORITHM));
   const bytes blob = ta.generate(EC_256_KEY);
-  const auto challenge = param_set().add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes(129));
-  EXPECT_TRUE(refused(ta.send(attest_request(blob, challenge)), KM_ERROR_INVALID_INPUT_LENGTH));
+  for (const size_t size : {128u, 129u}) {
+    const auto challenge = param_set().add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes(size));
+    EXPECT_TRUE(refused(ta.send(attest_request(blob, challenge)),
+                        size == 128 ? KM_ERROR_OK : KM_ERROR_INVALID_INPUT_LENGTH));
+  }
   EXPECT_TRUE(refused(ta.send(attest_request(bytes{1})), KM_ERROR_KEY_REQUIRES_UPGRADE));
   const bytes unique = ta.generate(param_set(EC_256_KEY).add_flag(KM_TAG_INCLUDE_UNIQUE_ID));
   EXPECT_TRUE(refused(ta.send(attest_request(unique)), KM_ERROR_UNIMPLEMENTED));
+  // A unique id is made of the creation date, which an imported RSA key has not.
+  const bytes undated =
+      ta.import(without(RSA_KEY, KM_TAG_KEY_SIZE).add_flag(KM_TAG_INCLUDE_UNIQUE_ID),
+                pkey::rsa(1024).import_data());
+  EXPECT_TRUE(refused(ta.send(attest_request(undated)), KM_ERROR_INVALID_KEY_BLOB));
   request no_set = attest_request(blob);
   no_set.input[4 + blob.size() + 4] = 3;  // announces parameters that are not there
   EXPECT_TRUE(failed_with(ta.send(no_set), TEEC_ERROR_BAD_PARAMETERS));
+}
+
+// Numbers are imported as long as they are; points have numbers of full length.
+TEST(Attestation, OfShortCoordinates) {
+  ta_under_test ta;
+  pkey key = pkey::ec(521);
+  while (key.number(OSSL_PKEY_PARAM_EC_PUB_X).size() == 66)
+    key = pkey::ec(521);
+  const bytes x = key.number(OSSL_PKEY_PARAM_EC_PUB_X);
+  const bytes blob = ta.import(without(EC_256_KEY, KM_TAG_KEY_SIZE), key.import_data({{0, x}}));
+  const auto chain = parse_chain(ta.send_well(attest_request(blob)).output());
+  EXPECT_EQ(pkey::rsa_public(subject_of(chain.at(0))).number(OSSL_PKEY_PARAM_EC_PUB_X), x);
 }
 
 // Descriptions beyond the first buffer and beyond its double. The application is attested without

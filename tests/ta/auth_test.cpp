@@ -8,8 +8,6 @@
 namespace keymaster::test {
 namespace {
 
-constexpr uint32_t SIGN = KM_PURPOSE_SIGN;
-constexpr uint32_t ENCRYPT = KM_PURPOSE_ENCRYPT;
 constexpr uint64_t USER = 42;
 constexpr uint64_t NOW = START_REE_MS;
 
@@ -32,7 +30,7 @@ param_set signer(keymaster_tag_t tag, uint64_t number) {
 }
 
 param_set sign_request(const param_set& more = {}) {
-  return one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256).add(KM_TAG_MAC_LENGTH, 128).append(more);
+  return mac_use(128).append(more);
 }
 
 param_set user_key(uint32_t auth_types) {
@@ -94,7 +92,6 @@ struct begin_case {
 };
 
 constexpr char BAD_NONCE[] = "Caller nonce prohibited";
-constexpr uint32_t VERIFY = KM_PURPOSE_VERIFY;
 constexpr keymaster_tag_t ACTIVE = KM_TAG_ACTIVE_DATETIME;
 constexpr keymaster_tag_t ORIGINATION = KM_TAG_ORIGINATION_EXPIRE_DATETIME;
 constexpr keymaster_tag_t USAGE = KM_TAG_USAGE_EXPIRE_DATETIME;
@@ -110,14 +107,10 @@ const begin_case BEGINS[] = {
     {0, "", aes_key(KM_MODE_CBC, one(KM_TAG_CALLER_NONCE, 1)), OWN_NONCE, ENCRYPT},
     {-2, "begin: Algorithm HMAC purpose 0 not implemented", signer(KM_TAG_PURPOSE, ENCRYPT),
      sign_request(), ENCRYPT},
-    {-2, "begin: Algorithm HMAC purpose 4 not implemented", signer(KM_TAG_PURPOSE, 4),
-     sign_request(), 4},
     {-57, "MAC length 120 below the key's minimum 128", sign_key(), mac_use(120)},
     {-57, "MAC length 96 below the key's minimum 128",
      aes_key(KM_MODE_GCM, one(KM_TAG_MIN_MAC_LENGTH, 128)),
      one(KM_TAG_BLOCK_MODE, KM_MODE_GCM).add(KM_TAG_MAC_LENGTH, 96), ENCRYPT},
-    {-38, "create_hmac_sign: No or too many KM_TAG_MAC_LENGTH | begin: Create operation failed",
-     sign_key(), one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256)},
     {0, "", signer(ACTIVE, NOW)},
     {-24, NOT_YET, signer(ACTIVE, NOW + 1)},
     {0, "", signer(ORIGINATION, NOW)},

@@ -175,6 +175,10 @@ TEST_F(Rsa, RawResultsHaveTheKeysLength) {
   // Verification takes the data as it came, at the front of the block.
   EXPECT_TRUE(refused(verify(blob, RAW, short_message, made), -30));
   EXPECT_TRUE(refused(verify(blob, RAW, right_aligned(short_message, 256), made), -30));
+  bytes block = {0, 7, 8, 9};
+  const bytes front = block;
+  block.resize(256);
+  EXPECT_TRUE(succeeded(verify(blob, RAW, front, KEY_2048.sign(RAW, block))));
   EXPECT_EQ(ta.run(ENCRYPT, blob, use(RAW), {}), bytes(256));
 }
 
@@ -259,16 +263,12 @@ TEST_F(Rsa, KeysAreUsedWithTheirDigestsAlone) {
 
 TEST_F(Rsa, NewKeysAreChecked) {
   const std::string no_exponent = "No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified";
-  const std::string no_size = "No or too many KM_TAG_KEY_SIZE or specified";
   const param_set good = new_key(512, 65537);
   const bad_key rows[] = {
       {param_set(good).add(KM_TAG_ORIGIN, 0), -38, "Shouldn't specify KM_TAG_ORIGIN"},
-      {param_set(good).add(KM_TAG_CREATION_DATETIME, 1), -38,
-       "Shouldn't specify KM_TAG_CREATION_DATETIME"},
       {without(good, KM_TAG_RSA_PUBLIC_EXPONENT), -38, no_exponent},
       {with(good, KM_TAG_RSA_PUBLIC_EXPONENT, {3, 3}), -38, no_exponent},
-      {without(good, KM_TAG_KEY_SIZE), -38, no_size},
-      {with(good, KM_TAG_KEY_SIZE, {512, 512}), -38, no_size},
+      {without(good, KM_TAG_KEY_SIZE), -38, "No or too many KM_TAG_KEY_SIZE or specified"},
       {new_key(8200, 65537), -6, "Invalid RSA key size 8200"},
       {new_key(513, 65537), -6, "Invalid RSA key size 513"},
   };
@@ -310,25 +310,27 @@ TEST_F(Rsa, ImportsTellTheirSizeAndExponent) {
   const bytes good = KEY_512.import_data();
   const bytes modulus = KEY_512.number(OSSL_PKEY_PARAM_RSA_N);
   const bytes nine = altered(EXPONENT, {0, 0, 0, 0, 0, 0, 1, 0, 1});
-  const param_set e_3 = one(KM_TAG_RSA_PUBLIC_EXPONENT, 3).append(ANY_USE);
-  const param_set e_65537 = with(e_3, KM_TAG_RSA_PUBLIC_EXPONENT, {65537});
+  const auto with_exponent = [](uint64_t exponent) {
+    return one(KM_TAG_RSA_PUBLIC_EXPONENT, exponent).append(ANY_USE);
+  };
   for (const auto& [description, data, bits] :
        {std::tuple(with(ANY_USE, KM_TAG_KEY_SIZE, {512}), good, 512u),
         {ANY_USE, altered(MODULUS, right_aligned(modulus, 65)), 520},
         {ANY_USE, altered(MODULUS, {}), 0},
         {ANY_USE, nine, 512},
-        {e_65537, altered(EXPONENT, {0, 1, 0, 1}), 512}}) {
+        {with_exponent(65537), altered(EXPONENT, {0, 1, 0, 1}), 512}}) {
     const param_set found = ta.characteristics(ta.import(description, data));
     EXPECT_EQ(found.numbers(KM_TAG_KEY_SIZE), std::vector<uint64_t>{bits});
     EXPECT_EQ(found.numbers(KM_TAG_RSA_PUBLIC_EXPONENT), std::vector<uint64_t>{65537});
     EXPECT_EQ(found.number(KM_TAG_ORIGIN), KM_ORIGIN_IMPORTED);
     EXPECT_FALSE(found.contains(KM_TAG_CREATION_DATETIME));
   }
+  ta.import(with_exponent(0x100000001), altered(EXPONENT, {1, 0, 0, 0, 1}));
   const bytes dated = ta.import(with(ANY_USE, KM_TAG_CREATION_DATETIME, {77}), good);
   EXPECT_EQ(ta.characteristics(dated).number(KM_TAG_CREATION_DATETIME), 77U);
   const bad_key rejected[] = {
-      {e_3, -44, "Public exponent mismatch", good},
-      {e_65537, -44, "Public exponent mismatch", nine},
+      {with_exponent(3), -44, "Public exponent mismatch", good},
+      {with_exponent(65537), -44, "Public exponent mismatch", nine},
       {ANY_USE, -44, "Public exponent mismatch", altered(EXPONENT, bytes(9, 1))},
       {with(ANY_USE, KM_TAG_KEY_SIZE, {511}), -44, "Key size mismatch (given 511, guessed 512)",
        good},

@@ -72,29 +72,6 @@ bytes cut(bytes whole, size_t bytes_off) {
   return whole;
 }
 
-bytes notification(uint32_t version) {
-  return client::field_writer().u32(version).u32(7).u64(START_SYSTEM_MS).take();
-}
-
-TEST_F(fake_device, OnlyTheFingerprintApplicationReportsFingers) {
-  const bytes good = notification(0);
-  const struct {
-    TEEC_UUID from;
-    bytes record;
-    TEEC_Result res;
-  } rows[] = {
-      {FINGERPRINT_TA_UUID, good, TEEC_SUCCESS},
-      {VAULT_TA_UUID, good, TEEC_ERROR_ACCESS_DENIED},
-      {FINGERPRINT_TA_UUID, cut(good, 1), TEEC_ERROR_BAD_PARAMETERS},
-      {FINGERPRINT_TA_UUID, bytes(17), TEEC_ERROR_BAD_PARAMETERS},
-      {FINGERPRINT_TA_UUID, notification(1), TEEC_ERROR_BAD_FORMAT},
-  };
-  for (const auto& row : rows)
-    EXPECT_EQ(tell(row.from, FAKE_FORWARD, row.record), row.res);
-  EXPECT_TRUE(failed_with(ta.send({.id = SET_FID, .input = good}), TEEC_ERROR_ACCESS_DENIED));
-  EXPECT_EQ(ta.trace().errors(), "soter_handle_setFid: soter deny finger print ta");
-}
-
 // Items of a TLV box.
 using items = std::vector<std::pair<uint16_t, bytes>>;
 
@@ -106,13 +83,11 @@ bytes box(const items& content) {
 }
 
 items key_items(const pkey& key, size_t count = 8) {
-  const char* const names[] = {OSSL_PKEY_PARAM_RSA_N,         OSSL_PKEY_PARAM_RSA_E,
-                               OSSL_PKEY_PARAM_RSA_D,         OSSL_PKEY_PARAM_RSA_FACTOR1,
-                               OSSL_PKEY_PARAM_RSA_FACTOR2,   OSSL_PKEY_PARAM_RSA_EXPONENT1,
-                               OSSL_PKEY_PARAM_RSA_EXPONENT2, OSSL_PKEY_PARAM_RSA_COEFFICIENT1};
+  const bytes numbers = key.import_data();
+  client::field_reader in(numbers);
   items result;
   for (uint16_t i = 0; i < count; i++)
-    result.emplace_back(static_cast<uint16_t>(17 + i), key.number(names[i]));
+    result.emplace_back(static_cast<uint16_t>(17 + i), client::copy_of(in.field()));
   return result;
 }
 
@@ -125,6 +100,10 @@ constexpr uint32_t ASK_KEY = 2;
 constexpr uint32_t ASK_PROPERTIES = 0x00001834;
 constexpr uint32_t ASK_CPU_ID = 0x173A1734;
 constexpr uint32_t FOR_EVER = 0xFFFFFFFF;
+
+bytes notification(uint32_t version, uint32_t fid) {
+  return client::field_writer().u32(version).u32(fid).u64(START_SYSTEM_MS).take();
+}
 
 class Vault : public fake_device {
  protected:
@@ -140,6 +119,31 @@ class Vault : public fake_device {
     return ta.send(soter_request(EXPORT)).km_error;
   }
 };
+
+TEST_F(Vault, OnlyTheFingerprintApplicationReportsFingers) {
+  program_well();
+  EXPECT_EQ(export_error(), 0);
+  const bytes other = notification(0, 8);
+  const struct {
+    TEEC_UUID from;
+    bytes record;
+    TEEC_Result res;
+  } rows[] = {
+      {FINGERPRINT_TA_UUID, notification(0, 7), TEEC_SUCCESS},
+      {VAULT_TA_UUID, other, TEEC_ERROR_ACCESS_DENIED},
+      {FINGERPRINT_TA_UUID, cut(other, 1), TEEC_ERROR_BAD_PARAMETERS},
+      {FINGERPRINT_TA_UUID, bytes(17), TEEC_ERROR_BAD_PARAMETERS},
+      {FINGERPRINT_TA_UUID, notification(1, 8), TEEC_ERROR_BAD_FORMAT},
+  };
+  for (const auto& row : rows)
+    EXPECT_EQ(tell(row.from, FAKE_FORWARD, row.record), row.res);
+  EXPECT_TRUE(failed_with(ta.send({.id = SET_FID, .input = other}), TEEC_ERROR_ACCESS_DENIED));
+  EXPECT_EQ(ta.trace().errors(), "soter_handle_setFid: soter deny finger print ta");
+  // What was refused leaves the finger before it in place.
+  const bytes blob = ta.import(soter_key(), attk().import_data());
+  const bytes made = finished(ta.finish(ta.begun(SIGN, blob, soter_use())));
+  EXPECT_TRUE(client::parse_signed_document(made).text().starts_with(R"({"raw":"","fid":7,)"));
+}
 
 TEST_F(Vault, AnswersThatMisbehaveKeepNothing) {
   const items key = key_items(attk());

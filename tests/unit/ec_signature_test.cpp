@@ -1,7 +1,6 @@
 // The DER codec of ECDSA signatures: what it makes, and that it takes nothing else.
 #include "keymaster/alg/ec/ec_signature.h"
 
-#include <algorithm>
 #include <gtest/gtest.h>
 #include <vector>
 
@@ -23,37 +22,24 @@ bytes joined(std::initializer_list<bytes> parts) {
   return result;
 }
 
-bool traced(const char* message) {
-  return std::ranges::any_of(platform::trace_lines, [&](const std::string& line) {
-    return line.find(message) != std::string::npos;
-  });
-}
-
-class EcSignature : public testing::Test {
- protected:
-  void SetUp() override { platform::reset(); }
-  void TearDown() override { EXPECT_EQ(platform::live_blocks, 0U); }
-};
+using EcSignature = platform::fixture;
 
 TEST_F(EcSignature, Lengths) {
-  const struct {
-    uint32_t length;
-    bytes encoding;
-  } rows[] = {{126, {126}},
-              {127, {0x81, 0x7F}},
-              {254, {0x81, 0xFE}},
-              {255, {0x82, 0x00, 0xFF}},
-              {65534, {0x82, 0xFF, 0xFE}},
-              {65535, {0x83, 0x00, 0xFF, 0xFF}},
-              {16777214, {0x83, 0xFF, 0xFF, 0xFE}},
-              {16777215, {0x84, 0x00, 0xFF, 0xFF, 0xFF}}};
-  for (const auto& row : rows) {
+  const std::pair<uint32_t, bytes> rows[] = {{126, {126}},
+                                             {127, {0x81, 0x7F}},
+                                             {254, {0x81, 0xFE}},
+                                             {255, {0x82, 0x00, 0xFF}},
+                                             {65534, {0x82, 0xFF, 0xFE}},
+                                             {65535, {0x83, 0x00, 0xFF, 0xFF}},
+                                             {16777214, {0x83, 0xFF, 0xFF, 0xFE}},
+                                             {16777215, {0x84, 0x00, 0xFF, 0xFF, 0xFF}}};
+  for (const auto& [length, encoding] : rows) {
     uint8_t room[5];
     output_cursor out(room);
-    EXPECT_TRUE(encode_length(&out, row.length)) << row.length;
-    EXPECT_EQ(of(byte_view(room).first(out.written())), row.encoding);
-    output_cursor narrow(byte_span(room).first(row.encoding.size() - 1));
-    EXPECT_FALSE(encode_length(&narrow, row.length)) << row.length;
+    EXPECT_TRUE(encode_length(&out, length)) << length;
+    EXPECT_EQ(of(byte_view(room).first(out.written())), encoding);
+    output_cursor narrow(byte_span(room).first(encoding.size() - 1));
+    EXPECT_FALSE(encode_length(&narrow, length)) << length;
   }
 }
 
@@ -85,7 +71,7 @@ TEST_F(EcSignature, EncodingsAndBack) {
   for (const auto& [r, s] : {std::pair(WIDE, bytes(66, 0x11)), {bytes(127, 1), {1}}}) {
     heap_buffer encoded;
     EXPECT_EQ(der_encode_ec_signature(r, s, &encoded), TEE_ERROR_GENERIC);
-    EXPECT_TRUE(traced("Unfilled buffer, size calculation error"));
+    EXPECT_TRUE(platform::traced("Unfilled buffer, size calculation error"));
     EXPECT_FALSE(encoded);
   }
 }
@@ -93,16 +79,14 @@ TEST_F(EcSignature, EncodingsAndBack) {
 TEST_F(EcSignature, OnlyTheShortestFormIsTaken) {
   const bytes part(32, 0x11);
   const bytes integer = joined({{2, 32}, part});
-  const struct {
-    bytes der;
-    const char* message;
-  } rows[] = {
+  const std::pair<bytes, const char*> rows[] = {
       {{0x30}, "Wrong der length"},
       {joined({{0x31, 68}, integer, integer}), "Wrong tag, expect 0x30, got 0x31"},
       {joined({{0x30, 0x85, 0, 0, 0, 0, 68}, integer, integer}), "Decode length failed"},
       {joined({{0x30, 68}, integer, integer, {0}}),
        "Wrong length of sequence, expect 70B, got 71B"},
-      {joined({{0x30, 0x84, 0xFF, 0xFF, 0xFF, 0xFF}, integer}), "Wrong length of sequence"},
+      {joined({{0x30, 0x84, 0xFF, 0xFF, 0xFF, 0xFF}, integer}),
+       "Wrong length of sequence, expect 5B, got 40B"},
       {joined({{0x30, 68, 3, 32}, part, integer}), "Wrong tag, expect 0x02, got 0x03"},
       {joined({{0x30, 68}, integer, {2, 33}, part}),
        "Wrong length of integer, 32B available, got 33B"},
@@ -117,12 +101,11 @@ TEST_F(EcSignature, OnlyTheShortestFormIsTaken) {
       {joined({{0x30, 35, 2, 0x80}, {2, 29}, bytes(29, 1), {5, 0}}), "Encoding size mismatch"},
       {joined({{0x30, 39, 2, 32, 0x91}, bytes(31, 1), {2, 3, 0, 1, 1}}), "Encoding mismatch"},
   };
-  for (const auto& row : rows) {
-    platform::reset();
+  for (const auto& [der, message] : rows) {
     bytes r(32);
     bytes s(32);
-    EXPECT_EQ(der_decode_ec_signature(row.der, r, s), TEE_ERROR_GENERIC) << row.message;
-    EXPECT_TRUE(traced(row.message)) << row.message << " but " << platform::trace_lines.back();
+    EXPECT_EQ(der_decode_ec_signature(der, r, s), TEE_ERROR_GENERIC) << message;
+    EXPECT_TRUE(platform::traced(message)) << message << " but " << platform::trace_lines.back();
   }
 }
 

@@ -26,6 +26,10 @@ void reset() {
   trace_lines.clear();
 }
 
+bool traced(const std::string& text) {
+  return !trace_lines.empty() && trace_lines.back().ends_with(": " + text + "\n");
+}
+
 }  // namespace platform
 
 using namespace platform;

@@ -22,14 +22,7 @@ std::string text_of(byte_view bytes) {
   return {bytes.begin(), bytes.end()};
 }
 
-class Text : public testing::Test {
- protected:
-  void SetUp() override { platform::reset(); }
-  void TearDown() override {
-    EXPECT_EQ(platform::live_blocks, 0U);
-    EXPECT_EQ(platform::unwiped_blocks, 0U);
-  }
-};
+using Text = platform::fixture;
 
 // The text of a value without its zero byte, which must be there and be counted.
 std::string written(const json_value& value) {
@@ -42,25 +35,20 @@ std::string written(const json_value& value) {
 }
 
 TEST_F(Text, JsonStrings) {
-  const struct {
-    std::string text, written;
-  } rows[] = {
+  const std::pair<std::string, const char*> rows[] = {
       {"\"\\/\b\f\n\r\t", R"("\"\\\/\b\f\n\r\t")"}, {"a/b//", R"("a\/b\/\/")"},
       {"\x01\x0b\x1f\x7f", "\"\x01\x0b\x1f\x7f\""}, {"\xff\xc0 as it is", "\"\xff\xc0 as it is\""},
       {"to here\0not\n"s, R"("to here")"},
   };
-  for (const auto& row : rows) {
+  for (const auto& [text, expected] : rows) {
     json_value value;
-    EXPECT_TRUE(value.make_string(bytes_of(row.text)));
-    EXPECT_EQ(written(value), row.written);
+    EXPECT_TRUE(value.make_string(bytes_of(text)));
+    EXPECT_EQ(written(value), expected);
   }
 }
 
 TEST_F(Text, JsonNumbers) {
-  const struct {
-    double number;
-    const char* written;
-  } rows[] = {
+  const std::pair<double, const char*> rows[] = {
       {-0.0, "0"},
       {-1, "-1"},
       {1.5, "1.500000"},
@@ -72,8 +60,8 @@ TEST_F(Text, JsonNumbers) {
       {1e28, "9999999999999999583119736832."},  // 29 characters and no more
       {std::numeric_limits<double>::quiet_NaN(), "nan"},
   };
-  for (const auto& row : rows)
-    EXPECT_EQ(written(json_value(row.number)), row.written);
+  for (const auto& [number, expected] : rows)
+    EXPECT_EQ(written(json_value(number)), expected);
 }
 
 // A member that is set again keeps its place.
@@ -87,10 +75,7 @@ TEST_F(Text, JsonObjects) {
 }
 
 TEST_F(Text, Utf8) {
-  const struct {
-    std::string text;
-    bool valid;
-  } rows[] = {
+  const std::pair<std::string, bool> rows[] = {
       {"plain\x7f", true},
       {"a\0b"s, true},
       {"\xc2\x80\xdf\xbf", true},
@@ -110,15 +95,13 @@ TEST_F(Text, Utf8) {
       {"\xe2\x82z", false},         //
       {"\xf0\x9f\x94\xc0", false},  //
   };
-  for (const auto& row : rows)
-    EXPECT_EQ(is_valid_utf8(bytes_of(row.text)), row.valid) << testing::PrintToString(row.text);
+  for (const auto& [text, valid] : rows)
+    EXPECT_EQ(is_valid_utf8(bytes_of(text)), valid) << testing::PrintToString(text);
 }
 
 TEST_F(Text, Base64) {
   const std::string line(64, 'A');
-  const struct {
-    std::string data, text;
-  } rows[] = {
+  const std::pair<std::string, std::string> rows[] = {
       {"", ""},
       {"f", "Zg=="},
       {"fo", "Zm8="},
@@ -128,12 +111,12 @@ TEST_F(Text, Base64) {
       {std::string(48, '\0'), line},
       {std::string(97, '\0'), line + "\n" + line + "\nAA=="},
   };
-  for (const auto& row : rows) {
+  for (const auto& [data, expected] : rows) {
     heap_buffer text;
-    ASSERT_TRUE(base64_encode(bytes_of(row.data), &text));
-    EXPECT_EQ(text_of(text.view()), row.text);
+    ASSERT_TRUE(base64_encode(bytes_of(data), &text));
+    EXPECT_EQ(text_of(text.view()), expected);
     platform::allocations_to_fail = 1;
-    EXPECT_FALSE(base64_encode(bytes_of(row.data), &text));
+    EXPECT_FALSE(base64_encode(bytes_of(data), &text));
     EXPECT_FALSE(text);
   }
 }

@@ -11,10 +11,7 @@ namespace {
 
 constexpr trace_site AT = {"begin", 120};
 
-class Trace : public testing::Test {
- protected:
-  void SetUp() override { platform::reset(); }
-};
+using Trace = platform::fixture;
 
 TEST_F(Trace, NamesLevelThreadFunctionAndLine) {
   const struct {
