@@ -9,8 +9,8 @@ using client::as_bytes;
 using client::to_hex;
 using namespace std::string_literals;
 
-// RFC 2202 (SHA-1) and RFC 4231 (SHA-2) with keys of one repeated byte. The last was
-// computed with the openssl command.
+// RFC 2202 (SHA-1) and RFC 4231 (SHA-2) with keys of one repeated byte. The last two, whose keys
+// fill a block and exceed it, were computed with the openssl command.
 const struct {
   uint8_t key_byte;
   size_t key_size;
@@ -30,6 +30,7 @@ const struct {
      "87aa7cdea5ef619d4ff0b4241a1d6cb02379f4e2ce4ec2787ad0b30545e17cdedaa833b7d6b8a702038b274eae"
      "a3f4e4be9d914eeb61f1702e696c203a126854"},
     {0x0c, 20, "Test With Truncation", 4, "a3b6167473100ee06e0c796c2955552b"},
+    {0x0c, 64, "Hi There", 4, "423db8a45c2a4db49b0fcc25fcc79357abfc09a58820579959a57e9c7611ecf0"},
     {0xaa, 100, "Hi There", 4, "4e9638590f2780370491dacfd8e20c85600da0ded385d8b4f68b00425d4518f2"},
 };
 
