@@ -27,11 +27,7 @@ TEST(ParamSet, RefusesMalformedBytes) {
 }
 
 TEST(Names, ParseWhatPeopleWrite) {
-  struct {
-    keymaster_tag_t tag;
-    const char* text;
-    std::optional<uint32_t> value;
-  } cases[] = {
+  const std::tuple<keymaster_tag_t, const char*, std::optional<uint32_t>> cases[] = {
       {KM_TAG_DIGEST, "sha256", KM_DIGEST_SHA_2_256},
       {KM_TAG_DIGEST, "SHA-256", KM_DIGEST_SHA_2_256},
       {KM_TAG_DIGEST, "KM_DIGEST_SHA_2_256", KM_DIGEST_SHA_2_256},
@@ -42,8 +38,8 @@ TEST(Names, ParseWhatPeopleWrite) {
       {KM_TAG_PADDING, "pkcs1-sign", KM_PAD_RSA_PKCS1_1_5_SIGN},
       {KM_TAG_USER_AUTH_TYPE, "fingerprint", KM_AUTH_TYPE_FINGERPRINT},
   };
-  for (const auto& c : cases)
-    EXPECT_EQ(parse_value(c.tag, c.text), c.value) << c.text;
+  for (const auto& [tag, text, value] : cases)
+    EXPECT_EQ(parse_value(tag, text), value) << text;
 
   for (const char* text : {"KEY_SIZE", "key-size", "KM_TAG_KEY_SIZE", "0x30000003"})
     EXPECT_EQ(parse_tag(text), KM_TAG_KEY_SIZE) << text;

@@ -23,20 +23,17 @@ class Session : public testing::Test {
 };
 
 TEST_F(Session, TellsTheKeymasterErrorFromAnUntouchedSlot) {
-  struct {
-    answer reply;
-    status expected;
-  } cases[] = {
+  const std::pair<answer, status> cases[] = {
       {{.a = -33}, {TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, -33}},
       {{.result = TEEC_ERROR_GENERIC, .a = -1000},
        {TEEC_ERROR_GENERIC, TEEC_ORIGIN_TRUSTED_APP, -1000}},
       {{.result = TEEC_ERROR_TARGET_DEAD, .leave_slots = true},
        {TEEC_ERROR_TARGET_DEAD, TEEC_ORIGIN_TEE, 0}},
   };
-  for (const auto& c : cases) {
-    answer_with(c.reply);
+  for (const auto& [reply, expected] : cases) {
+    answer_with(reply);
     update_result result = keymaster.update(0xFFFFFFFE, BLOB);
-    EXPECT_EQ(result.text(), c.expected.text());
+    EXPECT_EQ(result.text(), expected.text());
     EXPECT_TRUE(result.output.empty());
   }
 }
@@ -44,11 +41,7 @@ TEST_F(Session, TellsTheKeymasterErrorFromAnUntouchedSlot) {
 TEST_F(Session, RefusesMalformedAnswers) {
   const auto import = [&] { return keymaster.import_key({}, BLOB); };
   const auto finish = [&] { return keymaster.finish(1); };
-  struct {
-    const char* what;
-    answer reply;
-    std::function<status()> send;
-  } cases[] = {
+  const std::tuple<const char*, answer, std::function<status()>> cases[] = {
       {"an empty blob", {}, [&] { return keymaster.generate_key({}); }},
       {"a field too long", {.output = {9, 0, 0, 0}}, import},
       {"characteristics missing", {.output = from_hex("02000000b10b")}, import},
@@ -61,9 +54,9 @@ TEST_F(Session, RefusesMalformedAnswers) {
        {.b = 7, .output = from_hex("01000000")},
        [&] { return keymaster.begin(2, BLOB, {}); }},
   };
-  for (const auto& c : cases) {
-    answer_with(c.reply);
-    EXPECT_EQ(c.send().text(), status({TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API}).text()) << c.what;
+  for (const auto& [what, reply, send] : cases) {
+    answer_with(reply);
+    EXPECT_EQ(send().text(), status({TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API}).text()) << what;
   }
   // The last one had begun in the TA: the handle goes back.
   EXPECT_EQ(requests.back().command, 23u);
@@ -120,11 +113,7 @@ class Soter : public Session {
 };
 
 TEST_F(Soter, ReadsOutputsAndRefusesMalformedOnes) {
-  const struct {
-    answer reply;
-    status expected;
-    bool unavailable;
-  } rows[] = {
+  const std::tuple<answer, status, bool> rows[] = {
       {{.output = {'P', 0}}, {}, false},
       {{.a = -1}, {TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, -1}, true},
       {{.a = -1000}, {TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, -1000}, false},
@@ -132,12 +121,12 @@ TEST_F(Soter, ReadsOutputsAndRefusesMalformedOnes) {
       {{.output = {}}, {TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API}, false},
       {{.output_size = 1 << 20}, {TEEC_ERROR_BAD_FORMAT, TEEC_ORIGIN_API}, false},
   };
-  for (const auto& row : rows) {
-    answer_with(row.reply);
+  for (const auto& [reply, expected, unavailable] : rows) {
+    answer_with(reply);
     const soter_result exported = commands.export_attk();
-    EXPECT_EQ(exported.text(), row.expected.text());
-    EXPECT_EQ(exported.unavailable, row.unavailable);
-    EXPECT_EQ(exported.data, row.expected.ok() ? bytes{'P'} : bytes{});
+    EXPECT_EQ(exported.text(), expected.text());
+    EXPECT_EQ(exported.unavailable, unavailable);
+    EXPECT_EQ(exported.data, expected.ok() ? bytes{'P'} : bytes{});
     EXPECT_EQ(requests[0].types, 0x602u);
   }
 }

@@ -315,10 +315,7 @@ TEST_F(auth, operation_wants_its_own_token_at_every_step) {
 TEST_F(auth, application_must_present_what_the_key_is_bound_to) {
   const param_set bound = bound_to("abc", "def");
   const param_set twice = bound_to("abc").append(bound_to("abc"));
-  const struct {
-    param_set key, given;
-    std::string reason;  // empty: granted
-  } rows[] = {
+  const std::tuple<param_set, param_set, std::string> rows[] = {
       {bound, bound, ""},
       {{}, bound, ""},
       {bound, {}, "KM_TAG_APPLICATION_ID mismatch"},
@@ -328,11 +325,12 @@ TEST_F(auth, application_must_present_what_the_key_is_bound_to) {
       {bound, bound_to("abc", "defg"), "KM_TAG_APPLICATION_DATA mismatch"},
       {twice, twice, "Duplicated KM_TAG_APPLICATION_ID"},
   };
-  for (const auto& row : rows) {
+  // What the key is bound to, what is presented, and why that is refused, if it is.
+  for (const auto& [binding, given, reason] : rows) {
     const std::string lines =
-        "check_app_id_and_app_data: " + row.reason + " | begin: Wrong AppId or AppData";
-    const bytes key = ta.generate(sign_key(row.key));
-    expect_sign(key, row.reason.empty() ? 0 : -33, row.reason.empty() ? "" : lines, row.given);
+        "check_app_id_and_app_data: " + reason + " | begin: Wrong AppId or AppData";
+    const bytes key = ta.generate(sign_key(binding));
+    expect_sign(key, reason.empty() ? 0 : -33, reason.empty() ? "" : lines, given);
   }
 }
 

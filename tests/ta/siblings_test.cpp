@@ -36,21 +36,16 @@ class Siblings : public testing::Test {
 
 TEST_F(Siblings, SecretsAreKeptFromTheNormalWorld) {
   EXPECT_EQ(provision(record({8192, 1024, 512, 64, 128})), TEEC_SUCCESS);
-  const struct {
-    TEEC_UUID application;
-    uint32_t command, types;
-    size_t size;
-  } rows[] = {
+  const std::tuple<TEEC_UUID, uint32_t, uint32_t, size_t> rows[] = {
       {VAULT, 2, TEEC_PARAM_TYPES(OUT, TEEC_VALUE_OUTPUT, 0, 0), 8192},
       {VAULT, 5, TEEC_PARAM_TYPES(OUT, TEEC_VALUE_OUTPUT, 0, 0), 8192},
       {VAULT, 12, TEEC_PARAM_TYPES(IN, OUT, 0, 0), 4},
       {EARLIER_KEYMASTER_TA_UUID, 27, TEEC_MEMREF_TEMP_INOUT, 64},
   };
-  for (const auto& row : rows) {
-    SCOPED_TRACE(row.command);
-    EXPECT_EQ(call(row.application, row.command, row.types, bytes(row.size)),
-              TEEC_ERROR_ACCESS_DENIED);
-    EXPECT_EQ(call(row.application, row.command, TEEC_VALUE_INPUT), TEEC_ERROR_BAD_PARAMETERS);
+  for (const auto& [application, command, types, size] : rows) {
+    SCOPED_TRACE(command);
+    EXPECT_EQ(call(application, command, types, bytes(size)), TEEC_ERROR_ACCESS_DENIED);
+    EXPECT_EQ(call(application, command, TEEC_VALUE_INPUT), TEEC_ERROR_BAD_PARAMETERS);
   }
 }
 

@@ -124,19 +124,15 @@ TEST_F(Vault, OnlyTheFingerprintApplicationReportsFingers) {
   program_well();
   EXPECT_EQ(export_error(), 0);
   const bytes other = notification(0, 8);
-  const struct {
-    TEEC_UUID from;
-    bytes record;
-    TEEC_Result res;
-  } rows[] = {
+  const std::tuple<TEEC_UUID, bytes, TEEC_Result> rows[] = {
       {FINGERPRINT_TA_UUID, notification(0, 7), TEEC_SUCCESS},
       {VAULT_TA_UUID, other, TEEC_ERROR_ACCESS_DENIED},
       {FINGERPRINT_TA_UUID, cut(other, 1), TEEC_ERROR_BAD_PARAMETERS},
       {FINGERPRINT_TA_UUID, bytes(17), TEEC_ERROR_BAD_PARAMETERS},
       {FINGERPRINT_TA_UUID, notification(1, 8), TEEC_ERROR_BAD_FORMAT},
   };
-  for (const auto& row : rows)
-    EXPECT_EQ(tell(row.from, FAKE_FORWARD, row.record), row.res);
+  for (const auto& [from, record, res] : rows)
+    EXPECT_EQ(tell(from, FAKE_FORWARD, record), res);
   EXPECT_TRUE(failed_with(ta.send({.id = SET_FID, .input = other}), TEEC_ERROR_ACCESS_DENIED));
   EXPECT_EQ(ta.trace().errors(), "soter_handle_setFid: soter deny finger print ta");
   // What was refused leaves the finger before it in place.

@@ -123,10 +123,7 @@ TEST(device, damaged_files_are_told_and_never_a_crash) {
   temp_device made;
   made.open()->make_rpmb();
   const std::string id(64, 'a');
-  struct {
-    const char* file;
-    std::string content;
-  } cases[] = {
+  const std::pair<const char*, std::string> cases[] = {
       {"device.json", ""},
       {"device.json", std::string(6000, '[')},
       {"device.json", std::string(70'000, ' ')},
@@ -139,14 +136,14 @@ TEST(device, damaged_files_are_told_and_never_a_crash) {
       {"boot.json", R"({"boot_seed":")" + id + R"(","machine_boot_id":"","boot_ms":-1})"},
       {"rpmb", std::string(80, 'r')},
   };
-  for (const auto& damage : cases) {
-    std::string good = content_of(made.file(damage.file));
-    set_content(made.file(damage.file), damage.content);
+  for (const auto& [file, content] : cases) {
+    std::string good = content_of(made.file(file));
+    set_content(made.file(file), content);
     auto [reason, text] = error_of([&] { made.open(); });
-    EXPECT_EQ(reason, kind::DAMAGED) << damage.file << ": " << damage.content.substr(0, 80);
-    EXPECT_NE(text.find(damage.file), std::string::npos) << text;
+    EXPECT_EQ(reason, kind::DAMAGED) << file << ": " << content.substr(0, 80);
+    EXPECT_NE(text.find(file), std::string::npos) << text;
     EXPECT_EQ(text.find(id.substr(1)), std::string::npos) << text;
-    set_content(made.file(damage.file), good);
+    set_content(made.file(file), good);
   }
   EXPECT_NE(made.open(), nullptr);
 }

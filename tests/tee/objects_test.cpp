@@ -18,7 +18,7 @@ TEE_ObjectHandle allocate(uint32_t type, uint32_t bits) {
 }
 
 TEST_F(objects, a_secret_comes_back_as_it_went_in) {
-  const bytes secret = hex("00000102030405060708090a0b0c0d0e");
+  const bytes secret = {0, 0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12, 13, 14};
   TEE_ObjectHandle object = allocate(TEE_TYPE_AES, 256);
   // A length that no key has is refused, and the object takes another one.
   const bytes odd(20);
@@ -83,10 +83,7 @@ TEST_F(objects_death, programming_errors_panic) {
   auto populate_empty = [&](const TEE_Attribute* attributes, uint32_t count) {
     (void)TEE_PopulateTransientObject(empty, attributes, count);
   };
-  const struct {
-    const char* message;
-    std::function<void()> call;
-  } rows[] = {
+  const std::pair<const char*, std::function<void()>> rows[] = {
       {"GetObjectInfo1: object handle .* is not valid", [&] { TEE_GetObjectInfo1(stale, &info); }},
       {"GetObjectInfo1: object handle .* is not valid",
        [&] { TEE_GetObjectInfo1(reinterpret_cast<TEE_ObjectHandle>(digest), &info); }},
@@ -105,8 +102,8 @@ TEST_F(objects_death, programming_errors_panic) {
       {"GenerateKey: key size 256 does not fit",
        [&] { (void)TEE_GenerateKey(empty, 256, nullptr, 0); }},
   };
-  for (const auto& row : rows) {
-    EXPECT_DEATH(row.call(), std::string("panic: TEE_.*") + row.message) << row.message;
+  for (const auto& [message, call] : rows) {
+    EXPECT_DEATH(call(), std::string("panic: TEE_.*") + message) << message;
   }
   EXPECT_NE(recycled, stale);
 }

@@ -25,10 +25,7 @@ TEST_F(operations_death, calls_that_do_not_fit_panic) {
   auto sealing = operation(TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 128, aes());
   ASSERT_EQ(TEE_AEInit(sealing, block.data(), 12, 128, 0, 0), TEE_SUCCESS);
   ASSERT_EQ(TEE_AEUpdate(sealing, block.data(), 1, out, &length), TEE_SUCCESS);
-  const struct {
-    const char* message;
-    std::function<void()> call;
-  } rows[] = {
+  const std::pair<const char*, std::function<void()>> rows[] = {
       {"SetOperationKey: a digest takes no key", [&] { TEE_SetOperationKey(digest, empty); }},
       {"SetOperationKey: key is not an initialised", [&] { TEE_SetOperationKey(keyless, empty); }},
       {"SetOperationKey: key of type", [&] { TEE_SetOperationKey(keyless, mac_key); }},
@@ -47,8 +44,8 @@ TEST_F(operations_death, calls_that_do_not_fit_panic) {
        [&] { TEE_AEDecryptFinal(sealing, nullptr, 0, nullptr, &(length = 0), out, 16); }},
       {"Panic: code 0xffff0007", [&] { TEE_Panic(TEE_ERROR_BAD_STATE); }},
   };
-  for (const auto& row : rows) {
-    EXPECT_DEATH(row.call(), std::string("panic: TEE_") + row.message) << row.message;
+  for (const auto& [message, call] : rows) {
+    EXPECT_DEATH(call(), std::string("panic: TEE_") + message) << message;
   }
 }
 

@@ -87,12 +87,7 @@ TEST_F(sessions, logins_are_derived_and_checked) {
   client user(made.path(), echo::FIRST);
   uint32_t own_group = getegid();
   uint32_t no_group = 0xFFFFFFF0;
-  struct {
-    uint32_t method;
-    const void* data;
-    TEEC_Result result;
-    const char* begins;
-  } cases[] = {
+  const std::tuple<uint32_t, const void*, TEEC_Result, const char*> cases[] = {
       {TEEC_LOGIN_USER, nullptr, TEEC_SUCCESS, "1:"},
       {TEEC_LOGIN_GROUP, &own_group, TEEC_SUCCESS, "2:"},
       {TEEC_LOGIN_APPLICATION, nullptr, TEEC_SUCCESS, "4:"},
@@ -101,12 +96,12 @@ TEST_F(sessions, logins_are_derived_and_checked) {
       {TEEC_LOGIN_PUBLIC, &own_group, TEEC_ERROR_BAD_PARAMETERS, ""},
       {TEE_LOGIN_TRUSTED_APP, nullptr, TEEC_ERROR_BAD_PARAMETERS, ""},
   };
-  for (const auto& row : cases) {
-    EXPECT_EQ(user.open_session(echo::FIRST, nullptr, row.method, row.data), row.result);
-    if (row.result != TEEC_SUCCESS) continue;
+  for (const auto& [method, data, result, begins] : cases) {
+    EXPECT_EQ(user.open_session(echo::FIRST, nullptr, method, data), result);
+    if (result != TEEC_SUCCESS) continue;
     std::string identity;
     EXPECT_EQ(relay(user, {}, &identity), TEEC_SUCCESS);
-    EXPECT_EQ(identity.rfind(row.begins, 0), 0u) << identity;
+    EXPECT_EQ(identity.rfind(begins, 0), 0u) << identity;
     EXPECT_EQ(identity[2 + 14], '5') << identity;  // the UUID's version
   }
 }

@@ -1,8 +1,6 @@
 // API calls without a trusted application.
 #include "support.h"
 
-#include <string>
-
 #include "temp_device.h"
 
 namespace tee::test {
@@ -14,19 +12,6 @@ struct open_device {
 };
 
 }  // namespace
-
-bytes hex(std::string_view text) {
-  bytes result;
-  std::string digits;
-  for (char c : text) {
-    if (c == ' ') continue;
-    digits.push_back(c);
-    if (digits.size() < 2) continue;
-    result.push_back(static_cast<uint8_t>(std::stoul(digits, nullptr, 16)));
-    digits.clear();
-  }
-  return result;
-}
 
 device& shared_device() {
   static open_device shared;

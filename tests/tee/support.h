@@ -6,7 +6,6 @@
 
 #include <gtest/gtest.h>
 #include <memory>
-#include <string_view>
 #include <vector>
 
 #include "tee/device/device.h"
@@ -15,9 +14,6 @@
 namespace tee::test {
 
 using bytes = std::vector<uint8_t>;
-
-// hex: the bytes of a text of hexadecimal digits; spaces count for nothing.
-bytes hex(std::string_view text);
 
 // shared_device: one device for the whole test program, in a temporary folder.
 device& shared_device();

@@ -1,6 +1,7 @@
 // MACs and ciphers in what no trusted application of ours asks for: queries, overlapping buffers,
 // tags of every length. That the values are the published ones is shown at the command level.
 #include <algorithm>
+#include <openssl/hmac.h>
 
 #include "support.h"
 
@@ -12,6 +13,9 @@ using symmetric = in_instance;
 // A query of the length takes nothing in. Two operations on one key share no running computation,
 // and the second round finds them fresh.
 TEST_F(symmetric, macs_can_be_asked_for_their_length) {
+  const uint8_t abc[] = {'a', 'b', 'c'};
+  bytes expected(32);
+  HMAC(EVP_sha256(), "key", 3, abc, sizeof(abc), expected.data(), nullptr);
   TEE_OperationHandle macs[2];
   for (auto& mac : macs) {
     mac = operation(TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 256,
@@ -28,8 +32,7 @@ TEST_F(symmetric, macs_can_be_asked_for_their_length) {
       EXPECT_EQ(TEE_MACComputeFinal(mac, "bc", 2, out.data(), &length), TEE_ERROR_SHORT_BUFFER);
       EXPECT_EQ(length, 32U);
       EXPECT_EQ(TEE_MACComputeFinal(mac, "bc", 2, out.data(), &length), TEE_SUCCESS);
-      // printf abc | openssl mac -digest SHA256 -macopt key:key HMAC
-      EXPECT_EQ(out, hex("9c196e32dc0175f86f4b1cb89289d6619de6bee699e4c378e68309ed97a1a6ab"));
+      EXPECT_EQ(out, expected);
     }
   }
   for (auto mac : macs)

@@ -87,25 +87,21 @@ TEST(DerWriter, BitStringsGrowWhenBitsAreCleared) {
 
 // Expected texts from `date -u -d @SECONDS`; the last year is beyond any calendar, and still text.
 TEST(DerWriter, Dates) {
-  const struct {
-    uint64_t seconds;
-    const char* utc;
-    const char* generalized;
-  } cases[] = {
-      {4294967, "700219170247Z", "19700219170247Z"},
-      {951782400, "000229000000Z", "20000229000000Z"},
-      {4107542400, "000301000000Z", "21000301000000Z"},
-      {0xFFFFFFFF, "060207062815Z", "21060207062815Z"},
+  const std::pair<uint64_t, std::string> cases[] = {
+      {4294967, "19700219170247Z"},
+      {951782400, "20000229000000Z"},
+      {4107542400, "21000301000000Z"},
+      {0xFFFFFFFF, "21060207062815Z"},
   };
-  for (const auto& row : cases) {
+  for (const auto& [seconds, text] : cases) {
     for (const uint32_t type : {DER_UTC_TIME, DER_GENERALIZED_TIME}) {
-      const ASN1_TIME time = ASN1_TIME_from_seconds(type, row.seconds);
+      const ASN1_TIME time = ASN1_TIME_from_seconds(type, seconds);
       uint8_t buffer[32];
       const int32_t length = X509_TIME_write(&time, buffer, sizeof(buffer));
       const bool utc = type == DER_UTC_TIME;
       ASSERT_EQ(length, utc ? 15 : 17);
       EXPECT_EQ(buffer[0], type);
-      EXPECT_EQ(std::string(buffer + 2, buffer + length), utc ? row.utc : row.generalized);
+      EXPECT_EQ(std::string(buffer + 2, buffer + length), text.substr(utc ? 2 : 0));
     }
   }
   uint8_t buffer[32];

@@ -85,22 +85,18 @@ TEST_F(ParamSet, MarshalsWhatItUnmarshalled) {
 }
 
 TEST_F(ParamSet, NeverTrustsACount) {
-  const struct {
-    std::string_view input;
-    TEE_Result res;
-    const char* message;
-  } cases[] = {
+  const std::tuple<std::string_view, TEE_Result, const char*> cases[] = {
       {"ffffffff", TEE_ERROR_OUT_OF_MEMORY, "Out of memory"},
       {"abaaaa0a", TEE_ERROR_OUT_OF_MEMORY, "Out of memory"},  // x 24 is 2^32 + 8
       {"aaaaaa0a", TEE_ERROR_GENERIC, "Too short input"},      // x 24 is 2^32 - 16
       {"01000000 59020090 00000000 0000000000000000 ffffffff 00000000 00", TEE_ERROR_GENERIC,
        "Too short input"},
   };
-  for (const auto& c : cases) {
+  for (const auto& [input, res, message] : cases) {
     keymaster_key_param_set_t set;
-    EXPECT_EQ(unmarshal(from_hex(c.input), &set), c.res) << c.input;
-    EXPECT_LE(platform::largest_request, c.input.size());
-    EXPECT_TRUE(platform::traced(c.message)) << c.message;
+    EXPECT_EQ(unmarshal(from_hex(input), &set), res) << input;
+    EXPECT_LE(platform::largest_request, input.size());
+    EXPECT_TRUE(platform::traced(message)) << message;
   }
   EXPECT_EQ(unmarshal(from_hex(THREE), nullptr), TEE_ERROR_SHORT_BUFFER);
 }
