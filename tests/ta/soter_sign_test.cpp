@@ -135,12 +135,7 @@ TEST_F(SoterDocument, IsSignedWithEverySchemeOfTheKey) {
 TEST_F(SoterDocument, IsRefused) {
   const std::string no_text = "produce_soter_sign_json: Not a valid utf8 string, strlen(raw) ";
   const bytes blob = made();
-  const struct {
-    scheme how;
-    std::string message;
-    bool counted;  // whether the counter moves
-    std::string trace;
-  } rows[] = {
+  const std::tuple<scheme, std::string, bool, std::string> rows[] = {
       {PKCS1, "abc\0"s, false, no_text + "3 length 4"},
       {PKCS1, "\0abc"s, false, no_text + "0 length 4"},
       {PKCS1, "a\xed\xa0\x80", false, no_text + "4 length 4"},
@@ -150,11 +145,11 @@ TEST_F(SoterDocument, IsRefused) {
       {UNDIGESTED, std::string(128, 'x'), true, "rsa_sign_finish: soter enhance error ffff000c"},
   };
   int counter = 0;
-  for (const auto& row : rows) {
-    const bytes refusing = made({}, row.how);
-    EXPECT_TRUE(refused(sign(refusing, row.how, row.message), KM_ERROR_UNKNOWN_ERROR));
-    EXPECT_TRUE(ta.trace().has(row.trace)) << ta.trace().errors();
-    counter += row.counted ? 2 : 1;
+  for (const auto& [how, message, counted, trace] : rows) {
+    const bytes refusing = made({}, how);
+    EXPECT_TRUE(refused(sign(refusing, how, message), KM_ERROR_UNKNOWN_ERROR));
+    EXPECT_TRUE(ta.trace().has(trace)) << ta.trace().errors();
+    counter += counted ? 2 : 1;
     expect_signed(blob, "", R"("raw":"","counter":)" + std::to_string(counter) + R"(,"uid":0,)");
   }
 }

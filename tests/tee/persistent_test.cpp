@@ -55,10 +55,7 @@ class persistent : public ::testing::Test {
 };
 
 TEST_F(persistent, flags_of_two_handles_agree_or_conflict) {
-  struct {
-    uint32_t first, second;
-    bool together;
-  } cases[] = {
+  const std::tuple<uint32_t, uint32_t, bool> cases[] = {
       {READ, READ, false},
       {READ | SHARE_R, READ | SHARE_R, true},
       {READ | SHARE_R, READ, false},

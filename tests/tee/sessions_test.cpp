@@ -56,12 +56,7 @@ TEST_F(sessions, what_a_trusted_application_leaves_is_counted_and_reported) {
 
 TEST_F(sessions, the_callee_sees_who_calls) {
   const TEE_UUID missing = {9, 9, 9, {}};
-  struct {
-    std::vector<TEE_UUID> path;
-    TEEC_Result result;
-    uint32_t inner_origin;
-    const char* identity;
-  } cases[] = {
+  const std::tuple<std::vector<TEE_UUID>, TEEC_Result, uint32_t, const char*> cases[] = {
       {{}, TEEC_SUCCESS, 0, "0:00000000-0000-0000-0000-000000000000"},
       {{echo::SECOND},
        TEEC_SUCCESS,
@@ -73,12 +68,12 @@ TEST_F(sessions, the_callee_sees_who_calls) {
   };
   client user(made.path(), echo::FIRST);
   host::set_trace_level(0);
-  for (auto& row : cases) {
+  for (const auto& [path, result, wanted_origin, wanted_identity] : cases) {
     std::string identity;
     uint32_t inner_origin = 0;
-    EXPECT_EQ(relay(user, row.path, &identity, &inner_origin), row.result);
-    EXPECT_EQ(inner_origin, row.inner_origin);
-    EXPECT_EQ(identity, row.identity);
+    EXPECT_EQ(relay(user, path, &identity, &inner_origin), result);
+    EXPECT_EQ(inner_origin, wanted_origin);
+    EXPECT_EQ(identity, wanted_identity);
   }
   host::set_trace_level(TEE_TRACE_ERROR);
 }

@@ -170,11 +170,7 @@ TEST_P(storage, trouble_with_the_database_is_no_loss) {
 TEST_P(storage, a_power_cut_or_a_full_disk_leaves_the_old_object_or_the_new_one) {
   enum { DONE, NO_SPACE, OTHER };
   const std::string content(20'000, 'n');
-  struct {
-    const char* before;
-    std::function<void(device&)> change;
-    std::string after;
-  } changes[] = {
+  const std::tuple<const char*, std::function<void(device&)>, std::string> changes[] = {
       {"absent", [&](device& dev) { save(dev, GetParam(), "a", content); }, content},
       {"old", [&](device& dev) { save(dev, GetParam(), "a", content); }, content},
       {"old", [](device& dev) { dev.objects().remove(name_of(GetParam(), "a")); }, "absent"},

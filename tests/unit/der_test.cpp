@@ -144,6 +144,8 @@ keymaster_key_param_set_t sample_characteristics() {
 // a field is passed over, an unknown one is traced.
 // clang-format off
 constexpr char SAMPLE_EXTENSION[] =
+    "30818b"                            // Extension, not critical
+    "060a2b06010401d679020111" "047d"   // its identifier and content
     "307b"                              // KeyDescription
     "020101020101020102020101"          // versions and security levels 1, 1, 2, 1
     "0403c0ffee" "0400"                 // challenge, unique id
@@ -166,7 +168,8 @@ TEST_F(KeyDescriptions, EncodeAsWrittenByHand) {
   ASSERT_TRUE(add_blob(&request, KM_TAG_ATTESTATION_CHALLENGE, challenge));
   X509_EXTENSION* extension = X509_EXTENSION_alloc();
   ASSERT_EQ(character_to_extension(sample_characteristics(), {}, request, extension), KM_ERROR_OK);
-  EXPECT_EQ(hex(extension->value.view()), SAMPLE_EXTENSION);
+  const auto write = [=](der_cursor* out) { return X509_EXTENSION_TYPE.write(out, extension); };
+  EXPECT_EQ(written(write, 256), SAMPLE_EXTENSION);
   X509_EXTENSION_free(extension);
   EXPECT_EQ(platform::trace_lines.size(), 1u);
   EXPECT_TRUE(platform::traced("Unknown tag 0x70002afb"));
