@@ -120,6 +120,7 @@ TEST(Attestation, Capacities) {
   const reply whole = ta.send_well(attest_request(blob));
   const size_t first = 4 + client::field_reader(whole.output()).u32();
   ASSERT_EQ(whole.output_size, first + 4 + STORED_SIZE);
+  // The room, both results, and how many certificates are there.
   const std::tuple<size_t, TEEC_Result, int32_t, uint32_t> rows[] = {
       {0, TEEC_ERROR_GENERIC, 0, 0},
       {3, TEEC_ERROR_GENERIC, 0, 0},

@@ -50,6 +50,12 @@ param_set aes_key(uint32_t mode, const param_set& more = {}) {
       .append(more);
 }
 
+param_set bootloader_key(uint32_t algorithm, uint32_t bits) {
+  return with(any_use(algorithm), KM_TAG_KEY_SIZE, {bits})
+      .add(KM_TAG_RSA_PUBLIC_EXPONENT, 3)
+      .add(KM_TAG_BOOTLOADER_ONLY, 1);
+}
+
 const param_set CBC = one(KM_TAG_BLOCK_MODE, KM_MODE_CBC);
 const param_set OWN_NONCE = param_set(CBC).add_bytes(KM_TAG_NONCE, bytes(16));
 constexpr char NOT_YET[] = "authorize_begin: Key not yet valid";
@@ -119,6 +125,14 @@ const begin_case BEGINS[] = {
     {0, "", signer(USAGE, NOW), sign_request(), VERIFY},
     {-25, EXPIRED, signer(USAGE, NOW - 1), sign_request(), VERIFY},
     {0, "", signer(USAGE, 1)},
+    // What opens again is not restricted in its nonce, nor other modes in their MAC length.
+    {0, "", aes_key(KM_MODE_CBC, one(KM_TAG_PURPOSE, DECRYPT)), OWN_NONCE, DECRYPT},
+    {0, "", aes_key(KM_MODE_GCM, one(KM_TAG_MIN_MAC_LENGTH, 128).append(CBC)),
+     param_set(CBC).add(KM_TAG_MAC_LENGTH, 96), ENCRYPT},
+    // The public half of a key is never restricted.
+    {0, "", bootloader_key(KM_ALGORITHM_EC, 256), mac_use(), VERIFY},
+    {-33, "Bootloader only key", bootloader_key(KM_ALGORITHM_EC, 256), mac_use(), SIGN},
+    {0, "", bootloader_key(KM_ALGORITHM_RSA, 512), one(KM_TAG_PADDING, KM_PAD_NONE), ENCRYPT},
     // Of several reasons the first of the key's parameters decides.
     {-33, "Bootloader only key", signer(KM_TAG_BOOTLOADER_ONLY, 1).add(ACTIVE, NOW + 1)},
     {-24, NOT_YET, signer(ACTIVE, NOW + 1).add(KM_TAG_BOOTLOADER_ONLY, 1)},
@@ -155,6 +169,9 @@ TEST_F(auth, clock_follows_system_time_alone) {
 }
 
 TEST_F(auth, rate_limit_counts_whole_seconds_and_includes_the_limit) {
+  // A record whose time is over goes to the next key, and nothing of it remains.
+  expect_sign(ta.generate(signer(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 0)));
+  ta.advance(1'000);
   // A limit beyond the device's uptime: a record that only counts uses is no use at time 0.
   const bytes key =
       ta.generate(signer(KM_TAG_MAX_USES_PER_BOOT, 9).add(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 10'000));
@@ -164,6 +181,10 @@ TEST_F(auth, rate_limit_counts_whole_seconds_and_includes_the_limit) {
   ta.advance(1);
   expect_sign(key);
   expect_sign(key, -54, TOO_SOON);
+  // A begin whose authentication is due is a use.
+  const bytes due = ta.generate(user_key(1).add(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 1));
+  expect_sign(due);
+  expect_sign(due, -54, TOO_SOON);
 }
 
 TEST_F(auth, full_log_lets_a_rate_limited_key_pass_until_a_record_is_over) {
@@ -310,10 +331,14 @@ TEST_F(auth, operation_wants_its_own_token_at_every_step) {
   EXPECT_TRUE(ta.trace().has("authorize_begin: OP AUTH NEEDED"));
   EXPECT_TRUE(succeeded(ta.update(handle, bytes(5), token_for(handle))));
   EXPECT_TRUE(succeeded(ta.finish(handle, {}, token_for(handle))));
+  // Unless the key has a timeout: then the token of begin is enough.
+  const bytes timed = ta.generate(user_key(3).add(KM_TAG_AUTH_TIMEOUT, 1));
+  EXPECT_TRUE(succeeded(ta.finish(ta.begun(SIGN, timed, sign_request(token_for(0))))));
 }
 
 TEST_F(auth, application_must_present_what_the_key_is_bound_to) {
   const param_set bound = bound_to("abc", "def");
+  const param_set of_data = without(bound, KM_TAG_APPLICATION_ID);
   const param_set twice = bound_to("abc").append(bound_to("abc"));
   const std::tuple<param_set, param_set, std::string> rows[] = {
       {bound, bound, ""},
@@ -323,6 +348,7 @@ TEST_F(auth, application_must_present_what_the_key_is_bound_to) {
       {bound, bound_to("ab", "def"), "KM_TAG_APPLICATION_ID mismatch"},
       {bound, bound_to("abc"), "KM_TAG_APPLICATION_DATA mismatch"},
       {bound, bound_to("abc", "defg"), "KM_TAG_APPLICATION_DATA mismatch"},
+      {of_data, {}, "KM_TAG_APPLICATION_DATA mismatch"},
       {twice, twice, "Duplicated KM_TAG_APPLICATION_ID"},
   };
   // What the key is bound to, what is presented, and why that is refused, if it is.

@@ -138,12 +138,8 @@ TEST(EntryPoints, CreateForgetsTheInstanceBefore) {
 }
 
 TEST(Configure, KeepsWhatASetDoesNotName) {
-  const struct {
-    const char* what;
-    bytes set;
-    TEEC_Result res;
-    uint32_t version, patchlevel;  // afterwards
-  } steps[] = {
+  // What is sent, its answer, and the two values afterwards.
+  const std::tuple<const char*, bytes, TEEC_Result, uint32_t, uint32_t> steps[] = {
       {"an empty set configures", param_set().marshal(), 0, 0, 0},
       {"one of the two", one(KM_TAG_OS_VERSION, 0x7530).marshal(), 0, 0x7530, 0},
       {"other tags, and the last wins",
@@ -157,11 +153,11 @@ TEST(Configure, KeepsWhatASetDoesNotName) {
   EXPECT_TRUE(failed_with(ta.send({.id = 25, .input = {1, 0, 0, 0}}), BAD_PARAMETERS));
   EXPECT_EQ(ta.trace().errors(), "unmarshal: Too short input | configure: Unmarshal failed");
   EXPECT_TRUE(refused(ta.send({.id = 22}), KM_ERROR_KEYMASTER_NOT_CONFIGURED));
-  for (const auto& step : steps) {
-    EXPECT_TRUE(failed_with(ta.send({.id = 25, .input = step.set}), step.res)) << step.what;
+  for (const auto& [what, set, res, version, patchlevel] : steps) {
+    EXPECT_TRUE(failed_with(ta.send({.id = 25, .input = set}), res)) << what;
     const param_set made = ta.characteristics(ta.generate(hmac_key(256)));
-    EXPECT_EQ(made.number(KM_TAG_OS_VERSION), step.version) << step.what;
-    EXPECT_EQ(made.number(KM_TAG_OS_PATCHLEVEL), step.patchlevel) << step.what;
+    EXPECT_EQ(made.number(KM_TAG_OS_VERSION), version) << what;
+    EXPECT_EQ(made.number(KM_TAG_OS_PATCHLEVEL), patchlevel) << what;
   }
 }
 

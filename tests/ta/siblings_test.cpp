@@ -36,6 +36,7 @@ class Siblings : public testing::Test {
 
 TEST_F(Siblings, SecretsAreKeptFromTheNormalWorld) {
   EXPECT_EQ(provision(record({8192, 1024, 512, 64, 128})), TEEC_SUCCESS);
+  // A command with the types and the room that it takes from other trusted applications.
   const std::tuple<TEEC_UUID, uint32_t, uint32_t, size_t> rows[] = {
       {VAULT, 2, TEEC_PARAM_TYPES(OUT, TEEC_VALUE_OUTPUT, 0, 0), 8192},
       {VAULT, 5, TEEC_PARAM_TYPES(OUT, TEEC_VALUE_OUTPUT, 0, 0), 8192},

@@ -149,12 +149,8 @@ TEST_F(Vault, AnswersThatMisbehaveKeepNothing) {
   wide[0].second.assign(512, 0xC5);
   items uuid_15 = props;
   uuid_15[2].second.pop_back();
-  const struct {
-    const char* name;
-    fake_answer how;
-    bytes content;
-    int32_t check, exported;  // what 0xFF01 and 0xFF02 answer
-  } rows[] = {
+  // What the vault answers, and what 0xFF01 and 0xFF02 make of it.
+  const std::tuple<const char*, fake_answer, bytes, int32_t, int32_t> rows[] = {
       {"as it should be", {ASK_KEY, 0, 0, 0}, box(key), 0, 0},
       {"n, e and d alone", {ASK_KEY, 0, 0, 0}, box(key_items(attk(), 3)), 0, 0},
       {"a repeated item", {ASK_KEY, 0, 0, 0}, box(twice), 0, 0},
@@ -176,16 +172,16 @@ TEST_F(Vault, AnswersThatMisbehaveKeepNothing) {
       {"no CPU id", {ASK_CPU_ID, TEE_ERROR_SHORT_BUFFER, FOR_EVER, 0}, {}, 0, -1},
       {"a long CPU id", {ASK_CPU_ID, 0, 0, 1}, bytes(64, 'c'), 0, -1},
   };
-  for (const auto& row : rows) {
-    SCOPED_TRACE(row.name);
+  for (const auto& [name, how, content, check, exported] : rows) {
+    SCOPED_TRACE(name);
     restart();
     program_well();
-    program(row.how, row.content);
-    EXPECT_EQ(ta.send(soter_request(CHECK)).km_error, row.check);
-    EXPECT_EQ(export_error(), row.exported);
+    program(how, content);
+    EXPECT_EQ(ta.send(soter_request(CHECK)).km_error, check);
+    EXPECT_EQ(export_error(), exported);
     // Nothing was kept of what failed: the next call asks again, and is served.
     program_well();
-    EXPECT_EQ(export_error(), row.exported == -1 ? 0 : row.exported);
+    EXPECT_EQ(export_error(), exported == -1 ? 0 : exported);
   }
 }
 

@@ -135,6 +135,7 @@ TEST_F(SoterDocument, IsSignedWithEverySchemeOfTheKey) {
 TEST_F(SoterDocument, IsRefused) {
   const std::string no_text = "produce_soter_sign_json: Not a valid utf8 string, strlen(raw) ";
   const bytes blob = made();
+  // A message, whether the counter moves, and what is traced.
   const std::tuple<scheme, std::string, bool, std::string> rows[] = {
       {PKCS1, "abc\0"s, false, no_text + "3 length 4"},
       {PKCS1, "\0abc"s, false, no_text + "0 length 4"},

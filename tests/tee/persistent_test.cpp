@@ -55,6 +55,7 @@ class persistent : public ::testing::Test {
 };
 
 TEST_F(persistent, flags_of_two_handles_agree_or_conflict) {
+  // The flags of both, and whether they go together.
   const std::tuple<uint32_t, uint32_t, bool> cases[] = {
       {READ, READ, false},
       {READ | SHARE_R, READ | SHARE_R, true},

@@ -56,6 +56,7 @@ TEST_F(sessions, what_a_trusted_application_leaves_is_counted_and_reported) {
 
 TEST_F(sessions, the_callee_sees_who_calls) {
   const TEE_UUID missing = {9, 9, 9, {}};
+  // A path, its result and origin, and whom the last one sees.
   const std::tuple<std::vector<TEE_UUID>, TEEC_Result, uint32_t, const char*> cases[] = {
       {{}, TEEC_SUCCESS, 0, "0:00000000-0000-0000-0000-000000000000"},
       {{echo::SECOND},

@@ -170,6 +170,7 @@ TEST_P(storage, trouble_with_the_database_is_no_loss) {
 TEST_P(storage, a_power_cut_or_a_full_disk_leaves_the_old_object_or_the_new_one) {
   enum { DONE, NO_SPACE, OTHER };
   const std::string content(20'000, 'n');
+  // What is there before, the change, and what is there then.
   const std::tuple<const char*, std::function<void(device&)>, std::string> changes[] = {
       {"absent", [&](device& dev) { save(dev, GetParam(), "a", content); }, content},
       {"old", [&](device& dev) { save(dev, GetParam(), "a", content); }, content},

@@ -14,6 +14,7 @@ constexpr trace_site AT = {"begin", 120};
 using Trace = platform::fixture;
 
 TEST_F(Trace, NamesLevelThreadFunctionAndLine) {
+  // Level, thread, message, and the line.
   const std::tuple<uint32_t, uint32_t, const char*, const char*> cases[] = {
       {1, 0x2a, "newline\n", "ERR [0x2a] KEYMASTER:begin:120: newline\n"},
       {1, 0x2a, "none", "ERR [0x2a] KEYMASTER:begin:120: none\n"},
