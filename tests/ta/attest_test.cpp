@@ -71,25 +71,20 @@ bytes subject_of(const certificate& from) {
 
 TEST(Attestation, ChainsVerifyForRsaAndEc) {
   ta_under_test ta;
-  const struct {
-    param_set description;
-    param_set params;
-    const char* not_before;
-    const char* not_after;
-    uint8_t key_usage;
-  } cases[] = {
-      {EC_256_KEY, {}, "700101000000Z", "060207062815Z", 0x80},
+  const param_set verifying = with(EC_256_KEY, KM_TAG_PURPOSE, {VERIFY});
+  const param_set decrypting = with(RSA_KEY, KM_TAG_PURPOSE, {DECRYPT});
+  // The key, what is asked for, the certificate's validity and its key usage.
+  const std::tuple<param_set, param_set, const char*, const char*, uint8_t> cases[] = {
+      {verifying, {}, "700101000000Z", "060207062815Z", 0x80},
       // The algorithm that is asked for chooses no other key.
-      {without(RSA_KEY, KM_TAG_PURPOSE).add(KM_TAG_PURPOSE, KM_PURPOSE_DECRYPT),
-       one(KM_TAG_ALGORITHM, KM_ALGORITHM_EC), "010909014640Z", "700219170247Z", 0x30},
+      {decrypting, one(KM_TAG_ALGORITHM, KM_ALGORITHM_EC), "010909014640Z", "700219170247Z", 0x30},
       // The expiry is cut to 32 bits of milliseconds before it becomes seconds.
       {RSA_KEY, {}, "010909014640Z", "700219170247Z", 0xB0},
   };
-  for (const auto& row : cases) {
-    const bytes blob = ta.generate(row.description);
-    const param_set params =
-        param_set(row.params).add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes{1, 2, 3});
-    const reply answer = ta.send_well(attest_request(blob, params));
+  for (const auto& [key, asked, not_before, not_after, key_usage] : cases) {
+    const bytes blob = ta.generate(key);
+    const reply answer = ta.send_well(
+        attest_request(blob, param_set(asked).add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes(3))));
     EXPECT_EQ(answer.b, 2u);
     const std::vector<certificate> chain = parse_chain(answer.output());
     ASSERT_EQ(chain.size(), 2u);
@@ -98,15 +93,14 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     EXPECT_EQ(X509_check_issued(chain[1].get(), chain[0].get()), X509_V_OK);
     EXPECT_EQ(X509_get_version(chain[0].get()), 2);
     EXPECT_EQ(ASN1_INTEGER_get(X509_get0_serialNumber(chain[0].get())), 1);
-    EXPECT_EQ(text_of(X509_get0_notBefore(chain[0].get())), row.not_before);
-    EXPECT_EQ(text_of(X509_get0_notAfter(chain[0].get())), row.not_after);
-    EXPECT_EQ(extension_value(chain[0], NID_key_usage), (bytes{3, 2, 0, row.key_usage}));
-    const bytes description = extension_value(chain[0], KEY_DESCRIPTION);
-    EXPECT_FALSE(description.empty());
+    EXPECT_EQ(text_of(X509_get0_notBefore(chain[0].get())), not_before);
+    EXPECT_EQ(text_of(X509_get0_notAfter(chain[0].get())), not_after);
+    EXPECT_EQ(extension_value(chain[0], NID_key_usage), (bytes{3, 2, 0, key_usage}));
+    EXPECT_FALSE(extension_value(chain[0], KEY_DESCRIPTION).empty());
     EXPECT_EQ(common_name(X509_get_subject_name(chain[0].get())), "A Keymaster Key\0"s);
     EXPECT_EQ(common_name(X509_get_issuer_name(chain[0].get())).size(), 18u);
     EXPECT_EQ(X509_get_signature_nid(chain[0].get()), NID_sha256WithRSAEncryption);
-    if (row.description.number(KM_TAG_ALGORITHM) == KM_ALGORITHM_EC) continue;
+    if (key.number(KM_TAG_ALGORITHM) == KM_ALGORITHM_EC) continue;
     EXPECT_EQ(subject_of(chain[0]),
               client::copy_of(ta.send_well(key_request(command::EXPORT_KEY, blob)).output()));
   }
