@@ -142,6 +142,7 @@ TEST(Version, KeysOpenUnderTheirOwnAlone) {
       ta.expect_refused(key_request(id, blob), open_error);
     }
     ta.expect_refused(key_request(command::EXPORT_KEY, blob), open_error == 0 ? -17 : open_error);
+    ta.expect_refused(attest_request(blob), open_error == 0 ? -4 : open_error);
     EXPECT_TRUE(refused(ta.try_begin(SIGN, blob, mac_use()), open_error));
     const reply upgraded =
         ta.expect_refused(upgrade_request(blob), upgrade_error,
