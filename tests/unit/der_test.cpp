@@ -1,13 +1,12 @@
 // The DER writer and the key description, against encodings that were written by hand.
 #include <algorithm>
-#include <gtest/gtest.h>
 #include <string>
 #include <vector>
 
+#include "fixture.h"
 #include "keymaster/attest/der/oids.h"
 #include "keymaster/attest/der/x509.h"
 #include "keymaster/attest/key_description.h"
-#include "platform.h"
 
 namespace keymaster {
 namespace {

@@ -1,10 +1,9 @@
 // The DER codec of ECDSA signatures: what it makes, and that it takes nothing else.
 #include "keymaster/alg/ec/ec_signature.h"
 
-#include <gtest/gtest.h>
 #include <vector>
 
-#include "platform.h"
+#include "fixture.h"
 
 namespace keymaster {
 namespace {

@@ -2,11 +2,10 @@
 #include "keymaster/params/param_set.h"
 
 #include <algorithm>
-#include <gtest/gtest.h>
 #include <vector>
 
+#include "fixture.h"
 #include "keymaster/params/marshal.h"
-#include "platform.h"
 
 namespace keymaster {
 namespace {

@@ -5,7 +5,6 @@
 #include "tee_extensions.h"
 
 #include <cstddef>
-#include <gtest/gtest.h>
 #include <string>
 #include <vector>
 
@@ -24,15 +23,5 @@ void reset();
 
 // traced: whether the last line ends with the message "TEXT\n".
 bool traced(const std::string& text);
-
-// A test that begins with a reset, and in the end has freed and wiped all that it allocated.
-class fixture : public testing::Test {
- protected:
-  fixture() { reset(); }
-  ~fixture() override {
-    EXPECT_EQ(live_blocks, 0u);
-    EXPECT_EQ(unwiped_blocks, 0u);
-  }
-};
 
 }  // namespace platform

@@ -1,10 +1,9 @@
 // The texts of SOTER documents: JSON byte by byte, UTF-8 by what must not pass, base64 by the
 // vectors of RFC 4648 and the lines of PEM.
-#include <gtest/gtest.h>
 #include <limits>
 #include <string>
 
-#include "platform.h"
+#include "fixture.h"
 #include "soter/base64.h"
 #include "soter/json.h"
 #include "soter/utf8.h"

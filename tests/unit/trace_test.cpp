@@ -1,10 +1,8 @@
 // The form of trace lines, and of the dump of a parameter set.
 #include "base/trace.h"
 
-#include <gtest/gtest.h>
-
+#include "fixture.h"
 #include "keymaster/params/dump.h"
-#include "platform.h"
 
 namespace keymaster {
 namespace {
