@@ -15,12 +15,39 @@ const int KEY_DESCRIPTION = OBJ_create("1.3.6.1.4.1.11129.2.1.17", "keyDescripti
 
 using certificate = std::unique_ptr<X509, decltype(&X509_free)>;
 
+// Whether the bytes are values in DER (X.690, 10): each in the one form that it may have. The order
+// of sets is not looked at: theirs is that of adding, which is intended.
+bool is_der(byte_view in) {
+  while (!in.empty()) {
+    const uint8_t* at = in.data();
+    long length = 0;
+    int tag = 0;
+    int tag_class = 0;
+    const int form = ASN1_get_object(&at, &length, &tag, &tag_class, static_cast<long>(in.size()));
+    if ((form & 0x80) != 0 || (form & 1) != 0) return false;  // malformed, or without a length
+    const byte_view content(at, static_cast<size_t>(length));
+    const bool constructed = (form & V_ASN1_CONSTRUCTED) != 0;
+    const int shortest = ASN1_object_size(constructed ? 1 : 0, static_cast<int>(length), tag);
+    if (content.data() + length - in.data() != shortest) return false;
+    if (constructed && !is_der(content)) return false;
+    const bool padded = length > 1 && (content[0] == 0 || content[0] == 0xFF) &&
+                        (content[0] & 0x80) == (content[1] & 0x80);
+    const bool integer = tag_class == V_ASN1_UNIVERSAL && tag == V_ASN1_INTEGER;
+    const bool boolean = tag_class == V_ASN1_UNIVERSAL && tag == V_ASN1_BOOLEAN;
+    if (integer && (length == 0 || padded)) return false;
+    if (boolean && (length != 1 || content[0] != 0xFF)) return false;  // FALSE is the default
+    in = in.subspan(static_cast<size_t>(shortest));
+  }
+  return true;
+}
+
 // The two certificates of a chain; its lengths must cover it exactly.
 std::vector<certificate> parse_chain(byte_view chain) {
   std::vector<certificate> links;
   client::field_reader reader(chain);
   while (reader.left() > 0) {
     const byte_view der = reader.field();
+    EXPECT_TRUE(is_der(der));
     const unsigned char* next = der.data();
     links.emplace_back(d2i_X509(nullptr, &next, static_cast<long>(der.size())), X509_free);
     EXPECT_EQ(next, der.data() + der.size());
@@ -70,6 +97,8 @@ bytes subject_of(const certificate& from) {
 }
 
 TEST(Attestation, ChainsVerifyForRsaAndEc) {
+  EXPECT_TRUE(is_der(bytes{2, 2, 0, 0x80, 1, 1, 0xFF}));
+  EXPECT_FALSE(is_der(bytes{2, 0x81, 1, 5}) || is_der(bytes{2, 2, 0, 5}) || is_der(bytes{1, 1, 1}));
   ta_under_test ta;
   const param_set verifying = with(EC_256_KEY, KM_TAG_PURPOSE, {VERIFY});
   const param_set decrypting = with(RSA_KEY, KM_TAG_PURPOSE, {DECRYPT});
@@ -96,7 +125,8 @@ TEST(Attestation, ChainsVerifyForRsaAndEc) {
     EXPECT_EQ(text_of(X509_get0_notBefore(chain[0].get())), not_before);
     EXPECT_EQ(text_of(X509_get0_notAfter(chain[0].get())), not_after);
     EXPECT_EQ(extension_value(chain[0], NID_key_usage), (bytes{3, 2, 0, key_usage}));
-    EXPECT_FALSE(extension_value(chain[0], KEY_DESCRIPTION).empty());
+    const bytes description = extension_value(chain[0], KEY_DESCRIPTION);
+    EXPECT_TRUE(!description.empty() && is_der(description));
     EXPECT_EQ(common_name(X509_get_subject_name(chain[0].get())), "A Keymaster Key\0"s);
     EXPECT_EQ(common_name(X509_get_issuer_name(chain[0].get())).size(), 18u);
     EXPECT_EQ(X509_get_signature_nid(chain[0].get()), NID_sha256WithRSAEncryption);
