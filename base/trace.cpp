@@ -46,7 +46,8 @@ size_t write_prefix(char* line, size_t room, uint32_t level, trace_site at) {
 }
 
 // The last byte is kept for the newline; the terminating zero that snprintf puts there is dropped.
-void write_line(uint32_t level, trace_site at, const char* format, va_list arguments) {
+__attribute__((format(printf, 3, 0))) void write_line(uint32_t level, trace_site at,
+                                                      const char* format, va_list arguments) {
   char line[MAX_LINE_SIZE];
   size_t length = write_prefix(line, sizeof(line), level, at);
   const size_t room = sizeof(line) - length;
