@@ -60,18 +60,19 @@ class handle_table {
   template <typename... Arguments>
   handle emplace(Arguments&&... arguments) {
     if (free_.empty() && !grow()) return nullptr;
-    const uint32_t slot = free_.back();
-    slots_[slot]->value.emplace(std::forward<Arguments>(arguments)...);
-    slots_[slot]->generation = next_handle_generation();
+    slot_record& place = *slots_[free_.back()];
+    place.value.emplace(std::forward<Arguments>(arguments)...);
+    place.number = handle_number(free_.back());
     free_.pop_back();
-    return to_handle(slot);
+    return to_handle(place);
   }
 
   // find: what the handle stands for; null when it is not a live handle of this table.
   T* find(handle value) const {
     const size_t slot = slot_of(value);
-    const bool live = slot < slots_.size() && slots_[slot]->value && to_handle(slot) == value;
-    return live ? &*slots_[slot]->value : nullptr;
+    if (slot >= slots_.size()) return nullptr;
+    slot_record& place = *slots_[slot];
+    return place.value && to_handle(place) == value ? &*place.value : nullptr;
   }
 
   // get: likewise; panics in the name of `call` when it is not a live handle of this table.
@@ -93,14 +94,14 @@ class handle_table {
   // for_each: visit(handle, T&) for every live handle.
   template <typename Visit>
   void for_each(Visit&& visit) const {
-    for (size_t slot = 0; slot < slots_.size(); ++slot) {
-      if (slots_[slot]->value) visit(to_handle(slot), *slots_[slot]->value);
+    for (const auto& place : slots_) {
+      if (place->value) visit(to_handle(*place), *place->value);
     }
   }
 
  private:
   struct slot_record {
-    uint32_t generation = 0;
+    uint32_t number = 0;  // of the value's handle
     std::optional<T> value;
   };
 
@@ -113,13 +114,14 @@ class handle_table {
     return true;
   }
 
-  static size_t slot_of(handle value) { return reinterpret_cast<uintptr_t>(value) & (SLOTS - 1); }
-
-  handle to_handle(size_t slot) const {
-    const uintptr_t number = (uintptr_t{traits::KIND} << 29) |
-                             (uintptr_t{slots_[slot]->generation} << 10) | uintptr_t{slot};
-    return reinterpret_cast<handle>(number);
+  // A handle that no value has had, or none for long.
+  static uint32_t handle_number(uint32_t slot) {
+    return traits::KIND << 29 | next_handle_generation() << 10 | slot;
   }
+  static handle to_handle(const slot_record& place) {
+    return reinterpret_cast<handle>(uintptr_t{place.number});
+  }
+  static size_t slot_of(handle value) { return reinterpret_cast<uintptr_t>(value) & (SLOTS - 1); }
 
   std::vector<std::unique_ptr<slot_record>> slots_;  // values stay in place while the table grows
   std::vector<uint32_t> free_;

@@ -43,6 +43,40 @@ void wipe_and_free(void* block, size_t size) {
 
 }  // namespace
 
+inline size_t heap::slot_of(const void* block) const {
+  const entry* table = table_.data();
+  const size_t mask = table_.size() - 1;
+  size_t slot = spread(block) & mask;
+  while (table[slot].block && table[slot].block != block)
+    slot = (slot + 1) & mask;
+  return slot;
+}
+
+inline size_t heap::live_slot(const char* call, const void* block) const {
+  const size_t slot = table_.empty() ? 0 : slot_of(block);
+  if (table_.empty() || !table_[slot].block) {
+    panic(call, "%p is not a live block of this heap", block);
+  }
+  return slot;
+}
+
+// Closes the gap: every entry behind it up to the next free slot that could not be found any more
+// moves into it.
+inline void heap::erase(size_t gap) {
+  entry* table = table_.data();
+  bytes_ -= table[gap].size;
+  --count_;
+  const size_t mask = table_.size() - 1;
+  for (size_t slot = (gap + 1) & mask; table[slot].block; slot = (slot + 1) & mask) {
+    size_t home = spread(table[slot].block) & mask;
+    if (((slot - home) & mask) >= ((slot - gap) & mask)) {
+      table[gap] = table[slot];
+      gap = slot;
+    }
+  }
+  table[gap] = {};
+}
+
 heap::~heap() {
   release_all();
 }
@@ -54,7 +88,9 @@ void* heap::allocate(size_t size, bool zero) {
   void* block = std::malloc(size);
   if (!block) return nullptr;
   if (size > 0) std::memset(block, zero ? 0 : UNFILLED, size);
-  insert(block, size);
+  table_[slot_of(block)] = {block, size};
+  bytes_ += size;
+  ++count_;
   return block;
 }
 
@@ -82,43 +118,6 @@ void heap::release_all() {
   }
   bytes_ = 0;
   count_ = 0;
-}
-
-size_t heap::slot_of(const void* block) const {
-  size_t slot = spread(block) & (table_.size() - 1);
-  while (table_[slot].block && table_[slot].block != block)
-    slot = (slot + 1) & (table_.size() - 1);
-  return slot;
-}
-
-size_t heap::live_slot(const char* call, const void* block) const {
-  const size_t slot = table_.empty() ? 0 : slot_of(block);
-  if (table_.empty() || !table_[slot].block) {
-    panic(call, "%p is not a live block of this heap", block);
-  }
-  return slot;
-}
-
-void heap::insert(void* block, size_t size) {
-  table_[slot_of(block)] = {block, size};
-  bytes_ += size;
-  ++count_;
-}
-
-// Closes the gap: every entry behind it up to the next free slot that could not be found any more
-// moves into it.
-void heap::erase(size_t gap) {
-  bytes_ -= table_[gap].size;
-  --count_;
-  const size_t mask = table_.size() - 1;
-  for (size_t slot = (gap + 1) & mask; table_[slot].block; slot = (slot + 1) & mask) {
-    size_t home = spread(table_[slot].block) & mask;
-    if (((slot - home) & mask) >= ((slot - gap) & mask)) {
-      table_[gap] = table_[slot];
-      gap = slot;
-    }
-  }
-  table_[gap] = {};
 }
 
 void heap::grow() {

@@ -42,7 +42,6 @@ class heap {
   };
 
   size_t slot_of(const void* block) const;  // where it is, or the free slot where it would go
-  void insert(void* block, size_t size);
   void erase(size_t slot);
   void grow();
   size_t live_slot(const char* call, const void* block) const;  // panics when it is not there
