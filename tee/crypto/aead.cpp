@@ -1,6 +1,9 @@
 // AES-GCM.
 #include "tee/crypto/aead.h"
 
+#include <array>
+#include <openssl/core_names.h>
+
 #include "tee/crypto/block_cipher.h"
 #include "tee/crypto/fetched.h"
 
@@ -11,6 +14,13 @@ namespace {
 uint64_t use_of(bool encrypt) {
   return static_cast<uint64_t>(block_mode::GCM) * 2 + (encrypt ? 1 : 0);
 }
+
+// The tag alone, as parameters of a context.
+struct tag_params : std::array<OSSL_PARAM, 2> {
+  tag_params(uint8_t* tag, size_t length)
+      : array{OSSL_PARAM_construct_octet_string(OSSL_CIPHER_PARAM_AEAD_TAG, tag, length),
+              OSSL_PARAM_construct_end()} {}
+};
 
 cipher_ctx_ptr keyed_context(const key& key, bool encrypt) {
   cipher_ctx_ptr context(EVP_CIPHER_CTX_new());
@@ -61,18 +71,17 @@ void aead::update(std::span<const uint8_t> input, uint8_t* output) {
 void aead::make_tag(uint8_t* tag) {
   int written = 0;
   uint8_t none[AES_BLOCK];
+  tag_params params(tag, tag_length_);
   must(EVP_CipherFinal_ex(context_.get(), none, &written) == 1 &&
-           EVP_CIPHER_CTX_ctrl(context_.get(), EVP_CTRL_AEAD_GET_TAG, static_cast<int>(tag_length_),
-                               tag) == 1,
+           EVP_CIPHER_CTX_get_params(context_.get(), params.data()) == 1,
        "EVP_CipherFinal_ex");
 }
 
 bool aead::check_tag(std::span<const uint8_t> tag) {
   if (tag.size() != tag_length_) return false;
   // The tag is an input here; only the parameter's type is not const.
-  must(EVP_CIPHER_CTX_ctrl(context_.get(), EVP_CTRL_AEAD_SET_TAG, static_cast<int>(tag.size()),
-                           const_cast<uint8_t*>(tag.data())) == 1,
-       "EVP_CTRL_AEAD_SET_TAG");
+  const tag_params params(const_cast<uint8_t*>(tag.data()), tag.size());
+  must(EVP_CIPHER_CTX_set_params(context_.get(), params.data()) == 1, "EVP_CIPHER_CTX_set_params");
   int written = 0;
   uint8_t none[AES_BLOCK];
   bool authentic = EVP_CipherFinal_ex(context_.get(), none, &written) == 1;

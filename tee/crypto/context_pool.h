@@ -1,5 +1,6 @@
-// Contexts kept with a key: making one and giving it the key costs more than most operations on
-// short data, so an operation takes a spare one and gives it back.
+// Spare contexts, kept with a key or, where there is none, with an instance: making one and giving
+// it the key costs more than most operations on short data, so an operation takes a spare one and
+// gives it back.
 #pragma once
 
 #include <array>

@@ -5,13 +5,20 @@
 #include <span>
 
 #include "tee/crypto/algorithms.h"
+#include "tee/crypto/context_pool.h"
 #include "tee/crypto/openssl.h"
 
 namespace tee::crypto {
 
+using digest_pool = context_pool<md_ctx_ptr>;
+
 class digest {
  public:
-  explicit digest(hash which);
+  // Takes a spare context and gives it back; the pool must outlive the digest.
+  digest(hash which, digest_pool* spares);
+  digest(digest&&) = default;
+  digest& operator=(digest&&) = delete;
+  ~digest();
 
   size_t length() const { return length_; }  // of the result, in bytes
   void update(std::span<const uint8_t> bytes);
@@ -22,9 +29,11 @@ class digest {
  private:
   void restart();
 
+  hash which_;
+  digest_pool* spares_;
   size_t length_;
-  bool ended_ = false;  // the context holds a finished message
   md_ctx_ptr context_;
+  bool ended_;  // the context holds a finished message
 };
 
 }  // namespace tee::crypto

@@ -34,6 +34,7 @@ class instance {
   handle_table<operation>& operations() { return operations_; }
   handle_table<std::shared_ptr<ta_session>>& sessions() { return sessions_; }
   crypto::key_cache& keys() { return keys_; }
+  crypto::digest_pool& digests() { return digests_; }
 
   // client: who called the entry point that runs; null in create and destroy. set_client copies.
   const TEE_Identity* client() const { return client_ ? &*client_ : nullptr; }
@@ -51,6 +52,7 @@ class instance {
   device& device_;
   heap memory_;
   crypto::key_cache keys_;
+  crypto::digest_pool digests_;  // outlives the operations
   handle_table<object> objects_;
   handle_table<operation> operations_;
   handle_table<std::shared_ptr<ta_session>> sessions_;

@@ -22,9 +22,10 @@ struct operation {
   };
 
   // A digest can begin at once; the others wait for their key.
-  operation(const crypto::algorithm& row, uint32_t mode_id, uint32_t max_key_bits)
+  operation(const crypto::algorithm& row, uint32_t mode_id, uint32_t max_key_bits,
+            crypto::digest_pool* digests)
       : algorithm(row), mode(mode_id), max_bits(max_key_bits) {
-    if (row.kind == crypto::family::DIGEST) engine.emplace<crypto::digest>(row.digest);
+    if (row.kind == crypto::family::DIGEST) engine.emplace<crypto::digest>(row.digest, digests);
   }
 
   const crypto::algorithm& algorithm;

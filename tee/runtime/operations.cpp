@@ -130,7 +130,7 @@ TEE_Result TEE_AllocateOperation(TEE_OperationHandle* operation, uint32_t algori
     if (!row || !row->allows(mode) || !size_fits(*row, mode, maxKeySize)) {
       return TEE_ERROR_NOT_SUPPORTED;
     }
-    *operation = running.operations().emplace(*row, mode, maxKeySize);
+    *operation = running.operations().emplace(*row, mode, maxKeySize, &running.digests());
     return *operation ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
   });
 }
