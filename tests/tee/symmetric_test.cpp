@@ -1,7 +1,6 @@
 // MACs and ciphers in what no trusted application of ours asks for: queries, overlapping buffers,
 // tags of every length. That the values are the published ones is shown at the command level.
 #include <algorithm>
-#include <openssl/hmac.h>
 
 #include "support.h"
 
@@ -13,9 +12,10 @@ using symmetric = in_instance;
 // A query of the length takes nothing in. Two operations on one key share no running computation,
 // and the second round finds them fresh.
 TEST_F(symmetric, macs_can_be_asked_for_their_length) {
-  const uint8_t abc[] = {'a', 'b', 'c'};
-  bytes expected(32);
-  HMAC(EVP_sha256(), "key", 3, abc, sizeof(abc), expected.data(), nullptr);
+  // printf abc | openssl mac -digest SHA256 -macopt key:key HMAC
+  const bytes expected = {0x9c, 0x19, 0x6e, 0x32, 0xdc, 0x01, 0x75, 0xf8, 0x6f, 0x4b, 0x1c,
+                          0xb8, 0x92, 0x89, 0xd6, 0x61, 0x9d, 0xe6, 0xbe, 0xe6, 0x99, 0xe4,
+                          0xc3, 0x78, 0xe6, 0x83, 0x09, 0xed, 0x97, 0xa1, 0xa6, 0xab};
   TEE_OperationHandle macs[2];
   for (auto& mac : macs) {
     mac = operation(TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, 256,

@@ -83,6 +83,17 @@ TEST_F(ParamSet, MarshalsWhatItUnmarshalled) {
   EXPECT_EQ(marshalled(empty, true), from_hex("00000000"));
 }
 
+TEST_F(ParamSet, RefusesEveryPrefix) {
+  const bytes whole = from_hex(THREE);
+  for (size_t size = 0; size < whole.size(); size++) {
+    keymaster_key_param_set_t set;
+    EXPECT_EQ(unmarshal(byte_view(whole).first(size), &set), TEE_ERROR_GENERIC) << size;
+    EXPECT_TRUE(set.params == nullptr && set.length == 0) << size;
+    EXPECT_TRUE(platform::traced("Too short input")) << size;
+    EXPECT_EQ(platform::live_blocks, 0u) << size;
+  }
+}
+
 TEST_F(ParamSet, NeverTrustsACount) {
   const std::tuple<std::string_view, TEE_Result, const char*> cases[] = {
       {"ffffffff", TEE_ERROR_OUT_OF_MEMORY, "Out of memory"},
