@@ -60,6 +60,7 @@ void take_number(std::span<const uint8_t>* rest, std::span<uint8_t> padded) {
   const size_t length = enter(rest, V_ASN1_INTEGER);
   std::span<const uint8_t> number = rest->first(length);
   *rest = rest->subspan(length);
+  must(!number.empty() && number[0] < 0x80, "DER of a signature");  // not negative
   if (number.size() > padded.size() && number[0] == 0) number = number.subspan(1);
   must(number.size() <= padded.size(), "DER of a signature");
   const size_t zeros = padded.size() - number.size();
@@ -84,7 +85,8 @@ TEE_Result ecdsa_sign(key& ec_key, std::span<const uint8_t> digest, uint8_t* sig
     return TEE_ERROR_BAD_PARAMETERS;
   }
   std::span<const uint8_t> rest(der, length);
-  enter(&rest, V_ASN1_SEQUENCE);
+  const size_t content = enter(&rest, V_ASN1_SEQUENCE);
+  must(content == rest.size(), "DER of a signature");
   size_t half = curve_of(ec_key).length();
   take_number(&rest, {signature, half});
   take_number(&rest, {signature + half, half});
