@@ -117,7 +117,6 @@ constexpr std::array RSA_PAIR{attribute_rule{TEE_ATTR_RSA_MODULUS, MANDATORY},
                               attribute_rule{TEE_ATTR_RSA_EXPONENT1, OPTIONAL},
                               attribute_rule{TEE_ATTR_RSA_EXPONENT2, OPTIONAL},
                               attribute_rule{TEE_ATTR_RSA_COEFFICIENT, OPTIONAL}};
-static_assert(RSA_PAIR.size() == MAX_ATTRIBUTES);
 constexpr std::array EC_PAIR{attribute_rule{TEE_ATTR_ECC_CURVE, MANDATORY},
                              attribute_rule{TEE_ATTR_ECC_PUBLIC_VALUE_X, MANDATORY},
                              attribute_rule{TEE_ATTR_ECC_PUBLIC_VALUE_Y, MANDATORY},
@@ -138,6 +137,9 @@ constexpr std::array KEY_TYPES{
     key_type{TEE_TYPE_ECDSA_PUBLIC_KEY, 192, 521, 0, EC_PUBLIC},
     key_type{TEE_TYPE_ECDSA_KEYPAIR, 192, 521, 0, EC_PAIR},
 };
+static_assert(std::all_of(KEY_TYPES.begin(), KEY_TYPES.end(), [](const key_type& row) {
+  return row.attributes.size() <= MAX_ATTRIBUTES;
+}));
 
 constexpr std::array CURVES{curve{TEE_ECC_CURVE_NIST_P192, 192, "prime192v1"},
                             curve{TEE_ECC_CURVE_NIST_P224, 224, "secp224r1"},
