@@ -16,11 +16,10 @@ uint64_t use_of(bool encrypt) {
 }
 
 // The tag alone, as parameters of a context.
-struct tag_params : std::array<OSSL_PARAM, 2> {
-  tag_params(uint8_t* tag, size_t length)
-      : array{OSSL_PARAM_construct_octet_string(OSSL_CIPHER_PARAM_AEAD_TAG, tag, length),
-              OSSL_PARAM_construct_end()} {}
-};
+std::array<OSSL_PARAM, 2> tag_params(uint8_t* tag, size_t length) {
+  return {OSSL_PARAM_construct_octet_string(OSSL_CIPHER_PARAM_AEAD_TAG, tag, length),
+          OSSL_PARAM_construct_end()};
+}
 
 cipher_ctx_ptr keyed_context(const key& key, bool encrypt) {
   cipher_ctx_ptr context(EVP_CIPHER_CTX_new());
@@ -71,7 +70,7 @@ void aead::update(std::span<const uint8_t> input, uint8_t* output) {
 void aead::make_tag(uint8_t* tag) {
   int written = 0;
   uint8_t none[AES_BLOCK];
-  tag_params params(tag, tag_length_);
+  auto params = tag_params(tag, tag_length_);
   must(EVP_CipherFinal_ex(context_.get(), none, &written) == 1 &&
            EVP_CIPHER_CTX_get_params(context_.get(), params.data()) == 1,
        "EVP_CipherFinal_ex");
@@ -80,7 +79,7 @@ void aead::make_tag(uint8_t* tag) {
 bool aead::check_tag(std::span<const uint8_t> tag) {
   if (tag.size() != tag_length_) return false;
   // The tag is an input here; only the parameter's type is not const.
-  const tag_params params(const_cast<uint8_t*>(tag.data()), tag.size());
+  const auto params = tag_params(const_cast<uint8_t*>(tag.data()), tag.size());
   must(EVP_CIPHER_CTX_set_params(context_.get(), params.data()) == 1, "EVP_CIPHER_CTX_set_params");
   int written = 0;
   uint8_t none[AES_BLOCK];

@@ -21,8 +21,8 @@ class aead {
   }
 
   aead(key_ptr key, bool encrypt);
-  aead(aead&&) = default;
-  aead& operator=(aead&&) = delete;
+  aead(const aead&) = delete;
+  aead& operator=(const aead&) = delete;
   ~aead();
 
   // start: begins a message with a nonce of 1 to MAX_NONCE bytes and a tag of `tag_bits`.

@@ -12,8 +12,8 @@ namespace tee::crypto {
 class block_cipher {
  public:
   block_cipher(key_ptr key, block_mode mode, bool encrypt);
-  block_cipher(block_cipher&&) = default;
-  block_cipher& operator=(block_cipher&&) = delete;
+  block_cipher(const block_cipher&) = delete;
+  block_cipher& operator=(const block_cipher&) = delete;
   ~block_cipher();
 
   // iv_length: what start() needs: AES_BLOCK bytes, none for ECB.

@@ -16,8 +16,8 @@ class digest {
  public:
   // Takes a spare context and gives it back; the pool must outlive the digest.
   digest(hash which, digest_pool* spares);
-  digest(digest&&) = default;
-  digest& operator=(digest&&) = delete;
+  digest(const digest&) = delete;
+  digest& operator=(const digest&) = delete;
   ~digest();
 
   size_t length() const { return length_; }  // of the result, in bytes

@@ -12,8 +12,8 @@ namespace tee::crypto {
 class hmac {
  public:
   hmac(key_ptr key, hash which);
-  hmac(hmac&&) = default;
-  hmac& operator=(hmac&&) = delete;
+  hmac(const hmac&) = delete;
+  hmac& operator=(const hmac&) = delete;
   ~hmac();
 
   size_t length() const { return length_; }  // of the result, in bytes
