@@ -8,7 +8,7 @@
 #include <openssl/rand.h>
 #include <stdexcept>
 
-#include "keymaster/store/product.h"
+#include "product/values.h"
 
 namespace keymaster::bench {
 namespace {

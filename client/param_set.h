@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "client/bytes.h"
-#include "keymaster/params/tags.h"
+#include "ta/params/tags.h"
 
 namespace keymaster::client {
 

@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "keymaster/params/tags.h"
+#include "ta/params/tags.h"
 
 namespace keymaster::client {
 

@@ -14,7 +14,7 @@ if(TARGET keymaster_client)
   install(DIRECTORY client DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster
           FILES_MATCHING PATTERN "*.h")
   install(FILES product/uuids.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster/product)
-  install(FILES keymaster/params/tags.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster/params)
+  install(FILES ta/params/tags.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster/ta/params)
   target_include_directories(keymaster_client INTERFACE
       $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>
       $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/keymaster>)

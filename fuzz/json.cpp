@@ -1,7 +1,7 @@
 // Any tree of JSON values, built from the input. What the writer makes of it reads back as the same
 // tree in the same order, through another implementation; a text with a string that is not UTF-8,
 // or that holds a control character, does not read at all. The heap is empty afterwards.
-#include "soter/json.h"
+#include "ta/soter/json.h"
 
 #include <algorithm>
 #include <cmath>
@@ -11,7 +11,7 @@
 #include <string>
 
 #include "platform.h"
-#include "soter/utf8.h"
+#include "ta/soter/utf8.h"
 
 using namespace keymaster;
 using nlohmann::ordered_json;

@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "platform.h"
-#include "soter/tlv_box.h"
+#include "ta/soter/tlv_box.h"
 
 using namespace keymaster;
 

@@ -5,9 +5,9 @@
 #include <cstdlib>
 #include <vector>
 
-#include "keymaster/params/dump.h"
-#include "keymaster/params/marshal.h"
 #include "platform.h"
+#include "ta/params/dump.h"
+#include "ta/params/marshal.h"
 
 using namespace keymaster;
 

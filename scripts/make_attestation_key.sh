@@ -98,7 +98,7 @@ write_certificate() {
 
 # A C++ array named $1 from the hex in $2.
 array() {
-  printf 'constexpr uint8_t %s[] = {\n' "$1"
+  printf 'constexpr unsigned char %s[] = {\n' "$1"
   printf '%s' "$2" | sed 's/../0x&, /g' | fold -s -w 96 | sed 's/^/    /; s/ *$//'
   printf '\n};\n'
 }
@@ -118,32 +118,21 @@ openssl x509 -inform DER -in certificate.der -noout -text > /dev/null
 cd "$OLDPWD"
 {
   cat <<'END'
-// TEST KEY: the attestation key and certificate for development, made by
-// scripts/make_attestation_key.sh. Its private exponent is public: a product provisions its own
-// (CMake option KEYMASTER_ATTESTATION_KEY).
-#include "keymaster/attest/product.h"
-
-namespace keymaster {
-namespace {
+// TEST KEY: the attestation key (RSA-2048, big-endian numbers) and its certificate (DER) for
+// development, made by scripts/make_attestation_key.sh. Its private exponent is public: a product
+// provisions its own (CMake option KEYMASTER_ATTESTATION_KEY).
+#pragma once
 
 // clang-format off
 END
   cd "$work"
-  array MODULUS "$(number 2 514)"
+  array ATTESTATION_MODULUS "$(number 2 514)"
   printf '\n'
-  array PUBLIC_EXPONENT 010001
+  array ATTESTATION_PUBLIC_EXPONENT 010001
   printf '\n'
-  array PRIVATE_EXPONENT "$(number 4 512)"
+  array ATTESTATION_PRIVATE_EXPONENT "$(number 4 512)"
   printf '\n'
-  array CERTIFICATE "$(od -An -v -tx1 certificate.der | tr -d ' \n')"
+  array ATTESTATION_CERTIFICATE "$(od -An -v -tx1 certificate.der | tr -d ' \n')"
   cd "$OLDPWD"
-  cat <<'END'
-// clang-format on
-
-}  // namespace
-
-PROVISION_ATTESTATION_KEY(MODULUS, PUBLIC_EXPONENT, PRIVATE_EXPONENT, CERTIFICATE);
-
-}  // namespace keymaster
-END
+  echo '// clang-format on'
 } > "$output"

@@ -4,9 +4,9 @@
 #include <vector>
 
 #include "fixture.h"
-#include "keymaster/attest/der/oids.h"
-#include "keymaster/attest/der/x509.h"
-#include "keymaster/attest/key_description.h"
+#include "ta/attest/key_description.h"
+#include "ta/der/oids.h"
+#include "ta/der/x509.h"
 
 namespace keymaster {
 namespace {

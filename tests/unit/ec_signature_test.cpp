@@ -1,5 +1,5 @@
 // The DER codec of ECDSA signatures: what it makes, and that it takes nothing else.
-#include "keymaster/alg/ec/ec_signature.h"
+#include "ta/alg/ec/ec_signature.h"
 
 #include <vector>
 

@@ -1,11 +1,11 @@
 // Parameter sets and their marshalled form, against bytes that were written by hand.
-#include "keymaster/params/param_set.h"
+#include "ta/params/param_set.h"
 
 #include <algorithm>
 #include <vector>
 
 #include "fixture.h"
-#include "keymaster/params/marshal.h"
+#include "ta/params/marshal.h"
 
 namespace keymaster {
 namespace {

@@ -4,9 +4,9 @@
 #include <string>
 
 #include "fixture.h"
-#include "soter/base64.h"
-#include "soter/json.h"
-#include "soter/utf8.h"
+#include "ta/soter/base64.h"
+#include "ta/soter/json.h"
+#include "ta/soter/utf8.h"
 
 namespace keymaster {
 namespace {

@@ -1,5 +1,5 @@
 // TLV boxes: their bytes, what closes them, and what is made of bytes that others wrote.
-#include "soter/tlv_box.h"
+#include "ta/soter/tlv_box.h"
 
 #include <gtest/gtest.h>
 #include <vector>

@@ -1,8 +1,8 @@
 // The form of trace lines, and of the dump of a parameter set.
-#include "base/trace.h"
+#include "ta/base/trace.h"
 
 #include "fixture.h"
-#include "keymaster/params/dump.h"
+#include "ta/params/dump.h"
 
 namespace keymaster {
 namespace {

@@ -1,0 +1,64 @@
+// RSA keys and operations (RFC 8017). Key material: a key record (key_record.h) of modulus, public
+// exponent, private exponent, prime 1, prime 2, exponent 1, exponent 2 and coefficient. Key data to
+// import is the same without the size field.
+#pragma once
+
+#include "ta/alg/algorithm.h"
+#include "ta/base/tee_handles.h"
+
+namespace keymaster {
+
+extern const algorithm_t RSA_ALGORITHM;
+
+// rsa_generate_key, rsa_import_key: check the description, complete it into the characteristics
+// and build the key material from a fresh key, or from `key_data`. -38: a tag that only the TA may
+// set, or one absent or repeated. -6: a size above 8192 bits or not whole bytes. -44: key size or
+// public exponent given are not those of the data. TEE_ERROR_GENERIC: the data is too short; what
+// follows the eighth number is ignored. Import takes the numbers as they are: a key that is none is
+// refused when it is used.
+TEE_Result rsa_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material,
+                            keymaster_error_t* km_error);
+TEE_Result rsa_import_key(keymaster_key_param_set_t* description, byte_view key_data,
+                          heap_buffer* key_material, keymaster_error_t* km_error);
+
+// rsa_export_key: writes the DER SubjectPublicKeyInfo (RFC 5280). Always TEE_SUCCESS: every failure
+// is -1000.
+TEE_Result rsa_export_key(byte_view key_material, byte_span output, size_t* produced,
+                          keymaster_error_t* km_error);
+
+// rsa_set_key_info: fills the subject public key of a certificate. TEE_ERROR_GENERIC: the record is
+// too short. -41: out of memory.
+TEE_Result rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key,
+                            keymaster_error_t* km_error);
+
+// rsa_resolve_key_data: loads key material into the platform; *key_bits receives its size.
+// TEE_ERROR_GENERIC: the record is too short.
+[[nodiscard]] TEE_Result rsa_resolve_key_data(byte_view key_material, tee_object* key,
+                                              uint32_t* key_bits);
+
+// resolve_key_from_data: the same for callers whose every failure is one: no object, traced.
+tee_object resolve_key_from_data(byte_view key_material, uint32_t* key_bits);
+
+// create_rsa_sign ... create_rsa_decrypt: begin an operation with KM_TAG_PADDING and KM_TAG_DIGEST
+// of `begin_params`; encryption and decryption go without the digest unless the padding is OAEP.
+// -38: absent or repeated. -12: no such digest. -10: a padding that the purpose does not offer.
+// -13: the padding does not go with the digest, or PSS does not fit the key. -1000: the platform
+// refuses the key, or a SOTER key's resources are not ready.
+operation_t* create_rsa_sign(byte_view key_material,
+                             const keymaster_key_param_set_t& key_characteristics,
+                             const keymaster_key_param_set_t& begin_params,
+                             keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
+operation_t* create_rsa_verify(byte_view key_material,
+                               const keymaster_key_param_set_t& key_characteristics,
+                               const keymaster_key_param_set_t& begin_params,
+                               keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
+operation_t* create_rsa_encrypt(byte_view key_material,
+                                const keymaster_key_param_set_t& key_characteristics,
+                                const keymaster_key_param_set_t& begin_params,
+                                keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
+operation_t* create_rsa_decrypt(byte_view key_material,
+                                const keymaster_key_param_set_t& key_characteristics,
+                                const keymaster_key_param_set_t& begin_params,
+                                keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
+
+}  // namespace keymaster

@@ -1,0 +1,177 @@
+// RSA keys: description checks, key material, loading it into the platform, and public keys.
+#include "tee_extensions.h"
+#include "tee_internal_api.h"
+
+#include <algorithm>
+
+#include "ta/alg/big_endian.h"
+#include "ta/alg/key_record.h"
+#include "ta/alg/key_size.h"
+#include "ta/alg/provenance.h"
+#include "ta/alg/rsa/rsa.h"
+
+namespace keymaster {
+namespace {
+
+constexpr uint32_t MAX_KEY_BITS = 8192;
+constexpr size_t EXPONENT_SIZE = sizeof(uint64_t);
+
+// The numbers of a record, in order.
+constexpr uint32_t NUMBERS[] = {
+    TEE_ATTR_RSA_MODULUS,   TEE_ATTR_RSA_PUBLIC_EXPONENT, TEE_ATTR_RSA_PRIVATE_EXPONENT,
+    TEE_ATTR_RSA_PRIME1,    TEE_ATTR_RSA_PRIME2,          TEE_ATTR_RSA_EXPONENT1,
+    TEE_ATTR_RSA_EXPONENT2, TEE_ATTR_RSA_COEFFICIENT,
+};
+constexpr size_t MODULUS = 0;
+constexpr size_t PUBLIC_EXPONENT = 1;
+
+keymaster_error_t check_key_size(uint32_t key_bits, trace_site at) {
+  if (key_bits % 8 == 0 && key_bits <= MAX_KEY_BITS) return KM_ERROR_OK;
+  trace_error(at, "Invalid RSA key size %d", static_cast<int>(key_bits));
+  return KM_ERROR_UNSUPPORTED_KEY_SIZE;
+}
+
+keymaster_error_t check_generate(keymaster_key_param_set_t* description, uint64_t* exponent,
+                                 uint32_t* key_bits, trace_site at) {
+  if (auto error = add_provenance(description, KM_ORIGIN_GENERATED, creation_time::ADDED, at)) {
+    return error;
+  }
+  const auto* given = get_unique(*description, KM_TAG_RSA_PUBLIC_EXPONENT);
+  if (given == nullptr) {
+    trace_error(at, "No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified");
+    return KM_ERROR_INVALID_ARGUMENT;
+  }
+  *exponent = given->long_integer;
+  if (auto error = required_key_bits(*description, key_bits, at)) return error;
+  return check_key_size(*key_bits, at);
+}
+
+// A given exponent must have the field's bytes at its end, leading zeros included.
+bool ends_with(uint64_t exponent, byte_view field) {
+  uint8_t bytes[EXPONENT_SIZE];
+  store_u64_big_endian(bytes, exponent);
+  return field.size() <= EXPONENT_SIZE &&
+         std::ranges::equal(byte_view(bytes).last(field.size()), field);
+}
+
+keymaster_error_t settle_exponent(keymaster_key_param_set_t* description, byte_view field,
+                                  trace_site at) {
+  const auto* given = get_unique(*description, KM_TAG_RSA_PUBLIC_EXPONENT);
+  const byte_view significant = without_leading_zeros(field);
+  const bool fits = given != nullptr ? ends_with(given->long_integer, field)
+                                     : significant.size() <= EXPONENT_SIZE;
+  if (!fits) {
+    trace_error(at, "Public exponent mismatch");
+    return KM_ERROR_IMPORT_PARAMETER_MISMATCH;
+  }
+  if (given == nullptr &&
+      !add_long(description, KM_TAG_RSA_PUBLIC_EXPONENT, load_u64_big_endian(significant))) {
+    trace_error(at, "Out of memory");
+    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+  }
+  return KM_ERROR_OK;
+}
+
+// Import neither adds the creation time nor refuses it: intended, the description may carry it.
+keymaster_error_t check_import(keymaster_key_param_set_t* description,
+                               std::span<const byte_view> numbers, uint32_t* key_bits,
+                               trace_site at) {
+  if (auto error = add_provenance(description, KM_ORIGIN_IMPORTED, creation_time::NOT_ADDED, at)) {
+    return error;
+  }
+  // The field's length as it stands: a modulus with a leading zero guesses 8 bits more, intended.
+  const uint64_t guessed_bits = uint64_t{numbers[MODULUS].size()} * 8;
+  if (auto error = settle_key_bits(description, guessed_bits, key_bits, at)) return error;
+  if (auto error = check_key_size(*key_bits, at)) return error;
+  return settle_exponent(description, numbers[PUBLIC_EXPONENT], at);
+}
+
+// The messages of an export name the platform's calls, and every failure leaves as -1000.
+TEE_Result export_public_key(const tee_object& key, byte_span output, size_t* produced,
+                             trace_site at) {
+  TEE_OperationHandle handle{};
+  TEE_Result res = TEE_AllocateOperation(&handle, TEE_ALG_RSA_NOPAD, TEE_MODE_EXPORT, 0);
+  tee_operation operation;
+  operation.reset(handle);
+  if (res != TEE_SUCCESS) {
+    trace_error(at, "TEE_AllocateOperation failed: %08x\n", res);
+    return res;
+  }
+  res = TEE_SetOperationKey(operation.get(), key.get());
+  if (res != TEE_SUCCESS) {
+    trace_error(at, "TEE_SetOperationKey failed: %08x\n", res);
+    return res;
+  }
+  auto size = static_cast<tee_size>(output.size());
+  res = TEE_AsymmetricExport(operation.get(), TEE_EXPORT_FORMAT_SPKI, output.data(), &size);
+  if (res != TEE_SUCCESS) {
+    trace_error(at, "TEE_AsymmetricExport failed: %08x\n", res);
+    return res;
+  }
+  *produced = size;
+  return TEE_SUCCESS;
+}
+
+}  // namespace
+
+TEE_Result rsa_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material,
+                            keymaster_error_t* km_error) {
+  uint64_t exponent = 0;
+  uint32_t key_bits = 0;
+  *km_error = check_generate(description, &exponent, &key_bits, trace_site::here());
+  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
+  uint8_t bytes[EXPONENT_SIZE];
+  store_u64_big_endian(bytes, exponent);
+  return generate_key_record(TEE_TYPE_RSA_KEYPAIR, key_bits,
+                             ref_attribute(TEE_ATTR_RSA_PUBLIC_EXPONENT, bytes), NUMBERS,
+                             key_bits / 8, key_material, km_error);
+}
+
+TEE_Result rsa_import_key(keymaster_key_param_set_t* description, byte_view key_data,
+                          heap_buffer* key_material, keymaster_error_t* km_error) {
+  input_cursor in(key_data);
+  byte_view numbers[std::size(NUMBERS)];
+  if (!read_numbers(&in, numbers)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
+  uint32_t key_bits = 0;
+  *km_error = check_import(description, numbers, &key_bits, trace_site::here());
+  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
+  const byte_view consumed = key_data.first(key_data.size() - in.left());
+  heap_buffer record;
+  if (!record.allocate(sizeof(uint32_t) + consumed.size())) {
+    return KM_FAIL(km_error, KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
+  }
+  store_u32(record.span(), key_bits);
+  copy_bytes(record.span().subspan(sizeof(uint32_t)), consumed);
+  *key_material = std::move(record);
+  return TEE_SUCCESS;
+}
+
+TEE_Result rsa_export_key(byte_view key_material, byte_span output, size_t* produced,
+                          keymaster_error_t* km_error) {
+  *produced = 0;
+  uint32_t key_bits = 0;
+  const tee_object key = resolve_key_from_data(key_material, &key_bits);
+  if (!key) {
+    return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "resolve key from data stream error\n");
+  }
+  if (export_public_key(key, output, produced, trace_site::here()) != TEE_SUCCESS) {
+    *km_error = KM_ERROR_UNKNOWN_ERROR;
+  }
+  return TEE_SUCCESS;
+}
+
+TEE_Result rsa_resolve_key_data(byte_view key_material, tee_object* key, uint32_t* key_bits) {
+  TEE_Attribute attributes[std::size(NUMBERS)];
+  if (!read_attributes(key_material, NUMBERS, key_bits, attributes)) return TEE_ERROR_GENERIC;
+  return load_key(TEE_TYPE_RSA_KEYPAIR, *key_bits, attributes, key);
+}
+
+tee_object resolve_key_from_data(byte_view key_material, uint32_t* key_bits) {
+  tee_object key;
+  if (rsa_resolve_key_data(key_material, &key, key_bits) != TEE_SUCCESS) {
+    TRACE_ERROR("Resolve key data failed");
+  }
+  return key;
+}
+
+}  // namespace keymaster

@@ -1,0 +1,102 @@
+// What the files of RSA operations share: the records, and the steps that the purposes have in
+// common.
+#pragma once
+
+#include "ta/alg/message.h"
+#include "ta/alg/rsa/rsa.h"
+
+namespace keymaster {
+
+// What PKCS #1 v1.5 adds to a message at least, in bytes (RFC 8017, 7.2.1 and 9.2).
+constexpr size_t PKCS1_OVERHEAD = 11;
+
+// rsa_operation_t: an RSA operation. Lives from create to free.
+struct rsa_operation_t : operation_t {
+  tee_operation main;
+  tee_object key;
+  message_t message;  // its buffer has the key's size
+  uint32_t padding = KM_PAD_NONE;
+  uint32_t key_bits = 0;
+
+  size_t key_size() const { return message.buffer.size(); }
+  int missing() const { return (key ? 0 : 1) + (main ? 0 : 1) + (message.buffer ? 0 : 1); }
+};
+
+// rsa_sign_operation_t: a SOTER key's operation keeps its whole message.
+struct rsa_sign_operation_t : rsa_operation_t {
+  static constexpr char TYPE_NAME[] = "rsa_sign_operation_t";
+
+  heap_buffer soter_message;  // its size is the capacity; none unless the key is a SOTER key
+  size_t soter_length = 0;    // bytes held
+};
+
+struct rsa_verify_operation_t : rsa_operation_t {
+  static constexpr char TYPE_NAME[] = "rsa_verify_operation_t";
+};
+
+struct rsa_encrypt_operation_t : rsa_operation_t {
+  static constexpr char TYPE_NAME[] = "rsa_encrypt_operation_t";
+};
+
+struct rsa_decrypt_operation_t : rsa_operation_t {
+  static constexpr char TYPE_NAME[] = "rsa_decrypt_operation_t";
+};
+
+// rsa_choice_t: the platform algorithms of one padding, by KM_DIGEST_* value; 0 refuses the digest.
+struct rsa_choice_t {
+  uint32_t padding;
+  uint32_t algorithms[KM_DIGEST_SHA_2_512 + 1];
+};
+
+// rsa_purpose_t: how a purpose is begun.
+struct rsa_purpose_t {
+  std::span<const rsa_choice_t> choices;
+  bool is_signature;         // hashes its data, and wants a digest to be named, if only NONE
+  uint32_t mode;             // TEE_MODE_*
+  uint32_t undigested_mode;  // with KM_DIGEST_NONE
+};
+
+extern const rsa_purpose_t RSA_SIGN;
+extern const rsa_purpose_t RSA_VERIFY;
+extern const rsa_purpose_t RSA_ENCRYPT;
+extern const rsa_purpose_t RSA_DECRYPT;
+
+// rsa_prepare: everything of create that can fail after the record is there. Codes as
+// create_rsa_sign. Messages go out under `at`.
+[[nodiscard]] TEE_Result rsa_prepare(rsa_operation_t* operation, const rsa_purpose_t& purpose,
+                                     byte_view key_material,
+                                     const keymaster_key_param_set_t& begin_params,
+                                     keymaster_error_t* km_error, trace_site at);
+
+// rsa_keep: appends `input` to the message, which may take `reserved` bytes less than the key's
+// size. *consumed receives the bytes taken: all, or none with KM_ERROR_INVALID_INPUT_LENGTH.
+// `purpose` stands in the message, as in "Input too long to sign".
+[[nodiscard]] TEE_Result rsa_keep(rsa_operation_t* operation, byte_view input, size_t reserved,
+                                  const char* purpose, size_t* consumed,
+                                  keymaster_error_t* km_error, trace_site at = trace_site::here());
+
+// rsa_take_signed: the update of signing and verification: hashes `input`, or keeps it.
+[[nodiscard]] TEE_Result rsa_take_signed(rsa_operation_t* operation, byte_view input,
+                                         const char* purpose, size_t* consumed,
+                                         keymaster_error_t* km_error,
+                                         trace_site at = trace_site::here());
+
+// rsa_build_pkcs1_block: turns the kept message into the EMSA-PKCS1-v1_5 block (RFC 8017, 9.2) in
+// which it stands for the whole DigestInfo.
+void rsa_build_pkcs1_block(rsa_operation_t* operation);
+
+// rsa_crypt: runs TEE_AsymmetricEncrypt or TEE_AsymmetricDecrypt on `input`; *result is made, of
+// the key's size, and *produced tells how much of it the platform has filled. -41: out of memory.
+// The platform's code is not traced.
+using rsa_call = decltype(TEE_AsymmetricEncrypt);
+[[nodiscard]] TEE_Result rsa_crypt(rsa_call call, const rsa_operation_t& operation, byte_view input,
+                                   heap_buffer* result, size_t* produced,
+                                   keymaster_error_t* km_error, trace_site at);
+
+// rsa_settle_crypt: what the outcome of rsa_crypt means where its input is the client's:
+// KM_ERROR_INVALID_ARGUMENT when the platform refuses it; any other code is traced behind `failure`
+// and passed on.
+[[nodiscard]] TEE_Result rsa_settle_crypt(TEE_Result res, const char* failure,
+                                          keymaster_error_t* km_error, trace_site at);
+
+}  // namespace keymaster

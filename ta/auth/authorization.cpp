@@ -1,0 +1,301 @@
+// The checks of a key's authorisations. They trace as authorize_begin and
+// authorize_update_or_finish, whose parts they are. A key's parameters are walked once, in their
+// order, and the first that refuses decides: that order is part of what clients see.
+#include "ta/auth/authorization.h"
+
+#include "ta/alg/algorithm.h"
+#include "ta/auth/clock.h"
+#include "ta/auth/token.h"
+#include "ta/auth/use_log.h"
+
+namespace keymaster {
+namespace {
+
+// The user authentication that a key demands, and what the request brings for it.
+struct user_auth_t {
+  uint64_t challenge;  // that the token must carry; 0: any
+  byte_view token;     // the request's, valid; empty when it has none
+  bool is_demanded;    // a KM_TAG_USER_SECURE_ID was met
+  bool is_given;       // one of them matched
+
+  bool is_due() const { return is_demanded && !is_given; }
+};
+
+// A padding, block mode or digest that the operation will use (0 when it takes none), and whether
+// the key allows it.
+struct requested_value_t {
+  uint32_t value = 0;
+  bool is_allowed = false;
+};
+
+// A begin under check.
+struct begin_check_t {
+  const keymaster_key_param_set_t& request;
+  const keymaster_key_param_set_t& key_params;
+  uint32_t algorithm = 0;
+  uint32_t purpose = 0;
+  key_identity_t identity{};
+  user_auth_t user{};
+  bool is_purpose_allowed = false;
+  requested_value_t padding{};
+  requested_value_t block_mode{};
+  requested_value_t digest{};
+};
+
+keymaster_error_t read_user_auth(const keymaster_key_param_set_t& request, uint64_t challenge,
+                                 user_auth_t* user) {
+  user->challenge = challenge;
+  const keymaster_key_param_t* token = get_unique(request, KM_TAG_AUTH_TOKEN);
+  if (token == nullptr) return KM_ERROR_OK;
+  if (!check_auth_token_valid(token->blob())) return KM_ERROR_INVALID_ARGUMENT;
+  user->token = token->blob();
+  return KM_ERROR_OK;
+}
+
+// One KM_TAG_USER_SECURE_ID of the key. No match is no refusal: another identifier may match.
+keymaster_error_t check_secure_id(uint64_t secure_id, const keymaster_key_param_set_t& key_params,
+                                  user_auth_t* user, trace_site at) {
+  if (get_unique(key_params, KM_TAG_NO_AUTH_REQUIRED) != nullptr) {
+    return KM_REFUSE_AT(at, KM_ERROR_INVALID_ARGUMENT,
+                        "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED");
+  }
+  const keymaster_key_param_t* auth_type = get_unique(key_params, KM_TAG_USER_AUTH_TYPE);
+  if (auth_type == nullptr) {
+    return KM_REFUSE_AT(at, KM_ERROR_INVALID_ARGUMENT,
+                        "Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE");
+  }
+  user->is_demanded = true;
+  user->is_given = user->is_given ||
+                   check_auth(secure_id, user->challenge, user->token,
+                              get_unique(key_params, KM_TAG_AUTH_TIMEOUT), auth_type->enumerated);
+  return KM_ERROR_OK;
+}
+
+// Asks the operation which padding, block mode and digest it will use.
+keymaster_error_t ask_operation(begin_check_t* check, trace_site at) {
+  const algorithm_t* algorithm = find_algorithm(check->algorithm);
+  if (algorithm == nullptr) {
+    trace_error(at, "Algorithm %d not implemented", static_cast<int>(check->algorithm));
+    return KM_ERROR_UNSUPPORTED_ALGORITHM;
+  }
+  const operation_methods_t* methods = algorithm->get_operation_methods(check->purpose);
+  if (methods == nullptr || methods->get_padding == nullptr || methods->get_block_mode == nullptr ||
+      methods->get_digest == nullptr) {
+    trace_error(at, "Algorithm %s purpose %d not implemented", algorithm->name,
+                static_cast<int>(check->purpose));
+    return KM_ERROR_UNSUPPORTED_PURPOSE;
+  }
+  check->padding.is_allowed = !methods->get_padding(check->request, &check->padding.value);
+  check->block_mode.is_allowed = !methods->get_block_mode(check->request, &check->block_mode.value);
+  check->digest.is_allowed = !methods->get_digest(check->request, &check->digest.value);
+  return KM_ERROR_OK;
+}
+
+// A request that names no MAC length passes: the algorithm decides what that means.
+keymaster_error_t check_mac_length(const begin_check_t& check, uint32_t minimum_bits,
+                                   trace_site at) {
+  const bool makes_mac =
+      check.algorithm == KM_ALGORITHM_HMAC ||
+      (check.algorithm == KM_ALGORITHM_AES && check.block_mode.value == KM_MODE_GCM);
+  const keymaster_key_param_t* bits = get_unique(check.request, KM_TAG_MAC_LENGTH);
+  if (!makes_mac || bits == nullptr || minimum_bits <= bits->integer) return KM_ERROR_OK;
+  return KM_REFUSE_AT(at, KM_ERROR_INVALID_MAC_LENGTH, "MAC length %d below the key's minimum %d",
+                      static_cast<int>(bits->integer), static_cast<int>(minimum_bits));
+}
+
+keymaster_error_t check_active(uint64_t active_ms, trace_site at) {
+  if (current_time_ms() >= active_ms) return KM_ERROR_OK;
+  return KM_REFUSE_AT(at, KM_ERROR_KEY_NOT_YET_VALID, "Key not yet valid");
+}
+
+keymaster_error_t check_expiry(uint64_t expire_ms, trace_site at) {
+  if (current_time_ms() <= expire_ms) return KM_ERROR_OK;
+  return KM_REFUSE_AT(at, KM_ERROR_KEY_EXPIRED, "Key expired");
+}
+
+// Whether the purpose makes something new (which the origination date ends) rather than opening
+// what was made before (which the usage date ends).
+bool is_origination(uint32_t purpose) {
+  return purpose == KM_PURPOSE_ENCRYPT || purpose == KM_PURPOSE_SIGN;
+}
+
+// System seconds on both sides: the log holds system times, and the TA's clock has another origin.
+// A distance of exactly `min_seconds` still refuses.
+keymaster_error_t check_rate_limit(const key_identity_t& identity, uint32_t min_seconds,
+                                   trace_site at) {
+  TEE_Time last{};
+  if (!get_last_use_time(identity, &last)) return KM_ERROR_OK;
+  TEE_Time now{};
+  TEE_GetSystemTime(&now);
+  if (now.seconds - last.seconds > min_seconds) return KM_ERROR_OK;
+  return KM_REFUSE_AT(at, KM_ERROR_KEY_RATE_LIMIT_EXCEEDED, "key rate limit exceeded");
+}
+
+// One parameter of the key, as the walk comes to it.
+keymaster_error_t check_param(const keymaster_key_param_t& param, begin_check_t* check,
+                              trace_site at) {
+  switch (param.tag) {
+    case KM_TAG_PURPOSE:
+      check->is_purpose_allowed |= param.enumerated == check->purpose;
+      return KM_ERROR_OK;
+    case KM_TAG_PADDING:
+      check->padding.is_allowed |= param.enumerated == check->padding.value;
+      return KM_ERROR_OK;
+    case KM_TAG_BLOCK_MODE:
+      check->block_mode.is_allowed |= param.enumerated == check->block_mode.value;
+      return KM_ERROR_OK;
+    case KM_TAG_DIGEST:
+      check->digest.is_allowed |= param.enumerated == check->digest.value;
+      return KM_ERROR_OK;
+    case KM_TAG_MIN_MAC_LENGTH:
+      return check_mac_length(*check, param.integer, at);
+    case KM_TAG_ACTIVE_DATETIME:
+      return check_active(param.date_time, at);
+    case KM_TAG_ORIGINATION_EXPIRE_DATETIME:
+      return is_origination(check->purpose) ? check_expiry(param.date_time, at) : KM_ERROR_OK;
+    case KM_TAG_USAGE_EXPIRE_DATETIME:
+      return is_origination(check->purpose) ? KM_ERROR_OK : check_expiry(param.date_time, at);
+    case KM_TAG_MIN_SECONDS_BETWEEN_OPS:
+      return check_rate_limit(check->identity, param.integer, at);
+    case KM_TAG_MAX_USES_PER_BOOT:
+      // Counted here and now, though a later check may refuse: that is intended, so that no refusal
+      // can be used to try a key for free.
+      return check_use_count_and_add(check->identity, param.integer);
+    case KM_TAG_USER_SECURE_ID:
+      return check_secure_id(param.long_integer, check->key_params, &check->user, at);
+    case KM_TAG_BOOTLOADER_ONLY:
+      return KM_REFUSE_AT(at, KM_ERROR_INVALID_KEY_BLOB, "Bootloader only key");
+    default:
+      return KM_ERROR_OK;
+  }
+}
+
+// What the walk must have found.
+keymaster_error_t check_allowed(const begin_check_t& check, trace_site at) {
+  const struct {
+    bool is_allowed;
+    keymaster_error_t error;
+    const char* what;
+  } demands[] = {
+      {check.is_purpose_allowed, KM_ERROR_INCOMPATIBLE_PURPOSE, "purpose"},
+      {check.padding.is_allowed, KM_ERROR_INCOMPATIBLE_PADDING_MODE, "padding"},
+      {check.block_mode.is_allowed, KM_ERROR_INCOMPATIBLE_BLOCK_MODE, "block mode"},
+      {check.digest.is_allowed, KM_ERROR_INCOMPATIBLE_DIGEST, "digest"},
+  };
+  for (const auto& [is_allowed, error, what] : demands) {
+    if (!is_allowed) return KM_REFUSE_AT(at, error, "No such %s in key_params", what);
+  }
+  return KM_ERROR_OK;
+}
+
+// Without a timeout the key is authenticated for each operation, whose handle a token can carry
+// only after this begin.
+keymaster_error_t check_begin_auth(const begin_check_t& check, trace_site at) {
+  if (!check.user.is_due()) return KM_ERROR_OK;
+  if (get_unique(check.key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) {
+    return KM_REFUSE_AT(at, KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
+  }
+  trace(TEE_TRACE_INFO, at, "OP AUTH NEEDED");
+  return KM_AUTHENTICATION_DUE;
+}
+
+keymaster_error_t check_caller_nonce(const begin_check_t& check, trace_site at) {
+  if (check.purpose != KM_PURPOSE_ENCRYPT || get_unique(check.request, KM_TAG_NONCE) == nullptr ||
+      get_unique(check.key_params, KM_TAG_CALLER_NONCE) != nullptr) {
+    return KM_ERROR_OK;
+  }
+  return KM_REFUSE_AT(at, KM_ERROR_CALLER_NONCE_PROHIBITED, "Caller nonce prohibited");
+}
+
+keymaster_error_t check_begin(begin_check_t* check, trace_site begin, trace_site at) {
+  constexpr uint64_t ANY_CHALLENGE = 0;
+  if (auto error = read_user_auth(check->request, ANY_CHALLENGE, &check->user)) return error;
+  if (auto error = ask_operation(check, begin)) return error;
+  for (const keymaster_key_param_t& param : check->key_params) {
+    if (auto error = check_param(param, check, at)) return error;
+  }
+  if (auto error = check_allowed(*check, at)) return error;
+  const keymaster_error_t outcome = check_begin_auth(*check, at);
+  if (outcome != KM_ERROR_OK && outcome != KM_AUTHENTICATION_DUE) return outcome;
+  if (auto error = check_caller_nonce(*check, at)) return error;
+  // A full log does not refuse: the limit then goes unenforced until a record is free.
+  const auto* min_seconds = get_unique(check->key_params, KM_TAG_MIN_SECONDS_BETWEEN_OPS);
+  if (min_seconds != nullptr) record_key_use(check->identity, min_seconds->integer);
+  return outcome;
+}
+
+keymaster_error_t check_operation_auth(const keymaster_key_param_set_t& request,
+                                       const keymaster_key_param_set_t& key_params,
+                                       uint64_t challenge, trace_site at) {
+  if (get_unique(key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) return KM_ERROR_OK;
+  user_auth_t user{};
+  if (auto error = read_user_auth(request, challenge, &user)) return error;
+  for (const keymaster_key_param_t& param : key_params) {
+    if (param.tag != KM_TAG_USER_SECURE_ID) continue;
+    if (auto error = check_secure_id(param.long_integer, key_params, &user, at)) return error;
+  }
+  if (!user.is_due()) return KM_ERROR_OK;
+  return KM_REFUSE_AT(at, KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
+}
+
+// What anyone can do with the public half is never restricted.
+bool is_public_key_use(uint32_t algorithm, uint32_t purpose) {
+  return (algorithm == KM_ALGORITHM_RSA || algorithm == KM_ALGORITHM_EC) &&
+         (purpose == KM_PURPOSE_ENCRYPT || purpose == KM_PURPOSE_VERIFY);
+}
+
+}  // namespace
+
+bool check_app_id_and_app_data(const keymaster_key_param_set_t& key_params, byte_view app_id,
+                               byte_view app_data) {
+  const struct {
+    keymaster_tag_t tag;
+    const char* name;
+    byte_view given;
+  } bindings[] = {
+      {KM_TAG_APPLICATION_ID, "KM_TAG_APPLICATION_ID", app_id},
+      {KM_TAG_APPLICATION_DATA, "KM_TAG_APPLICATION_DATA", app_data},
+  };
+  for (const auto& [tag, name, given] : bindings) {
+    if (!contains_tag(key_params, tag)) continue;
+    const keymaster_key_param_t* bound = get_unique(key_params, tag);
+    if (bound == nullptr) {
+      TRACE_ERROR("Duplicated %s", name);
+      return false;
+    }
+    if (!equal_constant_time(bound->blob(), given)) {
+      TRACE_ERROR("%s mismatch", name);
+      return false;
+    }
+  }
+  return true;
+}
+
+TEE_Result authorize_begin(byte_view key_blob, uint32_t purpose,
+                           const keymaster_key_param_set_t& begin_params,
+                           const keymaster_key_param_set_t& key_params, keymaster_error_t* km_error,
+                           trace_site at) {
+  const keymaster_key_param_t* algorithm = get_unique(key_params, KM_TAG_ALGORITHM);
+  if (algorithm == nullptr) {
+    return KM_FAIL(km_error, KM_ERROR_INVALID_KEY_BLOB,
+                   "No or too many KM_TAG_ALGORITHM in key_params");
+  }
+  *km_error = KM_ERROR_OK;
+  if (is_public_key_use(algorithm->enumerated, purpose)) return TEE_SUCCESS;
+  begin_check_t check{.request = begin_params,
+                      .key_params = key_params,
+                      .algorithm = algorithm->enumerated,
+                      .purpose = purpose};
+  if (TEE_Result res = identify_key(key_blob, &check.identity)) return res;
+  *km_error = check_begin(&check, at, trace_site::here());
+  return TEE_SUCCESS;
+}
+
+TEE_Result authorize_update_or_finish(const keymaster_key_param_set_t& request_params,
+                                      const keymaster_key_param_set_t& key_params,
+                                      uint64_t challenge, keymaster_error_t* km_error) {
+  *km_error = check_operation_auth(request_params, key_params, challenge, trace_site::here());
+  return TEE_SUCCESS;
+}
+
+}  // namespace keymaster

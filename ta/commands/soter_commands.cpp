@@ -1,0 +1,88 @@
+// The commands of the biometric framework. Those that answer through the value slot always succeed
+// towards the TEE.
+#include "ta/base/results.h"
+#include "ta/commands/command.h"
+#include "ta/soter/attk.h"
+#include "ta/soter/finger_id.h"
+#include "ta/soter/provisioning.h"
+#include "ta/vault/vault.h"
+
+namespace keymaster::commands {
+namespace {
+
+// What the value slot says beside Keymaster's own codes.
+constexpr keymaster_error_t ATTK_MISSING = -1;
+constexpr keymaster_error_t ATTK_FAILED = -2;
+constexpr keymaster_error_t SOTER_NOT_READY = -1;
+
+constexpr int LOAD_ATTEMPTS = 3;
+
+constexpr uint8_t REQUEST_DEVICE_ID[] = {0x34, 0x19, 0x36, 0x19};
+
+TEE_Result export_attk(byte_span output, size_t* length) {
+  uint32_t key_bits = 0;
+  const tee_object key = convert_key_to_object(soter_key_pair(), &key_bits);
+  if (!key) return TEE_ERROR_BAD_FORMAT;
+  return export_rsa_public_key(key.get(), key_bits, output, length);
+}
+
+}  // namespace
+
+// Generates nothing, whatever its name says: intended, the factory makes the key.
+TEE_Result soter_handle_generate_attk_key_pair(command_io*, keymaster_error_t* km_error) {
+  TRACE_INFO("this function should not be called in anytime but in meta mode\n");
+  if (soter_check_init() != TEE_SUCCESS) {
+    return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "attk_key_pair is not produced\n");
+  }
+  return TEE_SUCCESS;
+}
+
+// Loads the key anew, whether or not it is loaded: the question is what the vault has.
+TEE_Result soter_handle_verify_attk_key_pair(command_io*, keymaster_error_t* km_error) {
+  TEE_Result res = TEE_ERROR_OUT_OF_MEMORY;
+  for (int attempt = 0; attempt < LOAD_ATTEMPTS && res == TEE_ERROR_OUT_OF_MEMORY; attempt++) {
+    soter_key_pair_t attk;
+    res = init_soter_key(&attk);
+  }
+  if (res != TEE_SUCCESS) {
+    *km_error = res == TEE_ERROR_ITEM_NOT_FOUND ? ATTK_MISSING : ATTK_FAILED;
+  }
+  return TEE_SUCCESS;
+}
+
+TEE_Result soter_handle_export_attk_public_key(command_io* io, keymaster_error_t* km_error) {
+  if (io->output.data() == nullptr) {
+    *km_error = KM_ERROR_INVALID_ARGUMENT;
+  } else if (soter_check_init() != TEE_SUCCESS) {
+    *km_error = SOTER_NOT_READY;
+  } else if (export_attk(io->output, &io->output_size) != TEE_SUCCESS) {
+    *km_error = KM_ERROR_UNKNOWN_ERROR;
+  }
+  return TEE_SUCCESS;
+}
+
+TEE_Result soter_handle_get_device_id(command_io* io, keymaster_error_t* km_error) {
+  size_t length = io->output.size();
+  const TEE_Result res =
+      retrieve_property_from_vault(REQUEST_DEVICE_ID, io->output.data(), &length);
+  if (res == TEE_ERROR_SHORT_BUFFER) {
+    *km_error = KM_ERROR_INSUFFICIENT_BUFFER_SPACE;
+    return TEE_SUCCESS;
+  }
+  if (res != TEE_SUCCESS) {
+    return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "retrieve_device_id_from_vault fail, 0x%x\n",
+                   res);
+  }
+  io->output_size = length;
+  return TEE_SUCCESS;
+}
+
+TEE_Result soter_handle_setFid(command_io* io, keymaster_error_t*) {
+  TRACE_DEBUG("soter handle finger print ta notify");
+  if (TEE_Result res = is_from_fp_ta()) return TEE_FAIL(res, "soter deny finger print ta");
+  if (TEE_Result res = take_notification(io->input)) return res;
+  TRACE_DEBUG("soter handle finger print ta notify success");
+  return TEE_SUCCESS;
+}
+
+}  // namespace keymaster::commands

@@ -1,0 +1,225 @@
+// Key blobs: sealing and opening.
+#include "ta/store/key_blob.h"
+
+#include "tee_internal_api.h"
+
+#include "ta/base/tee_handles.h"
+#include "ta/params/marshal.h"
+#include "ta/store/blob_plaintext.h"
+#include "ta/store/key_store.h"
+
+namespace keymaster {
+namespace {
+
+constexpr uint8_t PROTECTED_BY_DERIVED_KSK = 0;
+constexpr uint8_t PROTECTED_BY_RPMB_KSK = 1;
+constexpr uint32_t KK_BITS = 256;
+constexpr size_t SALT_OFFSET = 1;
+constexpr size_t NONCE_OFFSET = SALT_OFFSET + SALT_SIZE;
+constexpr size_t NONCE_SIZE = 12;
+constexpr size_t TAG_OFFSET = NONCE_OFFSET + NONCE_SIZE;
+constexpr size_t TAG_SIZE = 16;
+constexpr size_t HEADER_SIZE = TAG_OFFSET + TAG_SIZE;
+static_assert(HEADER_SIZE == 93);
+
+// The cipher of a blob: AES-256-GCM under the key that `ksk` and the blob's salt give.
+TEE_Result start_gcm(byte_view header, TEE_ObjectHandle ksk, uint32_t mode, tee_operation* gcm,
+                     trace_site at) {
+  tee_object kk;
+  if (TEE_Result res = TEE_DeriveKK(ksk, header.subspan(SALT_OFFSET, SALT_SIZE), &kk)) {
+    trace_error(at, "DeriveKK failed with 0x%08x\n", res);
+    return res;
+  }
+  if (TEE_Result res = gcm->allocate(TEE_ALG_AES_GCM, mode, KK_BITS, at)) return res;
+  if (TEE_Result res = gcm->set_key(kk.get(), at)) return res;
+  return gcm->ae_init(header.subspan(NONCE_OFFSET, NONCE_SIZE), TAG_SIZE * 8, at);
+}
+
+// Encrypts the pieces of the plaintext one behind the other into `ciphertext`.
+TEE_Result encrypt_pieces(tee_operation* gcm, std::span<const byte_view> pieces,
+                          output_cursor* ciphertext, trace_site at) {
+  for (const byte_view piece : pieces) {
+    size_t produced = 0;
+    byte_span room;
+    if (TEE_Result res = gcm->ae_update(piece, ciphertext->rest(), &produced, at)) return res;
+    if (!ciphertext->reserve(produced, &room)) return TEE_ERROR_GENERIC;
+  }
+  return TEE_SUCCESS;
+}
+
+TEE_Result finish_encryption(tee_operation* gcm, byte_span tag, output_cursor* ciphertext,
+                             trace_site at) {
+  const byte_span last = ciphertext->rest();
+  tee_size last_size = static_cast<tee_size>(last.size());
+  tee_size tag_size = static_cast<tee_size>(tag.size());
+  if (TEE_Result res = TEE_AEEncryptFinal(gcm->get(), nullptr, 0, last.data(), &last_size,
+                                          tag.data(), &tag_size)) {
+    trace_error(at, "AEEncryptFinal failed with 0x%08x\n", res);
+    return res;
+  }
+  if (tag_size != TAG_SIZE) {
+    // The second number is the final call's output, not the tag's size: intended.
+    trace_error(at, "Wrong tag size, expect %dB, got %dB", static_cast<int>(TAG_SIZE),
+                static_cast<int>(last_size));
+    return TEE_ERROR_GENERIC;
+  }
+  byte_span room;
+  return ciphertext->reserve(last_size, &room) ? TEE_SUCCESS : TEE_ERROR_GENERIC;
+}
+
+// Fills a blob of exactly the right size, in TA memory.
+TEE_Result seal(byte_view key, byte_view characteristics, byte_span blob, trace_site at) {
+  const byte_span salt = blob.subspan(SALT_OFFSET, SALT_SIZE);
+  const byte_span nonce = blob.subspan(NONCE_OFFSET, NONCE_SIZE);
+  TEE_GenerateRandom(salt.data(), static_cast<tee_size>(salt.size()));
+  TEE_GenerateRandom(nonce.data(), static_cast<tee_size>(nonce.size()));
+  const bool rpmb = rpmb_ksk() != TEE_HANDLE_NULL;
+  blob[0] = rpmb ? PROTECTED_BY_RPMB_KSK : PROTECTED_BY_DERIVED_KSK;
+
+  tee_operation gcm;
+  if (TEE_Result res =
+          start_gcm(blob, rpmb ? rpmb_ksk() : derived_ksk(), TEE_MODE_ENCRYPT, &gcm, at)) {
+    return res;
+  }
+  uint8_t key_length[4];
+  uint8_t characteristics_length[4];
+  store_u32(key_length, static_cast<uint32_t>(key.size()));
+  store_u32(characteristics_length, static_cast<uint32_t>(characteristics.size()));
+  const byte_view pieces[] = {key_length, key, characteristics_length, characteristics};
+  output_cursor ciphertext(blob.subspan(HEADER_SIZE));
+  if (TEE_Result res = encrypt_pieces(&gcm, pieces, &ciphertext, at)) return res;
+  if (TEE_Result res =
+          finish_encryption(&gcm, blob.subspan(TAG_OFFSET, TAG_SIZE), &ciphertext, at)) {
+    return res;
+  }
+  if (ciphertext.left() != 0) {
+    trace_error(at, "Unmatched total size, expected: %d actual: %d\n",
+                static_cast<int>(blob.size()), static_cast<int>(blob.size() - ciphertext.left()));
+    return TEE_ERROR_GENERIC;
+  }
+  return TEE_SUCCESS;
+}
+
+// The KSK that a blob names. Both results.
+TEE_Result choose_ksk(uint8_t protection, TEE_ObjectHandle* ksk, keymaster_error_t* km_error,
+                      trace_site at) {
+  switch (protection) {
+    case PROTECTED_BY_DERIVED_KSK:
+      *ksk = derived_ksk();
+      return TEE_SUCCESS;
+    case PROTECTED_BY_RPMB_KSK:
+      *ksk = rpmb_ksk();
+      if (*ksk != TEE_HANDLE_NULL) return TEE_SUCCESS;
+      trace_error(at, "RPMB KSK died, fail to open key");
+      return KEY_STORE_ERROR_KSK_MISSING;
+    default:
+      trace_error(at, "Unknown key protection");
+      *km_error = KM_ERROR_INVALID_KEY_BLOB;
+      return TEE_SUCCESS;
+  }
+}
+
+// Decrypts and authenticates; *produced receives the bytes that both calls gave.
+TEE_Result decrypt(tee_operation* gcm, byte_view ciphertext, byte_view tag, byte_span plaintext,
+                   size_t* produced, trace_site at) {
+  size_t updated = 0;
+  if (TEE_Result res = gcm->ae_update(ciphertext, plaintext, &updated, at)) return res;
+  const byte_span last = plaintext.subspan(updated);
+  tee_size last_size = static_cast<tee_size>(last.size());
+  if (TEE_Result res =
+          TEE_AEDecryptFinal(gcm->get(), nullptr, 0, last.data(), &last_size,
+                             const_cast<uint8_t*>(tag.data()), static_cast<tee_size>(tag.size()))) {
+    trace_error(at, "AEDecryptFinal failed with 0x%08x\n", res);
+    return res;
+  }
+  *produced = updated + last_size;
+  return TEE_SUCCESS;
+}
+
+// Decrypts the blob into *plaintext. Both results.
+TEE_Result unseal(byte_view blob, heap_buffer* plaintext, keymaster_error_t* km_error,
+                  trace_site at) {
+  TEE_ObjectHandle ksk{};
+  const TEE_Result chosen = choose_ksk(blob[0], &ksk, km_error, at);
+  if (failed(chosen, *km_error)) return chosen;
+  tee_operation gcm;
+  if (TEE_Result res = start_gcm(blob, ksk, TEE_MODE_DECRYPT, &gcm, at)) return res;
+  const byte_view ciphertext = blob.subspan(HEADER_SIZE);
+  if (!plaintext->allocate(ciphertext.size())) {
+    trace_error(at, "Out of memory");
+    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
+    return TEE_SUCCESS;
+  }
+  size_t produced = 0;
+  if (TEE_Result res = decrypt(&gcm, ciphertext, blob.subspan(TAG_OFFSET, TAG_SIZE),
+                               plaintext->span(), &produced, at)) {
+    return res;
+  }
+  if (produced != ciphertext.size()) {
+    trace_error(at, "Too short output of AES, expect %dB, got %dB",
+                static_cast<int>(ciphertext.size()), static_cast<int>(produced));
+    *km_error = KM_ERROR_UNKNOWN_ERROR;
+  }
+  return TEE_SUCCESS;
+}
+
+}  // namespace
+
+TEE_Result parse_plaintext(heap_buffer* plaintext, keymaster_error_t unreadable_set,
+                           keymaster_key_param_set_t* characteristics, keymaster_error_t* km_error,
+                           trace_site at) {
+  input_cursor in(plaintext->view());
+  byte_view key;
+  byte_view marshalled;
+  if (!in.read_field(&key) || !in.read_field(&marshalled)) {
+    trace_error(at, "Too short input");
+    return TEE_ERROR_GENERIC;
+  }
+  if (unmarshal(marshalled, characteristics) != TEE_SUCCESS) {
+    trace_error(at, "Unmarshal failed");
+    *km_error = unreadable_set;
+    return TEE_SUCCESS;
+  }
+  plaintext->keep(key);
+  return TEE_SUCCESS;
+}
+
+TEE_Result save_key(byte_view key, const keymaster_key_param_set_t& characteristics, byte_span blob,
+                    size_t* blob_size) {
+  *blob_size = 0;
+  uint8_t* marshalled = nullptr;
+  uint32_t marshalled_size = 0;
+  if (TEE_Result res = marshal(characteristics, true, &marshalled, &marshalled_size)) {
+    return TEE_FAIL(res, "Marshal failed");
+  }
+  const heap_buffer owner(marshalled, marshalled_size);
+  const uint64_t size = uint64_t{HEADER_SIZE} + 2 * sizeof(uint32_t) + key.size() + owner.size();
+  if (size > blob.size()) return TEE_FAIL(TEE_ERROR_SHORT_BUFFER, "Too short key blob");
+  heap_buffer sealed;
+  if (!sealed.allocate(static_cast<size_t>(size))) {
+    return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
+  }
+  if (TEE_Result res = seal(key, owner.view(), sealed.span(), trace_site::here())) return res;
+  copy_bytes(blob, sealed.view());
+  *blob_size = sealed.size();
+  return TEE_SUCCESS;
+}
+
+TEE_Result open_key(byte_view blob, heap_buffer* key, keymaster_key_param_set_t* characteristics,
+                    keymaster_error_t* km_error) {
+  key->reset();
+  *characteristics = {};
+  *km_error = KM_ERROR_OK;
+  if (blob.size() <= HEADER_SIZE) {
+    return KM_FAIL(km_error, KM_ERROR_INVALID_KEY_BLOB, "Too short key blob");
+  }
+  heap_buffer plaintext;
+  TEE_Result res = unseal(blob, &plaintext, km_error, trace_site::here());
+  if (failed(res, *km_error)) return res;
+  res = parse_plaintext(&plaintext, KM_ERROR_INVALID_ARGUMENT, characteristics, km_error,
+                        trace_site::here());
+  if (!failed(res, *km_error)) *key = std::move(plaintext);
+  return res;
+}
+
+}  // namespace keymaster
