@@ -23,7 +23,7 @@
 #include "support/trace_capture.h"
 #include "tee/device/device.h"
 #include "tee/device/object_name.h"
-#include "tee/runtime/host_control.h"
+#include "tee/host/host_control.h"
 
 namespace keymaster::test {
 

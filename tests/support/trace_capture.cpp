@@ -4,7 +4,7 @@
 
 #include <algorithm>
 
-#include "tee/runtime/host_control.h"
+#include "tee/host/host_control.h"
 
 namespace keymaster::test {
 namespace {

@@ -3,8 +3,8 @@
 #include "support/blob_forge.h"
 #include "support/sets.h"
 #include "support/ta_under_test.h"
+#include "tee/core/stored_object.h"
 #include "tee/device/object_store.h"
-#include "tee/runtime/stored_object.h"
 
 namespace keymaster::test {
 namespace {

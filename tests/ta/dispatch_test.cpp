@@ -3,7 +3,7 @@
 
 #include "support/sets.h"
 #include "support/ta_under_test.h"
-#include "tee/runtime/instance.h"
+#include "tee/core/instance.h"
 
 namespace keymaster::test {
 namespace {

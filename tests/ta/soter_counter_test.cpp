@@ -4,8 +4,8 @@
 #include <unistd.h>
 
 #include "ta/soter_device.h"
+#include "tee/core/stored_object.h"
 #include "tee/device/object_store.h"
-#include "tee/runtime/stored_object.h"
 
 namespace keymaster::test {
 namespace {

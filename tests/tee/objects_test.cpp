@@ -3,7 +3,7 @@
 #include <functional>
 
 #include "support.h"
-#include "tee/runtime/object.h"
+#include "tee/core/object.h"
 
 namespace tee::test {
 namespace {

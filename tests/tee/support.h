@@ -8,8 +8,8 @@
 #include <memory>
 #include <vector>
 
+#include "tee/core/instance.h"
 #include "tee/device/device.h"
-#include "tee/runtime/instance.h"
 
 namespace tee::test {
 

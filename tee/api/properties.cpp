@@ -1,0 +1,136 @@
+// TEE Internal Core API: properties of the implementation, of the running trusted application and
+// of its client.
+#include "tee/core/properties.h"
+
+#include "tee_internal_api.h"
+
+#include <algorithm>
+#include <cstring>
+#include <optional>
+#include <string_view>
+
+#include "tee/api/arguments.h"
+#include "tee/core/faults.h"
+#include "tee/core/instance.h"
+#include "tee/device/uuid.h"
+
+namespace tee {
+namespace {
+
+constexpr uint32_t CORE_API_VERSION = 0x01030000;  // major, minor, maintenance, 0
+// How hard it is to tamper with: 100, as hard as for the normal world's own software.
+constexpr uint32_t PROTECTED_BY_REE = 100;
+
+using lookup = std::optional<property_value> (*)(device&);
+struct implementation_property {
+  std::string_view name;
+  lookup value;
+};
+constexpr implementation_property IMPLEMENTATION[] = {
+    {"gpd.tee.apiversion", [](device&) { return std::optional<property_value>("1.3"); }},
+    {"gpd.tee.internalCore.version",
+     [](device&) { return std::optional<property_value>(CORE_API_VERSION); }},
+    {"gpd.tee.description",
+     [](device&) { return std::optional<property_value>("TEE on a general-purpose host"); }},
+    {"gpd.tee.deviceID",
+     [](device& dev) { return std::optional<property_value>(dev.settings().id); }},
+    {"gpd.tee.systemTime.protectionLevel",
+     [](device&) { return std::optional<property_value>(PROTECTED_BY_REE); }},
+    {"gpd.tee.trustedStorage.antiRollback.protectionLevel",
+     [](device& dev) {
+       return std::optional<property_value>(dev.has_rpmb() ? PROTECTED_BY_REE : 0);
+     }},
+    {"gpd.tee.trustedos.manufacturer",
+     [](device& dev) { return std::optional<property_value>(dev.settings().manufacturer); }},
+    {"gpd.tee.trustedos.implementation.version",
+     [](device& dev) {
+       return std::optional<property_value>(dev.settings().implementation_version);
+     }},
+};
+
+std::optional<property_value> find_property(const char* call, TEE_PropSetHandle set,
+                                            const char* name) {
+  instance& caller = current_instance(call);
+  if (!name) panic(call, "name is null");
+  if (set == TEE_PROPSET_TEE_IMPLEMENTATION) {
+    for (const auto& property : IMPLEMENTATION) {
+      if (property.name == name) return property.value(caller.dev());
+    }
+  } else if (set == TEE_PROPSET_CURRENT_CLIENT) {
+    bool known = caller.client() && std::string_view(name) == "gpd.client.identity";
+    if (known) return *caller.client();
+  } else if (set == TEE_PROPSET_CURRENT_TA) {
+    auto found = caller.properties().find(std::string_view(name));
+    if (found != caller.properties().end()) return found->second;
+  } else {
+    panic(call, "%p is not a property set", static_cast<void*>(set));
+  }
+  return std::nullopt;
+}
+
+// As much of the text as fits is there even when the room is short.
+TEE_Result put_text(const std::string& text, output_buffer value) {
+  size_t needed = text.size() + 1;
+  if (size_t room = std::min(needed, value.capacity()); room > 0) {
+    std::memcpy(value.data(), text.data(), room - 1);
+    value.data()[room - 1] = 0;
+  }
+  if (TEE_Result res = value.reserve(needed)) return res;
+  value.set_length(needed);
+  return TEE_SUCCESS;
+}
+
+// The common course of the calls: look the property up, and let `convert` make of it what was
+// asked.
+template <typename Convert>
+TEE_Result get_property(const char* call, TEE_PropSetHandle set, const char* name,
+                        const void* value, Convert&& convert) {
+  return guarded(call, [&]() -> TEE_Result {
+    if (!value) panic(call, "value is null");
+    std::optional<property_value> property = find_property(call, set, name);
+    if (TEE_Result fault = fault_point()) return fault;
+    if (!property) return TEE_ERROR_ITEM_NOT_FOUND;
+    return convert(*property);
+  });
+}
+
+}  // namespace
+
+}  // namespace tee
+
+using tee::property_value;
+
+TEE_Result TEE_GetPropertyAsString(TEE_PropSetHandle propsetOrEnumerator, const char* name,
+                                   char* valueBuffer, size_t* valueBufferLen) {
+  constexpr const char* CALL = "TEE_GetPropertyAsString";
+  return tee::get_property(
+      CALL, propsetOrEnumerator, name, valueBufferLen, [&](const property_value& value) {
+        tee::output_buffer text(CALL, "valueBuffer", valueBuffer, valueBufferLen);
+        return tee::put_text(tee::property_text(value), text);
+      });
+}
+
+TEE_Result TEE_GetPropertyAsUUID(TEE_PropSetHandle propsetOrEnumerator, const char* name,
+                                 TEE_UUID* value) {
+  return tee::get_property("TEE_GetPropertyAsUUID", propsetOrEnumerator, name, value,
+                           [&](const property_value& property) -> TEE_Result {
+                             if (auto* uuid = std::get_if<TEE_UUID>(&property)) {
+                               *value = *uuid;
+                               return TEE_SUCCESS;
+                             }
+                             auto* text = std::get_if<std::string>(&property);
+                             return text && tee::parse_uuid(*text, value) ? TEE_SUCCESS
+                                                                          : TEE_ERROR_BAD_FORMAT;
+                           });
+}
+
+TEE_Result TEE_GetPropertyAsIdentity(TEE_PropSetHandle propsetOrEnumerator, const char* name,
+                                     TEE_Identity* value) {
+  return tee::get_property("TEE_GetPropertyAsIdentity", propsetOrEnumerator, name, value,
+                           [&](const property_value& property) -> TEE_Result {
+                             auto* identity = std::get_if<TEE_Identity>(&property);
+                             if (!identity) return TEE_ERROR_BAD_FORMAT;
+                             *value = *identity;
+                             return TEE_SUCCESS;
+                           });
+}

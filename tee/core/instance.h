@@ -1,0 +1,82 @@
+// An instance of a trusted application: everything that the TEE keeps for it, and which one runs on
+// the calling thread.
+#pragma once
+
+#include "tee_internal_api.h"
+
+#include <memory>
+#include <optional>
+
+#include "tee/core/handles.h"
+#include "tee/core/heap.h"
+#include "tee/core/live_counts.h"
+#include "tee/core/object.h"
+#include "tee/core/operation.h"
+#include "tee/core/properties.h"
+#include "tee/core/session.h"
+#include "tee/crypto/key_cache.h"
+#include "tee/device/device.h"
+
+namespace tee {
+
+class instance {
+ public:
+  // `heap_limit` in bytes. The device must outlive the instance, and so must `opener`, which
+  // gives it sessions with other trusted applications; null: there are none.
+  instance(const TEE_UUID& uuid, device& dev, size_t heap_limit, session_opener* opener = nullptr);
+  instance(const instance&) = delete;
+  instance& operator=(const instance&) = delete;
+  ~instance();  // reclaims and wipes all that is left
+
+  const TEE_UUID& uuid() const { return uuid_; }
+  device& dev() { return device_; }
+  heap& memory() { return memory_; }
+  handle_table<object>& objects() { return objects_; }
+  handle_table<operation>& operations() { return operations_; }
+  handle_table<std::shared_ptr<session>>& sessions() { return sessions_; }
+  session_opener* opener() { return opener_; }
+  crypto::key_cache& keys() { return keys_; }
+  crypto::digest_pool& digests() { return digests_; }
+
+  // client: who called the entry point that runs; null in create and destroy. set_client copies.
+  const TEE_Identity* client() const { return client_ ? &*client_ : nullptr; }
+  void set_client(const TEE_Identity* client);
+
+  // properties: the instance's gpd.ta.* and its own properties, by full name. gpd.ta.appID is there
+  // from the start.
+  property_map& properties() { return properties_; }
+
+  // counts: what the trusted application holds at the moment.
+  live_counts counts() const;
+
+ private:
+  TEE_UUID uuid_;
+  device& device_;
+  heap memory_;
+  crypto::key_cache keys_;
+  crypto::digest_pool digests_;  // outlives the operations
+  handle_table<object> objects_;
+  handle_table<operation> operations_;
+  handle_table<std::shared_ptr<session>> sessions_;
+  session_opener* opener_;
+  std::optional<TEE_Identity> client_;
+  property_map properties_;
+};
+
+// Makes an instance the one that runs on this thread, for the life of the scope. Scopes nest, since
+// a trusted application may call another one.
+class instance_scope {
+ public:
+  explicit instance_scope(instance& running);
+  instance_scope(const instance_scope&) = delete;
+  instance_scope& operator=(const instance_scope&) = delete;
+  ~instance_scope();
+
+ private:
+  instance* outer_;
+};
+
+// current_instance: the one that runs on this thread; panics in the name of `call` when none does.
+instance& current_instance(const char* call);
+
+}  // namespace tee
