@@ -5,7 +5,6 @@
 #include "ta/base/bytes.h"
 #include "ta/base/heap.h"
 #include "ta/base/results.h"
-#include "ta/base/trace.h"
 #include "ta/params/param_set.h"
 
 namespace keymaster {
@@ -107,14 +106,14 @@ TEE_Result refuse_export(byte_view key_material, byte_span output, size_t* produ
 // free_operation: the body of every `free`. T derives from operation_t, names itself in
 // T::TYPE_NAME and tells in missing() how many of its mandatory members are not there.
 template <class T>
-void free_operation(operation_t* operation, trace_site at) {
+void free_operation(operation_t* operation) {
   auto* record = static_cast<T*>(operation);
   if (record == nullptr) {
-    trace_error(at, "Try to free NULL %s", T::TYPE_NAME);
+    trace_error("Try to free NULL %s", T::TYPE_NAME);
     return;
   }
   for (int i = record->missing(); i > 0; i--) {
-    trace_error(at, "Try to free invalid %s", T::TYPE_NAME);
+    trace_error("Try to free invalid %s", T::TYPE_NAME);
   }
   heap_delete(record);
 }
@@ -124,10 +123,10 @@ void free_operation(operation_t* operation, trace_site at) {
 // *km_error set.
 template <class T, class Prepare>
 operation_t* create_operation_object(const operation_slots_t& slots, keymaster_error_t* km_error,
-                                     trace_site at, Prepare prepare) {
+                                     Prepare prepare) {
   T* record = heap_new<T>();
   if (record == nullptr) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return nullptr;
   }

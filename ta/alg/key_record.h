@@ -16,8 +16,7 @@ namespace keymaster {
 [[nodiscard]] TEE_Result generate_key_record(uint32_t object_type, uint32_t key_bits,
                                              const TEE_Attribute& parameter,
                                              std::span<const uint32_t> ids, size_t longest,
-                                             heap_buffer* record, keymaster_error_t* km_error,
-                                             trace_site at = trace_site::here());
+                                             heap_buffer* record, keymaster_error_t* km_error);
 
 // read_numbers: reads numbers.size() numbers into views of the source; false when it is too short.
 [[nodiscard]] bool read_numbers(input_cursor* in, std::span<byte_view> numbers);
@@ -29,7 +28,6 @@ namespace keymaster {
 
 // load_key: an object of the platform for operations with the key.
 [[nodiscard]] TEE_Result load_key(uint32_t object_type, uint32_t key_bits,
-                                  std::span<const TEE_Attribute> attributes, tee_object* key,
-                                  trace_site at = trace_site::here());
+                                  std::span<const TEE_Attribute> attributes, tee_object* key);
 
 }  // namespace keymaster

@@ -4,10 +4,10 @@
 namespace keymaster {
 
 keymaster_error_t required_key_bits(const keymaster_key_param_set_t& description,
-                                    uint32_t* key_bits, trace_site at) {
+                                    uint32_t* key_bits) {
   const keymaster_key_param_t* size = get_unique(description, KM_TAG_KEY_SIZE);
   if (size == nullptr) {
-    trace_error(at, "No or too many KM_TAG_KEY_SIZE or specified");
+    trace_error("No or too many KM_TAG_KEY_SIZE or specified");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   *key_bits = size->integer;
@@ -15,17 +15,17 @@ keymaster_error_t required_key_bits(const keymaster_key_param_set_t& description
 }
 
 keymaster_error_t settle_key_bits(keymaster_key_param_set_t* description, uint64_t guessed_bits,
-                                  uint32_t* key_bits, trace_site at) {
+                                  uint32_t* key_bits) {
   // Data that long never fits the TA's heap; the cut value is refused as a size by every algorithm.
   *key_bits = guessed_bits > UINT32_MAX ? UINT32_MAX : static_cast<uint32_t>(guessed_bits);
   const keymaster_key_param_t* given = get_unique(*description, KM_TAG_KEY_SIZE);
   if (given != nullptr && given->integer != *key_bits) {
-    trace_error(at, "Key size mismatch (given %d, guessed %d)", static_cast<int>(given->integer),
+    trace_error("Key size mismatch (given %d, guessed %d)", static_cast<int>(given->integer),
                 static_cast<int>(*key_bits));
     return KM_ERROR_IMPORT_PARAMETER_MISMATCH;
   }
   if (given == nullptr && !add_integer(description, KM_TAG_KEY_SIZE, *key_bits)) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;

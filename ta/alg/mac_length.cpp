@@ -3,12 +3,11 @@
 
 namespace keymaster {
 
-keymaster_error_t check_min_mac_bits(uint32_t min_mac_bits, uint32_t lowest, uint32_t highest,
-                                     trace_site at) {
+keymaster_error_t check_min_mac_bits(uint32_t min_mac_bits, uint32_t lowest, uint32_t highest) {
   if (min_mac_bits >= lowest && min_mac_bits <= highest && min_mac_bits % 8 == 0) {
     return KM_ERROR_OK;
   }
-  trace_error(at, "Invalid KM_TAG_MIN_MAC_LENGTH %d", static_cast<int>(min_mac_bits));
+  trace_error("Invalid KM_TAG_MIN_MAC_LENGTH %d", static_cast<int>(min_mac_bits));
   return KM_ERROR_UNSUPPORTED_MIN_MAC_LENGTH;
 }
 

@@ -8,7 +8,6 @@ namespace keymaster {
 // check_min_mac_bits: whether a KM_TAG_MIN_MAC_LENGTH lies in lowest..highest (bits) and is whole
 // bytes; else KM_ERROR_UNSUPPORTED_MIN_MAC_LENGTH. The message goes out under `at`.
 [[nodiscard]] keymaster_error_t check_min_mac_bits(uint32_t min_mac_bits, uint32_t lowest,
-                                                   uint32_t highest,
-                                                   trace_site at = trace_site::here());
+                                                   uint32_t highest);
 
 }  // namespace keymaster

@@ -21,12 +21,12 @@ const digest_t* find_digest(uint32_t digest) {
   return nullptr;
 }
 
-TEE_Result message_t::start_hash(trace_site at) {
-  return hash.allocate(find_digest(digest)->algorithm, TEE_MODE_DIGEST, 0, at);
+TEE_Result message_t::start_hash() {
+  return hash.allocate(find_digest(digest)->algorithm, TEE_MODE_DIGEST, 0);
 }
 
-TEE_Result message_t::finish_hash(trace_site at) {
-  return hash.digest_final({}, buffer.span(), &length, at);
+TEE_Result message_t::finish_hash() {
+  return hash.digest_final({}, buffer.span(), &length);
 }
 
 void message_t::append(byte_view input) {
@@ -35,13 +35,13 @@ void message_t::append(byte_view input) {
 }
 
 TEE_Result sign_digest(const tee_operation& main, std::span<const TEE_Attribute> params,
-                       byte_view digest, heap_buffer* signature, trace_site at) {
+                       byte_view digest, heap_buffer* signature) {
   auto size = static_cast<tee_size>(signature->size());
   const TEE_Result res = TEE_AsymmetricSignDigest(
       main.get(), params.data(), static_cast<uint32_t>(params.size()), digest.data(),
       static_cast<tee_size>(digest.size()), signature->data(), &size);
   if (res != TEE_SUCCESS) {
-    trace_error(at, "AsymmetricSignDigest failed with 0x%08x\n", res);
+    trace_error("AsymmetricSignDigest failed with 0x%08x\n", res);
     return res;
   }
   signature->truncate(size);
@@ -49,8 +49,7 @@ TEE_Result sign_digest(const tee_operation& main, std::span<const TEE_Attribute>
 }
 
 TEE_Result verify_digest(const tee_operation& main, std::span<const TEE_Attribute> params,
-                         byte_view digest, byte_view signature, keymaster_error_t* km_error,
-                         trace_site at) {
+                         byte_view digest, byte_view signature, keymaster_error_t* km_error) {
   const TEE_Result res =
       TEE_AsymmetricVerifyDigest(main.get(), params.data(), static_cast<uint32_t>(params.size()),
                                  digest.data(), static_cast<tee_size>(digest.size()),
@@ -60,7 +59,7 @@ TEE_Result verify_digest(const tee_operation& main, std::span<const TEE_Attribut
     return TEE_SUCCESS;
   }
   if (res != TEE_SUCCESS) {
-    trace_error(at, "TEE_AsymmetricVerifyDigest return 0x%08x", res);
+    trace_error("TEE_AsymmetricVerifyDigest return 0x%08x", res);
   }
   return res;
 }

@@ -29,9 +29,9 @@ struct message_t {
   size_t room() const { return buffer.size() - length; }
 
   // start_hash: makes `hash` for `digest`, which find_digest must know.
-  [[nodiscard]] TEE_Result start_hash(trace_site at);
+  [[nodiscard]] TEE_Result start_hash();
   // finish_hash: puts the digest into the buffer. TEE_ERROR_SHORT_BUFFER: the buffer is shorter.
-  [[nodiscard]] TEE_Result finish_hash(trace_site at);
+  [[nodiscard]] TEE_Result finish_hash();
   // append: keeps `input`, which must fit the room.
   void append(byte_view input);
 };
@@ -39,12 +39,11 @@ struct message_t {
 // sign_digest: signs `digest` into `signature`, which has room for it and is cut to what was made.
 [[nodiscard]] TEE_Result sign_digest(const tee_operation& main,
                                      std::span<const TEE_Attribute> params, byte_view digest,
-                                     heap_buffer* signature, trace_site at);
+                                     heap_buffer* signature);
 
 // verify_digest: KM_ERROR_VERIFICATION_FAILED for every signature that is not a good one.
 [[nodiscard]] TEE_Result verify_digest(const tee_operation& main,
                                        std::span<const TEE_Attribute> params, byte_view digest,
-                                       byte_view signature, keymaster_error_t* km_error,
-                                       trace_site at);
+                                       byte_view signature, keymaster_error_t* km_error);
 
 }  // namespace keymaster

@@ -9,13 +9,13 @@ namespace keymaster {
 namespace {
 
 keymaster_error_t add_own_tag(keymaster_key_param_set_t* description, keymaster_tag_t tag,
-                              const char* name, uint64_t value, trace_site at) {
+                              const char* name, uint64_t value) {
   if (contains_tag(*description, tag)) {
-    trace_error(at, "Shouldn't specify %s", name);
+    trace_error("Shouldn't specify %s", name);
     return KM_ERROR_INVALID_ARGUMENT;
   }
   if (!add_long(description, tag, value)) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;
@@ -24,7 +24,7 @@ keymaster_error_t add_own_tag(keymaster_key_param_set_t* description, keymaster_
 }  // namespace
 
 keymaster_error_t add_provenance(keymaster_key_param_set_t* description, uint32_t origin,
-                                 creation_time created, trace_site at) {
+                                 creation_time created) {
   TEE_Time now{};
   TEE_GetREETime(&now);
   const struct {
@@ -39,7 +39,7 @@ keymaster_error_t add_provenance(keymaster_key_param_set_t* description, uint32_
   };
   for (const auto& [tag, name, value] : tags) {
     if (tag == KM_TAG_CREATION_DATETIME && created == creation_time::NOT_ADDED) continue;
-    if (auto error = add_own_tag(description, tag, name, value, at)) return error;
+    if (auto error = add_own_tag(description, tag, name, value)) return error;
   }
   return KM_ERROR_OK;
 }

@@ -14,7 +14,6 @@ enum class creation_time : uint8_t { ADDED, NOT_ADDED };
 // the set cannot grow. Messages go out under `at`.
 [[nodiscard]] keymaster_error_t add_provenance(keymaster_key_param_set_t* description,
                                                uint32_t origin,
-                                               creation_time created = creation_time::ADDED,
-                                               trace_site at = trace_site::here());
+                                               creation_time created = creation_time::ADDED);
 
 }  // namespace keymaster

@@ -36,15 +36,15 @@ byte_view text_bytes(const char (&text)[SIZE]) {
 
 // The algorithm that the key names, if its keys can be attested.
 keymaster_error_t choose_algorithm(const keymaster_key_param_set_t& key_params,
-                                   const algorithm_t** algorithm, trace_site at) {
+                                   const algorithm_t** algorithm) {
   const auto* tag = get_unique(key_params, KM_TAG_ALGORITHM);
   if (tag == nullptr) {
-    trace_error(at, "No KM_TAG_ALGORITHM");
+    trace_error("No KM_TAG_ALGORITHM");
     return KM_ERROR_UNKNOWN_ERROR;
   }
   *algorithm = find_algorithm(tag->enumerated);
   if (*algorithm != nullptr && (*algorithm)->set_key_info != nullptr) return KM_ERROR_OK;
-  trace_error(at, "Algorithm %d not implemented or attestation not supported",
+  trace_error("Algorithm %d not implemented or attestation not supported",
               static_cast<int>(tag->enumerated));
   return KM_ERROR_UNSUPPORTED_ALGORITHM;
 }
@@ -81,26 +81,26 @@ int32_t fill_key_usage(const keymaster_key_param_set_t& key_params, ASN1_BIT_STR
 }
 
 keymaster_error_t add_key_usage(const keymaster_key_param_set_t& key_params,
-                                X509_EXTENSIONS* extensions, trace_site at) {
+                                X509_EXTENSIONS* extensions) {
   ASN1_BIT_STRING usage{};
   uint8_t encoding[KEY_USAGE_BUFFER_SIZE];
   const int32_t filled = fill_key_usage(key_params, &usage);
   const int32_t length = asn1_encode(ASN1_BIT_STRING_TYPE, &usage, encoding);
   ASN1_BIT_STRING_TYPE.free(&usage);
   if (filled != 0) {
-    trace_error(at, "ASN1_BIT_STRING_set_bit return %d", filled);
+    trace_error("ASN1_BIT_STRING_set_bit return %d", filled);
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   if (length < 0) {
-    trace_error(at, "ASN1_BIT_STRING_write return %d", length);
+    trace_error("ASN1_BIT_STRING_write return %d", length);
     return KM_ERROR_UNKNOWN_ERROR;
   }
-  X509_EXTENSION* extension = X509_EXTENSIONS_alloc_item(extensions, at);
+  X509_EXTENSION* extension = X509_EXTENSIONS_alloc_item(extensions);
   if (extension == nullptr) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   extension->id = &OID_KEY_USAGE;
   const byte_view value = byte_view(encoding).first(static_cast<size_t>(length));
   if (int32_t code = ASN1_OCTET_STRING_set(&extension->value, value)) {
-    trace_error(at, "ASN1_OCTET_STRING_set return %d", code);
+    trace_error("ASN1_OCTET_STRING_set return %d", code);
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;
@@ -108,8 +108,8 @@ keymaster_error_t add_key_usage(const keymaster_key_param_set_t& key_params,
 
 keymaster_error_t add_key_description(const keymaster_key_param_set_t& key_params,
                                       const keymaster_key_param_set_t& attest_params,
-                                      X509_EXTENSIONS* extensions, trace_site at) {
-  X509_EXTENSION* extension = X509_EXTENSIONS_alloc_item(extensions, at);
+                                      X509_EXTENSIONS* extensions) {
+  X509_EXTENSION* extension = X509_EXTENSIONS_alloc_item(extensions);
   if (extension == nullptr) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   // The whole set counts as enforced by the hardware.
   const keymaster_key_param_set_t software;
@@ -118,8 +118,8 @@ keymaster_error_t add_key_description(const keymaster_key_param_set_t& key_param
 
 // Everything of the certificate but the key itself and its signature.
 keymaster_error_t fill_certificate(const keymaster_key_param_set_t& key_params,
-                                   const keymaster_key_param_set_t& attest_params, X509_CINF* cinf,
-                                   trace_site at) {
+                                   const keymaster_key_param_set_t& attest_params,
+                                   X509_CINF* cinf) {
   cinf->version = VERSION_3;
   cinf->has_version = 1;
   cinf->serial = SERIAL;
@@ -129,8 +129,8 @@ keymaster_error_t fill_certificate(const keymaster_key_param_set_t& key_params,
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   set_validity(key_params, &cinf->validity);
-  if (auto error = add_key_usage(key_params, &cinf->extensions, at)) return error;
-  if (auto error = add_key_description(key_params, attest_params, &cinf->extensions, at)) {
+  if (auto error = add_key_usage(key_params, &cinf->extensions)) return error;
+  if (auto error = add_key_description(key_params, attest_params, &cinf->extensions)) {
     return error;
   }
   cinf->has_extensions = 1;
@@ -153,12 +153,11 @@ keymaster_error_t sign_certificate(const keymaster_key_param_set_t& attest_param
   return KM_ERROR_OK;
 }
 
-TEE_Result write_chain(byte_view certificate, byte_span output, size_t* produced, uint32_t* count,
-                       trace_site at) {
+TEE_Result write_chain(byte_view certificate, byte_span output, size_t* produced, uint32_t* count) {
   output_cursor out(output);
   for (const byte_view link : {certificate, byte_view(ATTESTATION_KEY.certificate)}) {
     if (!out.write_field(link)) {
-      trace_error(at, "Too short buffer");
+      trace_error("Too short buffer");
       return TEE_ERROR_GENERIC;
     }
     (*count)++;
@@ -172,10 +171,10 @@ TEE_Result write_chain(byte_view certificate, byte_span output, size_t* produced
 TEE_Result internal_attest_key(byte_view key_material, const keymaster_key_param_set_t& key_params,
                                const keymaster_key_param_set_t& attest_params, byte_span output,
                                size_t* produced, uint32_t* count, keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   *count = 0;
   const algorithm_t* algorithm = nullptr;
-  *km_error = choose_algorithm(key_params, &algorithm, at);
+  *km_error = choose_algorithm(key_params, &algorithm);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   if (output.size() < sizeof(uint32_t)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short buffer");
 
@@ -189,7 +188,7 @@ TEE_Result internal_attest_key(byte_view key_material, const keymaster_key_param
     if (*km_error == KM_ERROR_OK) *km_error = KM_ERROR_UNKNOWN_ERROR;
     return res;
   }
-  *km_error = fill_certificate(key_params, attest_params, cinf.get(), at);
+  *km_error = fill_certificate(key_params, attest_params, cinf.get());
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   heap_buffer certificate;
   if (!certificate.allocate(std::min(output.size() - sizeof(uint32_t), MAX_CERTIFICATE_SIZE))) {
@@ -198,7 +197,7 @@ TEE_Result internal_attest_key(byte_view key_material, const keymaster_key_param
   }
   *km_error = sign_certificate(attest_params, cinf.get(), &certificate);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
-  return write_chain(certificate.view(), output, produced, count, at);
+  return write_chain(certificate.view(), output, produced, count);
 }
 
 }  // namespace keymaster

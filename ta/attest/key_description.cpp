@@ -144,6 +144,7 @@ const asn1_field* field_of(keymaster_tag_t tag) {
 
 // Puts one parameter where it belongs. False when out of memory.
 bool fill(const asn1_field& field, const keymaster_key_param_t& param, AuthorizationList* list) {
+  const trace_scope scope;
   auto* base = reinterpret_cast<uint8_t*>(list);
   void* value = base + field.offset;
   switch (tag_class(param.tag)) {
@@ -174,11 +175,11 @@ bool fill(const asn1_field& field, const keymaster_key_param_t& param, Authoriza
 
 // What a request for a unique identifier comes to; KM_ERROR_OK when there is none.
 keymaster_error_t settle_unique_id(const keymaster_key_param_set_t& hardware,
-                                   ASN1_OCTET_STRING* unique_id, trace_site at) {
+                                   ASN1_OCTET_STRING* unique_id) {
   if (!contains_tag(hardware, KM_TAG_INCLUDE_UNIQUE_ID)) return KM_ERROR_OK;
   const auto* created = get_unique(hardware, KM_TAG_CREATION_DATETIME);
   if (created == nullptr) {
-    trace_error(at, "Unique ID cannot be generated without creation datetime");
+    trace_error("Unique ID cannot be generated without creation datetime");
     return KM_ERROR_INVALID_KEY_BLOB;
   }
   return generate_unique_id(unique_id, created->date_time,
@@ -212,13 +213,13 @@ keymaster_error_t set_root_of_trust(AuthorizationList* list) {
 keymaster_error_t fill_description(const keymaster_key_param_set_t& hardware,
                                    const keymaster_key_param_set_t& software,
                                    const keymaster_key_param_set_t& attest_params,
-                                   KeyDescription* description, trace_site at) {
+                                   KeyDescription* description) {
   keymaster_error_t error = KM_ERROR_OK;
   if (fill_auth_list_by_param_set(hardware, &description->tee_enforced, &error) != 0 ||
       fill_auth_list_by_param_set(software, &description->software_enforced, &error) != 0) {
     return error;
   }
-  error = settle_unique_id(hardware, &description->unique_id, at);
+  error = settle_unique_id(hardware, &description->unique_id);
   if (error != KM_ERROR_OK) return error;
   error = set_challenge(attest_params, &description->attestation_challenge);
   if (error != KM_ERROR_OK) return error;
@@ -232,13 +233,14 @@ KM_DEFINE_ASN1_RECORD(RootOfTrust, asn1_sequence<RootOfTrust_FIELDS>)
 KM_DEFINE_ASN1_RECORD(AuthorizationList, asn1_sequence<AuthorizationList_FIELDS>)
 KM_DEFINE_ASN1_RECORD(KeyDescription, asn1_sequence<KeyDescription_FIELDS>)
 
-uint64_t* SET_OF_INTEGER_alloc_item(SET_OF_INTEGER* set, trace_site at) {
-  auto* item = static_cast<integer_item*>(asn1_list_add(INTEGER_SET, &set->items, at));
+uint64_t* SET_OF_INTEGER_alloc_item(SET_OF_INTEGER* set) {
+  auto* item = static_cast<integer_item*>(asn1_list_add(INTEGER_SET, &set->items));
   return item == nullptr ? nullptr : &item->value;
 }
 
 int32_t fill_auth_list_by_param_set(const keymaster_key_param_set_t& set, AuthorizationList* list,
                                     keymaster_error_t* km_error) {
+  const trace_scope scope;
   for (const keymaster_key_param_t& param : set) {
     if (passed_over(param.tag)) continue;
     const asn1_field* field = field_of(param.tag);
@@ -262,15 +264,15 @@ keymaster_error_t character_to_extension(const keymaster_key_param_set_t& hardwa
                                          const keymaster_key_param_set_t& software,
                                          const keymaster_key_param_set_t& attest_params,
                                          X509_EXTENSION* extension) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   const asn1_owner<KeyDescription, KeyDescription_free> description(KeyDescription_alloc());
   if (!description) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  if (auto error = fill_description(hardware, software, attest_params, description.get(), at)) {
+  if (auto error = fill_description(hardware, software, attest_params, description.get())) {
     return error;
   }
   heap_buffer encoding;
   const int32_t length =
-      asn1_encode_growing(KeyDescription_TYPE, description.get(), FIRST_BUFFER_SIZE, &encoding, at);
+      asn1_encode_growing(KeyDescription_TYPE, description.get(), FIRST_BUFFER_SIZE, &encoding);
   if (length == DER_NO_MEMORY) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   if (length < 0) return KM_ERROR_UNKNOWN_ERROR;
   extension->id = &OID_KEY_DESCRIPTION;

@@ -67,8 +67,7 @@ KM_DECLARE_ASN1_RECORD(AuthorizationList)
 KM_DECLARE_ASN1_RECORD(KeyDescription)
 
 // A new element, linked in; null when out of memory.
-[[nodiscard]] uint64_t* SET_OF_INTEGER_alloc_item(SET_OF_INTEGER* set,
-                                                  trace_site at = trace_site::here());
+[[nodiscard]] uint64_t* SET_OF_INTEGER_alloc_item(SET_OF_INTEGER* set);
 
 // fill_auth_list_by_param_set: walks the set in order and fills the list. A scalar tag that occurs
 // again keeps its last value. Tags without a field are passed over; unknown ones are traced. 0, or

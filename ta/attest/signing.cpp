@@ -39,36 +39,35 @@ int32_t as_writer_code(TEE_Result res) {
 }
 
 // Asks for the digest's size, which absorbs nothing, then digests.
-int32_t digest_encoding(uint32_t algorithm, byte_view encoding, heap_buffer* digest,
-                        trace_site at) {
+int32_t digest_encoding(uint32_t algorithm, byte_view encoding, heap_buffer* digest) {
   tee_operation operation;
-  if (TEE_Result res = operation.allocate(algorithm, TEE_MODE_DIGEST, 0, at)) {
+  if (TEE_Result res = operation.allocate(algorithm, TEE_MODE_DIGEST, 0)) {
     return as_writer_code(res);
   }
   tee_size size = 0;
   const TEE_Result asked = TEE_DigestDoFinal(
       operation.get(), encoding.data(), static_cast<tee_size>(encoding.size()), nullptr, &size);
   if (asked != TEE_ERROR_SHORT_BUFFER) {
-    trace_error(at, "DigestDoFinal failed with 0x%08x\n", asked);
+    trace_error("DigestDoFinal failed with 0x%08x\n", asked);
     return as_writer_code(asked == TEE_SUCCESS ? TEE_ERROR_GENERIC : asked);
   }
   if (!digest->allocate(size)) return DER_NO_MEMORY;
   size_t length = 0;
-  return as_writer_code(operation.digest_final(encoding, digest->span(), &length, at));
+  return as_writer_code(operation.digest_final(encoding, digest->span(), &length));
 }
 
 int32_t sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
-                    heap_buffer* signature, trace_site at) {
+                    heap_buffer* signature) {
   TEE_ObjectInfo info{};
   if (TEE_Result res = TEE_GetObjectInfo1(key.get(), &info)) {
-    trace_error(at, "GetObjectInfo1 failed with 0x%08x\n", res);
+    trace_error("GetObjectInfo1 failed with 0x%08x\n", res);
     return as_writer_code(res);
   }
   tee_operation operation;
-  if (TEE_Result res = operation.allocate(algorithm, TEE_MODE_SIGN, info.objectSize, at)) {
+  if (TEE_Result res = operation.allocate(algorithm, TEE_MODE_SIGN, info.objectSize)) {
     return as_writer_code(res);
   }
-  if (TEE_Result res = operation.set_key(key.get(), at)) return as_writer_code(res);
+  if (TEE_Result res = operation.set_key(key.get())) return as_writer_code(res);
   const auto sign = [&](uint8_t* buffer, tee_size* size) {
     return TEE_AsymmetricSignDigest(operation.get(), nullptr, 0, digest.data(),
                                     static_cast<tee_size>(digest.size()), buffer, size);
@@ -80,7 +79,7 @@ int32_t sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
     res = sign(signature->data(), &size);
   }
   if (res != TEE_SUCCESS) {
-    trace_error(at, "AsymmetricSignDigest failed with 0x%08x\n", res);
+    trace_error("AsymmetricSignDigest failed with 0x%08x\n", res);
     return as_writer_code(res);
   }
   signature->truncate(size);
@@ -90,6 +89,7 @@ int32_t sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
 }  // namespace
 
 TEE_Result get_attest_key(uint32_t, tee_object* key, keymaster_error_t* km_error) {
+  const trace_scope scope;
   const TEE_Attribute attributes[] = {
       ref_attribute(TEE_ATTR_RSA_MODULUS, ATTESTATION_KEY.modulus),
       ref_attribute(TEE_ATTR_RSA_PUBLIC_EXPONENT, ATTESTATION_KEY.public_exponent),
@@ -107,18 +107,17 @@ TEE_Result get_attest_key(uint32_t, tee_object* key, keymaster_error_t* km_error
 }
 
 int32_t X509_CINF_sign(const X509_CINF* cinf, const tee_object& key, byte_span output) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   const signature_algorithm* algorithm = find_signature_algorithm(cinf->signature.algorithm);
   if (algorithm == nullptr) return as_writer_code(TEE_ERROR_NOT_SUPPORTED);
   heap_buffer encoding;
-  const int32_t encoded =
-      asn1_encode_growing(X509_CINF_TYPE, cinf, FIRST_BUFFER_SIZE, &encoding, at);
+  const int32_t encoded = asn1_encode_growing(X509_CINF_TYPE, cinf, FIRST_BUFFER_SIZE, &encoding);
   if (encoded < 0) return encoded;
 
   heap_buffer digest;
   heap_buffer signature;
-  if (int32_t code = digest_encoding(algorithm->digest, encoding.view(), &digest, at)) return code;
-  if (int32_t code = sign_digest(algorithm->signature, key, digest.view(), &signature, at)) {
+  if (int32_t code = digest_encoding(algorithm->digest, encoding.view(), &digest)) return code;
+  if (int32_t code = sign_digest(algorithm->signature, key, digest.view(), &signature)) {
     return code;
   }
   const asn1_owner<X509_CERT, X509_CERT_free> certificate(X509_CERT_alloc());

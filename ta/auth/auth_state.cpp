@@ -9,6 +9,7 @@
 namespace keymaster {
 
 TEE_Result authorizaiton_init() {
+  const trace_scope scope;
   if (TEE_Result res = auth_tokens_init()) return res;
   if (!use_log_init()) {
     auth_tokens_destroy();

@@ -54,15 +54,15 @@ keymaster_error_t read_user_auth(const keymaster_key_param_set_t& request, uint6
 
 // One KM_TAG_USER_SECURE_ID of the key. No match is no refusal: another identifier may match.
 keymaster_error_t check_secure_id(uint64_t secure_id, const keymaster_key_param_set_t& key_params,
-                                  user_auth_t* user, trace_site at) {
+                                  user_auth_t* user) {
   if (get_unique(key_params, KM_TAG_NO_AUTH_REQUIRED) != nullptr) {
-    return KM_REFUSE_AT(at, KM_ERROR_INVALID_ARGUMENT,
-                        "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED");
+    return KM_REFUSE(KM_ERROR_INVALID_ARGUMENT,
+                     "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED");
   }
   const keymaster_key_param_t* auth_type = get_unique(key_params, KM_TAG_USER_AUTH_TYPE);
   if (auth_type == nullptr) {
-    return KM_REFUSE_AT(at, KM_ERROR_INVALID_ARGUMENT,
-                        "Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE");
+    return KM_REFUSE(KM_ERROR_INVALID_ARGUMENT,
+                     "Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE");
   }
   user->is_demanded = true;
   user->is_given = user->is_given ||
@@ -72,16 +72,17 @@ keymaster_error_t check_secure_id(uint64_t secure_id, const keymaster_key_param_
 }
 
 // Asks the operation which padding, block mode and digest it will use.
-keymaster_error_t ask_operation(begin_check_t* check, trace_site at) {
+keymaster_error_t ask_operation(begin_check_t* check) {
+  const trace_scope begin("begin");
   const algorithm_t* algorithm = find_algorithm(check->algorithm);
   if (algorithm == nullptr) {
-    trace_error(at, "Algorithm %d not implemented", static_cast<int>(check->algorithm));
+    trace_error("Algorithm %d not implemented", static_cast<int>(check->algorithm));
     return KM_ERROR_UNSUPPORTED_ALGORITHM;
   }
   const operation_methods_t* methods = algorithm->get_operation_methods(check->purpose);
   if (methods == nullptr || methods->get_padding == nullptr || methods->get_block_mode == nullptr ||
       methods->get_digest == nullptr) {
-    trace_error(at, "Algorithm %s purpose %d not implemented", algorithm->name,
+    trace_error("Algorithm %s purpose %d not implemented", algorithm->name,
                 static_cast<int>(check->purpose));
     return KM_ERROR_UNSUPPORTED_PURPOSE;
   }
@@ -92,25 +93,24 @@ keymaster_error_t ask_operation(begin_check_t* check, trace_site at) {
 }
 
 // A request that names no MAC length passes: the algorithm decides what that means.
-keymaster_error_t check_mac_length(const begin_check_t& check, uint32_t minimum_bits,
-                                   trace_site at) {
+keymaster_error_t check_mac_length(const begin_check_t& check, uint32_t minimum_bits) {
   const bool makes_mac =
       check.algorithm == KM_ALGORITHM_HMAC ||
       (check.algorithm == KM_ALGORITHM_AES && check.block_mode.value == KM_MODE_GCM);
   const keymaster_key_param_t* bits = get_unique(check.request, KM_TAG_MAC_LENGTH);
   if (!makes_mac || bits == nullptr || minimum_bits <= bits->integer) return KM_ERROR_OK;
-  return KM_REFUSE_AT(at, KM_ERROR_INVALID_MAC_LENGTH, "MAC length %d below the key's minimum %d",
-                      static_cast<int>(bits->integer), static_cast<int>(minimum_bits));
+  return KM_REFUSE(KM_ERROR_INVALID_MAC_LENGTH, "MAC length %d below the key's minimum %d",
+                   static_cast<int>(bits->integer), static_cast<int>(minimum_bits));
 }
 
-keymaster_error_t check_active(uint64_t active_ms, trace_site at) {
+keymaster_error_t check_active(uint64_t active_ms) {
   if (current_time_ms() >= active_ms) return KM_ERROR_OK;
-  return KM_REFUSE_AT(at, KM_ERROR_KEY_NOT_YET_VALID, "Key not yet valid");
+  return KM_REFUSE(KM_ERROR_KEY_NOT_YET_VALID, "Key not yet valid");
 }
 
-keymaster_error_t check_expiry(uint64_t expire_ms, trace_site at) {
+keymaster_error_t check_expiry(uint64_t expire_ms) {
   if (current_time_ms() <= expire_ms) return KM_ERROR_OK;
-  return KM_REFUSE_AT(at, KM_ERROR_KEY_EXPIRED, "Key expired");
+  return KM_REFUSE(KM_ERROR_KEY_EXPIRED, "Key expired");
 }
 
 // Whether the purpose makes something new (which the origination date ends) rather than opening
@@ -121,19 +121,17 @@ bool is_origination(uint32_t purpose) {
 
 // System seconds on both sides: the log holds system times, and the TA's clock has another origin.
 // A distance of exactly `min_seconds` still refuses.
-keymaster_error_t check_rate_limit(const key_identity_t& identity, uint32_t min_seconds,
-                                   trace_site at) {
+keymaster_error_t check_rate_limit(const key_identity_t& identity, uint32_t min_seconds) {
   TEE_Time last{};
   if (!get_last_use_time(identity, &last)) return KM_ERROR_OK;
   TEE_Time now{};
   TEE_GetSystemTime(&now);
   if (now.seconds - last.seconds > min_seconds) return KM_ERROR_OK;
-  return KM_REFUSE_AT(at, KM_ERROR_KEY_RATE_LIMIT_EXCEEDED, "key rate limit exceeded");
+  return KM_REFUSE(KM_ERROR_KEY_RATE_LIMIT_EXCEEDED, "key rate limit exceeded");
 }
 
 // One parameter of the key, as the walk comes to it.
-keymaster_error_t check_param(const keymaster_key_param_t& param, begin_check_t* check,
-                              trace_site at) {
+keymaster_error_t check_param(const keymaster_key_param_t& param, begin_check_t* check) {
   switch (param.tag) {
     case KM_TAG_PURPOSE:
       check->is_purpose_allowed |= param.enumerated == check->purpose;
@@ -148,30 +146,30 @@ keymaster_error_t check_param(const keymaster_key_param_t& param, begin_check_t*
       check->digest.is_allowed |= param.enumerated == check->digest.value;
       return KM_ERROR_OK;
     case KM_TAG_MIN_MAC_LENGTH:
-      return check_mac_length(*check, param.integer, at);
+      return check_mac_length(*check, param.integer);
     case KM_TAG_ACTIVE_DATETIME:
-      return check_active(param.date_time, at);
+      return check_active(param.date_time);
     case KM_TAG_ORIGINATION_EXPIRE_DATETIME:
-      return is_origination(check->purpose) ? check_expiry(param.date_time, at) : KM_ERROR_OK;
+      return is_origination(check->purpose) ? check_expiry(param.date_time) : KM_ERROR_OK;
     case KM_TAG_USAGE_EXPIRE_DATETIME:
-      return is_origination(check->purpose) ? KM_ERROR_OK : check_expiry(param.date_time, at);
+      return is_origination(check->purpose) ? KM_ERROR_OK : check_expiry(param.date_time);
     case KM_TAG_MIN_SECONDS_BETWEEN_OPS:
-      return check_rate_limit(check->identity, param.integer, at);
+      return check_rate_limit(check->identity, param.integer);
     case KM_TAG_MAX_USES_PER_BOOT:
       // Counted here and now, though a later check may refuse: that is intended, so that no refusal
       // can be used to try a key for free.
       return check_use_count_and_add(check->identity, param.integer);
     case KM_TAG_USER_SECURE_ID:
-      return check_secure_id(param.long_integer, check->key_params, &check->user, at);
+      return check_secure_id(param.long_integer, check->key_params, &check->user);
     case KM_TAG_BOOTLOADER_ONLY:
-      return KM_REFUSE_AT(at, KM_ERROR_INVALID_KEY_BLOB, "Bootloader only key");
+      return KM_REFUSE(KM_ERROR_INVALID_KEY_BLOB, "Bootloader only key");
     default:
       return KM_ERROR_OK;
   }
 }
 
 // What the walk must have found.
-keymaster_error_t check_allowed(const begin_check_t& check, trace_site at) {
+keymaster_error_t check_allowed(const begin_check_t& check) {
   const struct {
     bool is_allowed;
     keymaster_error_t error;
@@ -183,41 +181,41 @@ keymaster_error_t check_allowed(const begin_check_t& check, trace_site at) {
       {check.digest.is_allowed, KM_ERROR_INCOMPATIBLE_DIGEST, "digest"},
   };
   for (const auto& [is_allowed, error, what] : demands) {
-    if (!is_allowed) return KM_REFUSE_AT(at, error, "No such %s in key_params", what);
+    if (!is_allowed) return KM_REFUSE(error, "No such %s in key_params", what);
   }
   return KM_ERROR_OK;
 }
 
 // Without a timeout the key is authenticated for each operation, whose handle a token can carry
 // only after this begin.
-keymaster_error_t check_begin_auth(const begin_check_t& check, trace_site at) {
+keymaster_error_t check_begin_auth(const begin_check_t& check) {
   if (!check.user.is_due()) return KM_ERROR_OK;
   if (get_unique(check.key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) {
-    return KM_REFUSE_AT(at, KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
+    return KM_REFUSE(KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
   }
-  trace(TEE_TRACE_INFO, at, "OP AUTH NEEDED");
+  trace(TEE_TRACE_INFO, "OP AUTH NEEDED");
   return KM_AUTHENTICATION_DUE;
 }
 
-keymaster_error_t check_caller_nonce(const begin_check_t& check, trace_site at) {
+keymaster_error_t check_caller_nonce(const begin_check_t& check) {
   if (check.purpose != KM_PURPOSE_ENCRYPT || get_unique(check.request, KM_TAG_NONCE) == nullptr ||
       get_unique(check.key_params, KM_TAG_CALLER_NONCE) != nullptr) {
     return KM_ERROR_OK;
   }
-  return KM_REFUSE_AT(at, KM_ERROR_CALLER_NONCE_PROHIBITED, "Caller nonce prohibited");
+  return KM_REFUSE(KM_ERROR_CALLER_NONCE_PROHIBITED, "Caller nonce prohibited");
 }
 
-keymaster_error_t check_begin(begin_check_t* check, trace_site begin, trace_site at) {
+keymaster_error_t check_begin(begin_check_t* check) {
   constexpr uint64_t ANY_CHALLENGE = 0;
   if (auto error = read_user_auth(check->request, ANY_CHALLENGE, &check->user)) return error;
-  if (auto error = ask_operation(check, begin)) return error;
+  if (auto error = ask_operation(check)) return error;
   for (const keymaster_key_param_t& param : check->key_params) {
-    if (auto error = check_param(param, check, at)) return error;
+    if (auto error = check_param(param, check)) return error;
   }
-  if (auto error = check_allowed(*check, at)) return error;
-  const keymaster_error_t outcome = check_begin_auth(*check, at);
+  if (auto error = check_allowed(*check)) return error;
+  const keymaster_error_t outcome = check_begin_auth(*check);
   if (outcome != KM_ERROR_OK && outcome != KM_AUTHENTICATION_DUE) return outcome;
-  if (auto error = check_caller_nonce(*check, at)) return error;
+  if (auto error = check_caller_nonce(*check)) return error;
   // A full log does not refuse: the limit then goes unenforced until a record is free.
   const auto* min_seconds = get_unique(check->key_params, KM_TAG_MIN_SECONDS_BETWEEN_OPS);
   if (min_seconds != nullptr) record_key_use(check->identity, min_seconds->integer);
@@ -226,16 +224,16 @@ keymaster_error_t check_begin(begin_check_t* check, trace_site begin, trace_site
 
 keymaster_error_t check_operation_auth(const keymaster_key_param_set_t& request,
                                        const keymaster_key_param_set_t& key_params,
-                                       uint64_t challenge, trace_site at) {
+                                       uint64_t challenge) {
   if (get_unique(key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) return KM_ERROR_OK;
   user_auth_t user{};
   if (auto error = read_user_auth(request, challenge, &user)) return error;
   for (const keymaster_key_param_t& param : key_params) {
     if (param.tag != KM_TAG_USER_SECURE_ID) continue;
-    if (auto error = check_secure_id(param.long_integer, key_params, &user, at)) return error;
+    if (auto error = check_secure_id(param.long_integer, key_params, &user)) return error;
   }
   if (!user.is_due()) return KM_ERROR_OK;
-  return KM_REFUSE_AT(at, KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
+  return KM_REFUSE(KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
 }
 
 // What anyone can do with the public half is never restricted.
@@ -248,6 +246,7 @@ bool is_public_key_use(uint32_t algorithm, uint32_t purpose) {
 
 bool check_app_id_and_app_data(const keymaster_key_param_set_t& key_params, byte_view app_id,
                                byte_view app_data) {
+  const trace_scope scope;
   const struct {
     keymaster_tag_t tag;
     const char* name;
@@ -273,8 +272,9 @@ bool check_app_id_and_app_data(const keymaster_key_param_set_t& key_params, byte
 
 TEE_Result authorize_begin(byte_view key_blob, uint32_t purpose,
                            const keymaster_key_param_set_t& begin_params,
-                           const keymaster_key_param_set_t& key_params, keymaster_error_t* km_error,
-                           trace_site at) {
+                           const keymaster_key_param_set_t& key_params,
+                           keymaster_error_t* km_error) {
+  const trace_scope scope;
   const keymaster_key_param_t* algorithm = get_unique(key_params, KM_TAG_ALGORITHM);
   if (algorithm == nullptr) {
     return KM_FAIL(km_error, KM_ERROR_INVALID_KEY_BLOB,
@@ -287,14 +287,15 @@ TEE_Result authorize_begin(byte_view key_blob, uint32_t purpose,
                       .algorithm = algorithm->enumerated,
                       .purpose = purpose};
   if (TEE_Result res = identify_key(key_blob, &check.identity)) return res;
-  *km_error = check_begin(&check, at, trace_site::here());
+  *km_error = check_begin(&check);
   return TEE_SUCCESS;
 }
 
 TEE_Result authorize_update_or_finish(const keymaster_key_param_set_t& request_params,
                                       const keymaster_key_param_set_t& key_params,
                                       uint64_t challenge, keymaster_error_t* km_error) {
-  *km_error = check_operation_auth(request_params, key_params, challenge, trace_site::here());
+  const trace_scope scope;
+  *km_error = check_operation_auth(request_params, key_params, challenge);
   return TEE_SUCCESS;
 }
 

@@ -25,8 +25,7 @@ namespace keymaster {
 [[nodiscard]] TEE_Result authorize_begin(byte_view key_blob, uint32_t purpose,
                                          const keymaster_key_param_set_t& begin_params,
                                          const keymaster_key_param_set_t& key_params,
-                                         keymaster_error_t* km_error,
-                                         trace_site at = trace_site::here());
+                                         keymaster_error_t* km_error);
 
 // authorize_update_or_finish: the user authentication that a key without KM_TAG_AUTH_TIMEOUT asks
 // for at each update and finish: a token for this very operation. `challenge` is the operation's

@@ -55,6 +55,7 @@ TEE_Result operation_pool_init() {
 
 TEE_Result operation_pool_add(operation_t* operation, uint32_t* handle,
                               keymaster_error_t* km_error) {
+  const trace_scope scope;
   *handle = 0;
   pool_slot_t* slot = find_free_slot();
   if (slot == nullptr) {
@@ -67,6 +68,7 @@ TEE_Result operation_pool_add(operation_t* operation, uint32_t* handle,
 }
 
 void operation_pool_remove(uint32_t handle) {
+  const trace_scope scope;
   pool_slot_t* slot = find_live_slot(handle);
   if (slot == nullptr) {
     TRACE_ERROR("Try to free invalid operation handle");
@@ -77,6 +79,7 @@ void operation_pool_remove(uint32_t handle) {
 }
 
 operation_t* operation_pool_get(uint32_t handle) {
+  const trace_scope scope;
   const pool_slot_t* slot = find_live_slot(handle);
   if (slot == nullptr) {
     TRACE_ERROR("Operation handle not found");

@@ -42,15 +42,15 @@ bool shares_type(const auth_token_t& token, uint32_t auth_type) {
   return (__builtin_bswap32(token.authenticator_type) & auth_type) != 0;
 }
 
-TEE_Result make_token_key(tee_object* key, trace_site at) {
-  if (TEE_Result res = key->allocate(TEE_TYPE_HMAC_SHA256, TOKEN_KEY_BITS, at)) return res;
+TEE_Result make_token_key(tee_object* key) {
+  if (TEE_Result res = key->allocate(TEE_TYPE_HMAC_SHA256, TOKEN_KEY_BITS)) return res;
   uint8_t seed[SEED_SIZE];
   TEE_Result res = GetBootSeed(seed, sizeof(seed));
   if (res == TEE_SUCCESS) {
     const TEE_Attribute secret[] = {ref_attribute(TEE_ATTR_SECRET_VALUE, seed)};
-    res = key->populate(secret, at);
+    res = key->populate(secret);
   } else {
-    trace_error(at, "GetBootSeed failed with 0x%08x\n", res);
+    trace_error("GetBootSeed failed with 0x%08x\n", res);
   }
   wipe(seed);
   return res;
@@ -75,14 +75,14 @@ bool is_cached(uint64_t secure_id, uint32_t timeout, uint32_t auth_type) {
 
 }  // namespace
 
-TEE_Result auth_tokens_init(trace_site at) {
+TEE_Result auth_tokens_init() {
   token_key = TEE_HANDLE_NULL;
   token_cache = nullptr;
   tee_object key;
-  if (TEE_Result res = make_token_key(&key, at)) return res;
+  if (TEE_Result res = make_token_key(&key)) return res;
   token_cache = static_cast<cache_entry_t*>(heap_take(CACHE_ENTRIES * sizeof(cache_entry_t)));
   if (token_cache == nullptr) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   for (cache_entry_t& entry : cache())
@@ -99,6 +99,7 @@ void auth_tokens_destroy() {
 }
 
 bool check_auth_token_valid(byte_view token) {
+  const trace_scope scope;
   if (token.size() != AUTH_TOKEN_SIZE) {
     TRACE_ERROR("Wrong auth token size, expected %dB, got %dB", static_cast<int>(AUTH_TOKEN_SIZE),
                 static_cast<int>(token.size()));
@@ -119,6 +120,7 @@ bool check_auth_token_valid(byte_view token) {
 
 bool ComputeSignature(std::span<uint8_t, AUTH_TOKEN_MAC_SIZE> out, TEE_ObjectHandle key,
                       byte_view data) {
+  const trace_scope scope;
   wipe(out);
   tee_operation hmac;
   if (hmac.allocate(TEE_ALG_HMAC_SHA256, TEE_MODE_MAC, TOKEN_KEY_BITS) != TEE_SUCCESS) return false;
@@ -137,6 +139,7 @@ bool ComputeSignature(std::span<uint8_t, AUTH_TOKEN_MAC_SIZE> out, TEE_ObjectHan
 
 bool check_auth(uint64_t secure_id, uint64_t challenge, byte_view token,
                 const keymaster_key_param_t* auth_timeout, uint32_t auth_type) {
+  const trace_scope scope;
   if (token.empty()) {
     return auth_timeout != nullptr && is_cached(secure_id, auth_timeout->integer, auth_type);
   }

@@ -62,6 +62,7 @@ use_record_t* take_record(const key_identity_t& key, uint32_t now_seconds) {
 }  // namespace
 
 TEE_Result identify_key(byte_view key_blob, key_identity_t* identity) {
+  const trace_scope scope;
   identity->key_blob = key_blob;
   if (key_blob.size() <= USE_LOG_KEY_SIZE) return TEE_SUCCESS;
   tee_operation sha256;
@@ -81,6 +82,7 @@ void use_log_destroy() {
 }
 
 keymaster_error_t check_use_count_and_add(const key_identity_t& key, uint32_t max_uses) {
+  const trace_scope scope;
   TEE_Time now{};
   TEE_GetSystemTime(&now);
   use_record_t* record = find_record(key);

@@ -7,8 +7,8 @@ namespace keymaster {
 namespace {
 
 // The common end of every call below: `name` is the platform call's, as it stands in the message.
-TEE_Result checked(TEE_Result res, const char* name, trace_site at) {
-  if (res != TEE_SUCCESS) trace_error(at, "%s failed with 0x%08x\n", name, res);
+TEE_Result checked(TEE_Result res, const char* name) {
+  if (res != TEE_SUCCESS) trace_error("%s failed with 0x%08x\n", name, res);
   return res;
 }
 
@@ -26,29 +26,26 @@ TEE_Attribute value_attribute(uint32_t id, uint32_t a, uint32_t b) {
   return attribute;
 }
 
-TEE_Result tee_object::allocate(uint32_t type, uint32_t max_bits, trace_site at) {
-  return checked(TEE_AllocateTransientObject(type, max_bits, receive()), "AllocateTransientObject",
-                 at);
+TEE_Result tee_object::allocate(uint32_t type, uint32_t max_bits) {
+  return checked(TEE_AllocateTransientObject(type, max_bits, receive()), "AllocateTransientObject");
 }
 
-TEE_Result tee_object::populate(std::span<const TEE_Attribute> attributes, trace_site at) {
+TEE_Result tee_object::populate(std::span<const TEE_Attribute> attributes) {
   return checked(TEE_PopulateTransientObject(handle_, attributes.data(),
                                              static_cast<uint32_t>(attributes.size())),
-                 "PopulateTransientObject", at);
+                 "PopulateTransientObject");
 }
 
-TEE_Result tee_object::generate(uint32_t bits, std::span<const TEE_Attribute> parameters,
-                                trace_site at) {
+TEE_Result tee_object::generate(uint32_t bits, std::span<const TEE_Attribute> parameters) {
   return checked(
       TEE_GenerateKey(handle_, bits, parameters.data(), static_cast<uint32_t>(parameters.size())),
-      "GenerateKey", at);
+      "GenerateKey");
 }
 
-TEE_Result tee_object::read_attribute(uint32_t id, byte_span buffer, size_t* length,
-                                      trace_site at) const {
+TEE_Result tee_object::read_attribute(uint32_t id, byte_span buffer, size_t* length) const {
   tee_size size = static_cast<tee_size>(buffer.size());
   const TEE_Result res = checked(TEE_GetObjectBufferAttribute(handle_, id, buffer.data(), &size),
-                                 "GetObjectBufferAttribute", at);
+                                 "GetObjectBufferAttribute");
   *length = res == TEE_SUCCESS ? size : 0;
   return res;
 }
@@ -58,52 +55,49 @@ void tee_object::reset(TEE_ObjectHandle handle) {
   handle_ = handle;
 }
 
-TEE_Result tee_operation::allocate(uint32_t algorithm, uint32_t mode, uint32_t max_key_bits,
-                                   trace_site at) {
+TEE_Result tee_operation::allocate(uint32_t algorithm, uint32_t mode, uint32_t max_key_bits) {
   reset();
   return checked(TEE_AllocateOperation(&handle_, algorithm, mode, max_key_bits),
-                 "AllocateOperation", at);
+                 "AllocateOperation");
 }
 
-TEE_Result tee_operation::set_key(TEE_ObjectHandle key, trace_site at) {
-  return checked(TEE_SetOperationKey(handle_, key), "SetOperationKey", at);
+TEE_Result tee_operation::set_key(TEE_ObjectHandle key) {
+  return checked(TEE_SetOperationKey(handle_, key), "SetOperationKey");
 }
 
-TEE_Result tee_operation::digest_final(byte_view last, byte_span digest, size_t* length,
-                                       trace_site at) {
+TEE_Result tee_operation::digest_final(byte_view last, byte_span digest, size_t* length) {
   tee_size size = static_cast<tee_size>(digest.size());
   const TEE_Result res =
       checked(TEE_DigestDoFinal(handle_, last.data(), static_cast<tee_size>(last.size()),
                                 digest.data(), &size),
-              "DigestDoFinal", at);
+              "DigestDoFinal");
   *length = res == TEE_SUCCESS ? size : 0;
   return res;
 }
 
-TEE_Result tee_operation::mac_final(byte_view last, byte_span mac, size_t* length, trace_site at) {
+TEE_Result tee_operation::mac_final(byte_view last, byte_span mac, size_t* length) {
   tee_size size = static_cast<tee_size>(mac.size());
   const TEE_Result res =
       checked(TEE_MACComputeFinal(handle_, last.data(), static_cast<tee_size>(last.size()),
                                   mac.data(), &size),
-              "MACComputeFinal", at);
+              "MACComputeFinal");
   *length = res == TEE_SUCCESS ? size : 0;
   return res;
 }
 
-TEE_Result tee_operation::ae_init(byte_view nonce, uint32_t tag_bits, trace_site at) {
+TEE_Result tee_operation::ae_init(byte_view nonce, uint32_t tag_bits) {
   // The lengths of associated data and payload matter to CCM alone.
   return checked(
       TEE_AEInit(handle_, nonce.data(), static_cast<tee_size>(nonce.size()), tag_bits, 0, 0),
-      "AEInit", at);
+      "AEInit");
 }
 
-TEE_Result tee_operation::ae_update(byte_view input, byte_span output, size_t* produced,
-                                    trace_site at) {
+TEE_Result tee_operation::ae_update(byte_view input, byte_span output, size_t* produced) {
   tee_size size = static_cast<tee_size>(output.size());
   const TEE_Result res =
       checked(TEE_AEUpdate(handle_, input.data(), static_cast<tee_size>(input.size()),
                            output.data(), &size),
-              "AEUpdate", at);
+              "AEUpdate");
   *produced = res == TEE_SUCCESS ? size : 0;
   return res;
 }

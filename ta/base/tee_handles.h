@@ -7,7 +7,7 @@
 #include <utility>
 
 #include "ta/base/bytes.h"
-#include "ta/base/trace.h"
+#include "ta/base/results.h"
 
 namespace keymaster {
 
@@ -26,15 +26,11 @@ class tee_object {
   }
   ~tee_object() { reset(); }
 
-  [[nodiscard]] TEE_Result allocate(uint32_t type, uint32_t max_bits,
-                                    trace_site at = trace_site::here());
-  [[nodiscard]] TEE_Result populate(std::span<const TEE_Attribute> attributes,
-                                    trace_site at = trace_site::here());
-  [[nodiscard]] TEE_Result generate(uint32_t bits, std::span<const TEE_Attribute> parameters,
-                                    trace_site at = trace_site::here());
+  [[nodiscard]] TEE_Result allocate(uint32_t type, uint32_t max_bits);
+  [[nodiscard]] TEE_Result populate(std::span<const TEE_Attribute> attributes);
+  [[nodiscard]] TEE_Result generate(uint32_t bits, std::span<const TEE_Attribute> parameters);
   // Reads buffer attribute `id` into `buffer`; `*length` receives the bytes written.
-  [[nodiscard]] TEE_Result read_attribute(uint32_t id, byte_span buffer, size_t* length,
-                                          trace_site at = trace_site::here()) const;
+  [[nodiscard]] TEE_Result read_attribute(uint32_t id, byte_span buffer, size_t* length) const;
 
   TEE_ObjectHandle get() const { return handle_; }
   // For calls that hand out a handle; whatever was owned is closed first.
@@ -61,18 +57,13 @@ class tee_operation {
   }
   ~tee_operation() { reset(); }
 
-  [[nodiscard]] TEE_Result allocate(uint32_t algorithm, uint32_t mode, uint32_t max_key_bits,
-                                    trace_site at = trace_site::here());
-  [[nodiscard]] TEE_Result set_key(TEE_ObjectHandle key, trace_site at = trace_site::here());
-  [[nodiscard]] TEE_Result digest_final(byte_view last, byte_span digest, size_t* length,
-                                        trace_site at = trace_site::here());
-  [[nodiscard]] TEE_Result mac_final(byte_view last, byte_span mac, size_t* length,
-                                     trace_site at = trace_site::here());
-  [[nodiscard]] TEE_Result ae_init(byte_view nonce, uint32_t tag_bits,
-                                   trace_site at = trace_site::here());
+  [[nodiscard]] TEE_Result allocate(uint32_t algorithm, uint32_t mode, uint32_t max_key_bits);
+  [[nodiscard]] TEE_Result set_key(TEE_ObjectHandle key);
+  [[nodiscard]] TEE_Result digest_final(byte_view last, byte_span digest, size_t* length);
+  [[nodiscard]] TEE_Result mac_final(byte_view last, byte_span mac, size_t* length);
+  [[nodiscard]] TEE_Result ae_init(byte_view nonce, uint32_t tag_bits);
   // `*produced` receives the bytes written to `output`.
-  [[nodiscard]] TEE_Result ae_update(byte_view input, byte_span output, size_t* produced,
-                                     trace_site at = trace_site::here());
+  [[nodiscard]] TEE_Result ae_update(byte_view input, byte_span output, size_t* produced);
 
   // For calls whose message differs from place to place.
   TEE_OperationHandle get() const { return handle_; }

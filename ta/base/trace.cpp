@@ -1,10 +1,12 @@
-// Formatting of trace lines.
+// Formatting of trace lines, and the makers of failures.
 #include "ta/base/trace.h"
 
 #include <algorithm>
 #include <cstdarg>
 #include <cstddef>
 #include <cstdio>
+
+#include "ta/base/outcome.h"
 
 namespace keymaster {
 namespace {
@@ -33,45 +35,54 @@ size_t written(int result, size_t room) {
   return std::min(static_cast<size_t>(result), room - 1);
 }
 
-size_t write_prefix(char* line, size_t room, uint32_t level, trace_site at) {
+size_t write_prefix(char* line, size_t room, with_line<uint32_t> level) {
+  const char* name = level_name(level.code);
+  const char* function = trace_scope::current();
   const uint32_t thread = TEE_TraceThread();
-  if (thread == 0) {
-    return written(
-        snprintf(line, room, "%s %s:%s:%d: ", level_name(level), TRACE_NAME, at.function, at.line),
-        room);
-  }
-  return written(snprintf(line, room, "%s [0x%x] %s:%s:%d: ", level_name(level), thread, TRACE_NAME,
-                          at.function, at.line),
-                 room);
+  const int result =
+      thread == 0 ? snprintf(line, room, "%s %s:%s:%d: ", name, TRACE_NAME, function, level.line)
+                  : snprintf(line, room, "%s [0x%x] %s:%s:%d: ", name, thread, TRACE_NAME, function,
+                             level.line);
+  return written(result, room);
 }
 
 // The last byte is kept for the newline; the terminating zero that snprintf puts there is dropped.
-__attribute__((format(printf, 3, 0))) void write_line(uint32_t level, trace_site at,
-                                                      const char* format, va_list arguments) {
+__attribute__((format(printf, 2, 0))) void write_line(with_line<uint32_t> level, const char* format,
+                                                      va_list arguments) {
+  if (level.code > TEE_TraceThreshold()) return;
   char line[MAX_LINE_SIZE];
-  size_t length = write_prefix(line, sizeof(line), level, at);
+  size_t length = write_prefix(line, sizeof(line), level);
   const size_t room = sizeof(line) - length;
   length += written(vsnprintf(line + length, room, format, arguments), room);
   if (length == 0 || line[length - 1] != '\n') line[length++] = '\n';
-  TEE_TraceWrite(level, line, length);
+  TEE_TraceWrite(level.code, line, length);
 }
 
 }  // namespace
 
-void trace(uint32_t level, trace_site at, const char* format, ...) {
-  if (level > TEE_TraceThreshold()) return;
+const char* trace_scope::current_ = "";
+
+void trace(with_line<uint32_t> level, const char* format, ...) {
   va_list arguments;
   va_start(arguments, format);
-  write_line(level, at, format, arguments);
+  write_line(level, format, arguments);
   va_end(arguments);
 }
 
-void trace_error(trace_site at, const char* format, ...) {
-  if (TEE_TRACE_ERROR > TEE_TraceThreshold()) return;
+TEE_Result fail(with_line<TEE_Result> code, const char* format, ...) {
   va_list arguments;
   va_start(arguments, format);
-  write_line(TEE_TRACE_ERROR, at, format, arguments);
+  write_line({TEE_TRACE_ERROR, code.line}, format, arguments);
   va_end(arguments);
+  return code.code;
+}
+
+keymaster_error_t refuse(with_line<keymaster_error_t> code, const char* format, ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  write_line({TEE_TRACE_ERROR, code.line}, format, arguments);
+  va_end(arguments);
+  return code.code;
 }
 
 }  // namespace keymaster

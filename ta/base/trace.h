@@ -6,34 +6,42 @@
 #include "tee_extensions.h"
 
 #include <cstdint>
+#include <utility>
 
 namespace keymaster {
 
-// trace_site: the function and line that a message is reported under. Taken as a default argument,
-// here() names the caller, so that shared helpers trace in their callers' names.
-struct trace_site {
-  const char* function;
+// trace_scope: the name that messages go out under, from here to the end of the scope: that of the
+// function that opens it, or one given. Functions that open none trace in the name of who called
+// them, so shared helpers need not be told. The TA has one thread; the name is instance state.
+class trace_scope {
+ public:
+  explicit trace_scope(const char* function = __builtin_FUNCTION())
+      : outer_(std::exchange(current_, function)) {}
+  trace_scope(const trace_scope&) = delete;
+  trace_scope& operator=(const trace_scope&) = delete;
+  ~trace_scope() { current_ = outer_; }
+
+  static const char* current() { return current_; }
+  // The state of a fresh instance, whatever an earlier one in this process left.
+  static void reset() { current_ = ""; }
+
+ private:
+  static const char* current_;
+  const char* outer_;
+};
+
+// with_line: a code and the line of the statement that names it, which is what a trace line shows.
+template <class T>
+struct with_line {
+  T code;
   int line;
-  static constexpr trace_site here(const char* function = __builtin_FUNCTION(),
-                                   int line = __builtin_LINE()) {
-    return {function, line};
-  }
+  // NOLINTNEXTLINE(google-explicit-constructor): callers write the bare code.
+  constexpr with_line(T value, int at = __builtin_LINE()) : code(value), line(at) {}
 };
 
 // trace: one line at `level` (TEE_TRACE_ERROR, ...). A newline is appended when the message has
 // none.
-void trace(uint32_t level, trace_site at, const char* format, ...)
-    __attribute__((format(printf, 3, 4)));
-
-// trace_error: the same at error level. Cold: the compiler keeps what leads to it away from the
-// path that succeeds.
-void trace_error(trace_site at, const char* format, ...)
-    __attribute__((format(printf, 2, 3), cold));
-
-#define TRACE_ERROR(...) ::keymaster::trace_error(::keymaster::trace_site::here(), __VA_ARGS__)
-#define TRACE_INFO(...) \
-  ::keymaster::trace(TEE_TRACE_INFO, ::keymaster::trace_site::here(), __VA_ARGS__)
-#define TRACE_DEBUG(...) \
-  ::keymaster::trace(TEE_TRACE_DEBUG, ::keymaster::trace_site::here(), __VA_ARGS__)
+void trace(with_line<uint32_t> level, const char* format, ...)
+    __attribute__((format(printf, 2, 3)));
 
 }  // namespace keymaster

@@ -83,20 +83,19 @@ bool has_output(const command_row& row) {
   return TEE_PARAM_TYPE_GET(row.types, 2) == TEE_PARAM_TYPE_MEMREF_OUTPUT;
 }
 
-TEE_Result check_parameters(const command_row& row, uint32_t types, const TEE_Param* params,
-                            trace_site at) {
+TEE_Result check_parameters(const command_row& row, uint32_t types, const TEE_Param* params) {
   if (types != row.types) {
     if (row.types == IN_ONLY) {
-      trace_error(at, "Bad argument type 0x%x\n", types);
+      trace_error("Bad argument type 0x%x\n", types);
     } else {
-      trace_error(at, "Bad argument type\n");
+      trace_error("Bad argument type\n");
     }
     return TEE_ERROR_BAD_PARAMETERS;
   }
   const bool a_refused = row.slot0 == BOTH_ZERO && params[0].value.a != 0;
   const bool b_refused = row.slot0 != UNUSED && params[0].value.b != 0;
   if (a_refused || b_refused) {
-    trace_error(at, "Bad argument\n");
+    trace_error("Bad argument\n");
     return TEE_ERROR_BAD_PARAMETERS;
   }
   return TEE_SUCCESS;
@@ -119,7 +118,8 @@ command_io unpack(const command_row& row, const TEE_Param* params) {
 
 TEE_Result run(const command_row& row, command_io* io, keymaster_error_t* km_error) {
   if (row.needs_configured && !configured().is_configured) {
-    trace_error({row.name, __LINE__}, "Not configured");
+    const trace_scope scope(row.name);
+    trace_error("Not configured");
     *km_error = KM_ERROR_KEYMASTER_NOT_CONFIGURED;
     return TEE_SUCCESS;
   }
@@ -141,14 +141,14 @@ void settle_output(const command_row& row, const command_io& io, bool done, TEE_
 
 }  // namespace
 
-TEE_Result dispatch(uint32_t command, uint32_t types, TEE_Param* params, trace_site at) {
+TEE_Result dispatch(uint32_t command, uint32_t types, TEE_Param* params) {
   const command_row* row = find_command(command);
   if (row == nullptr) {
-    trace_error(at, "Unknown command %x\n", command);
+    trace_error("Unknown command %x\n", command);
     return TEE_ERROR_BAD_PARAMETERS;
   }
-  trace(TEE_TRACE_INFO, at, "%s", row->name);
-  if (TEE_Result res = check_parameters(*row, types, params, at)) return res;
+  trace(TEE_TRACE_INFO, "%s", row->name);
+  if (TEE_Result res = check_parameters(*row, types, params)) return res;
 
   command_io io = unpack(*row, params);
   keymaster_error_t km_error = KM_ERROR_OK;

@@ -3,7 +3,7 @@
 
 #include "tee_internal_api.h"
 
-#include "ta/base/trace.h"
+#include "ta/base/results.h"
 
 namespace keymaster {
 
@@ -11,6 +11,6 @@ namespace keymaster {
 // writes the outcome back: the Keymaster error to slot 0 `a`, the command's own value to `b`, the
 // produced size to slot 2. TEE_ERROR_BAD_PARAMETERS: unknown command, wrong types, value fields
 // that must be zero and are not; else the handler's code. Messages go out under `at`.
-TEE_Result dispatch(uint32_t command, uint32_t types, TEE_Param* params, trace_site at);
+TEE_Result dispatch(uint32_t command, uint32_t types, TEE_Param* params);
 
 }  // namespace keymaster

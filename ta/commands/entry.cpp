@@ -14,6 +14,8 @@
 using keymaster::dispatch;
 
 TEE_Result TA_CreateEntryPoint() {
+  keymaster::trace_scope::reset();
+  const keymaster::trace_scope scope;
   keymaster::configured_init();
   keymaster::finger_id_init();
   if (TEE_Result res = keymaster::key_store_init()) {
@@ -42,7 +44,8 @@ void TA_CloseSessionEntryPoint(void*) {}
 
 TEE_Result TA_InvokeCommandEntryPoint(void* sessionContext, uint32_t commandID, uint32_t paramTypes,
                                       TEE_Param* params) {
+  const keymaster::trace_scope scope;
   TRACE_INFO("TA_InvokeCommandEntryPoint nCommandID 0x%x pSessionContext %p nParamTypes 0x%x\n",
              commandID, sessionContext, paramTypes);
-  return dispatch(commandID, paramTypes, params, keymaster::trace_site::here());
+  return dispatch(commandID, paramTypes, params);
 }

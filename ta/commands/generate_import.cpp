@@ -8,23 +8,23 @@
 namespace keymaster::commands {
 namespace {
 
-keymaster_error_t check_blob_usage(const keymaster_key_param_set_t& description, trace_site at) {
+keymaster_error_t check_blob_usage(const keymaster_key_param_set_t& description) {
   if (tag_at_most_once(description, KM_TAG_BLOB_USAGE_REQUIREMENTS)) return KM_ERROR_OK;
-  trace_error(at, "Too many KM_TAG_BLOB_USAGE_REQUIREMENTS specified");
+  trace_error("Too many KM_TAG_BLOB_USAGE_REQUIREMENTS specified");
   return KM_ERROR_INVALID_TAG;
 }
 
 // The algorithm that an import names, if it can import.
 keymaster_error_t choose_import(const keymaster_key_param_set_t& description,
-                                const algorithm_t** algorithm, trace_site at) {
+                                const algorithm_t** algorithm) {
   const auto* tag = get_unique(description, KM_TAG_ALGORITHM);
   if (tag == nullptr) {
-    trace_error(at, "No or too many KM_TAG_ALGORITHM");
+    trace_error("No or too many KM_TAG_ALGORITHM");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   *algorithm = find_algorithm(tag->enumerated);
   if (*algorithm != nullptr && (*algorithm)->import_key != nullptr) return KM_ERROR_OK;
-  trace_error(at, "Unsupport import_key for algorithm %s (%d)",
+  trace_error("Unsupport import_key for algorithm %s (%d)",
               *algorithm == nullptr ? "" : (*algorithm)->name, static_cast<int>(tag->enumerated));
   return KM_ERROR_UNSUPPORTED_ALGORITHM;
 }
@@ -32,24 +32,24 @@ keymaster_error_t choose_import(const keymaster_key_param_set_t& description,
 // Copies the key data into TA memory and has the algorithm make key material of it.
 TEE_Result import_material(const algorithm_t& algorithm, keymaster_key_param_set_t* description,
                            byte_view client_data, heap_buffer* material,
-                           keymaster_error_t* km_error, trace_site at) {
+                           keymaster_error_t* km_error) {
   heap_buffer key_data;
   if (!key_data.copy_of(client_data)) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
   const TEE_Result res = algorithm.import_key(description, key_data.view(), material, km_error);
   if (failed(res, *km_error)) return res;
-  *km_error = check_blob_usage(*description, at);
+  *km_error = check_blob_usage(*description);
   return TEE_SUCCESS;
 }
 
 // Writes blob field and characteristics field; *total receives the bytes of both.
 TEE_Result write_imported(byte_view material, const keymaster_key_param_set_t& characteristics,
-                          byte_span output, size_t* total, trace_site at) {
-  const auto too_short = [at] {
-    trace_error(at, "Too short buffer");
+                          byte_span output, size_t* total) {
+  const auto too_short = [] {
+    trace_error("Too short buffer");
     return TEE_ERROR_GENERIC;
   };
   output_cursor out(output);
@@ -61,7 +61,7 @@ TEE_Result write_imported(byte_view material, const keymaster_key_param_set_t& c
   }
   size_t size = 0;
   if (TEE_Result res = save_key(material, characteristics, out.rest(), &size)) {
-    trace_error(at, "Can't save key to TEE storage");
+    trace_error("Can't save key to TEE storage");
     return res;
   }
   store_u32(blob_length, static_cast<uint32_t>(size));
@@ -69,7 +69,7 @@ TEE_Result write_imported(byte_view material, const keymaster_key_param_set_t& c
     return too_short();
   }
   if (TEE_Result res = write_set(characteristics, out.rest(), &size)) {
-    trace_error(at, "Marshal failed");
+    trace_error("Marshal failed");
     return res;
   }
   store_u32(characteristics_length, static_cast<uint32_t>(size));
@@ -80,6 +80,7 @@ TEE_Result write_imported(byte_view material, const keymaster_key_param_set_t& c
 }  // namespace
 
 TEE_Result generate_key(command_io* io, keymaster_error_t* km_error) {
+  const trace_scope scope;
   keymaster_key_param_set_t description;
   if (TEE_Result res = read_params(io->input, &description)) return res;
   KEYMASTER_DUMP_KEY_PARAM_SET(description);
@@ -96,7 +97,7 @@ TEE_Result generate_key(command_io* io, keymaster_error_t* km_error) {
   heap_buffer material;
   const TEE_Result res = algorithm->generate_key(&description, &material, km_error);
   if (failed(res, *km_error)) return res;
-  *km_error = check_blob_usage(description, trace_site::here());
+  *km_error = check_blob_usage(description);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   if (TEE_Result saved = save_key(material.view(), description, io->output, &io->output_size)) {
     return TEE_FAIL(saved, "Can't save key to TEE storage");
@@ -105,7 +106,7 @@ TEE_Result generate_key(command_io* io, keymaster_error_t* km_error) {
 }
 
 TEE_Result import_key(command_io* io, keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   input_cursor in(io->input);
   byte_view marshalled;
   if (!in.read_field(&marshalled)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
@@ -113,13 +114,12 @@ TEE_Result import_key(command_io* io, keymaster_error_t* km_error) {
   if (TEE_Result res = read_params(marshalled, &description)) return res;
   KEYMASTER_DUMP_KEY_PARAM_SET(description);
   const algorithm_t* algorithm = nullptr;
-  *km_error = choose_import(description, &algorithm, at);
+  *km_error = choose_import(description, &algorithm);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   heap_buffer material;
-  const TEE_Result res =
-      import_material(*algorithm, &description, in.rest(), &material, km_error, at);
+  const TEE_Result res = import_material(*algorithm, &description, in.rest(), &material, km_error);
   if (failed(res, *km_error)) return res;
-  return write_imported(material.view(), description, io->output, &io->output_size, at);
+  return write_imported(material.view(), description, io->output, &io->output_size);
 }
 
 }  // namespace keymaster::commands

@@ -8,33 +8,32 @@
 
 namespace keymaster {
 
-TEE_Result read_params(byte_view marshalled, keymaster_key_param_set_t* params, trace_site at) {
+TEE_Result read_params(byte_view marshalled, keymaster_key_param_set_t* params) {
   if (unmarshal(marshalled, params) == TEE_SUCCESS) return TEE_SUCCESS;
-  trace_error(at, "Unmarshal failed");
+  trace_error("Unmarshal failed");
   return TEE_ERROR_BAD_PARAMETERS;
 }
 
-TEE_Result read_use(byte_view input, byte_view* blob, keymaster_key_param_set_t* params,
-                    trace_site at) {
+TEE_Result read_use(byte_view input, byte_view* blob, keymaster_key_param_set_t* params) {
   input_cursor in(input);
   byte_view marshalled;
   if (!in.read_field(blob) || !in.read_field(&marshalled)) {
-    trace_error(at, "Too short input");
+    trace_error("Too short input");
     return TEE_ERROR_GENERIC;
   }
-  return read_params(marshalled, params, at);
+  return read_params(marshalled, params);
 }
 
-keymaster_error_t open_checked_key(byte_view blob, opened_key* key, trace_site at) {
+keymaster_error_t open_checked_key(byte_view blob, opened_key* key) {
   if (!key->blob.copy_of(blob)) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   keymaster_error_t error = KM_ERROR_OK;
   const TEE_Result res = open_key(key->blob.view(), &key->material, &key->characteristics, &error);
   if (failed(res, error)) {
     // The reason is traced, not told: a blob that does not open asks for an upgrade. Intended.
-    trace_error(at, "Open key failed");
+    trace_error("Open key failed");
     return KM_ERROR_KEY_REQUIRES_UPGRADE;
   }
   if (key_requires_upgrade(key->characteristics)) return KM_ERROR_KEY_REQUIRES_UPGRADE;
@@ -48,10 +47,10 @@ bool read_key_request(byte_view input, key_request* request) {
          in.read_field(&request->app_data);
 }
 
-keymaster_error_t open_requested_key(const key_request& request, opened_key* key, trace_site at) {
-  if (auto error = open_checked_key(request.blob, key, at)) return error;
+keymaster_error_t open_requested_key(const key_request& request, opened_key* key) {
+  if (auto error = open_checked_key(request.blob, key)) return error;
   if (!check_app_id_and_app_data(key->characteristics, request.app_id, request.app_data)) {
-    trace_error(at, "Wrong AppId or AppData");
+    trace_error("Wrong AppId or AppData");
     return KM_ERROR_INVALID_KEY_BLOB;
   }
   return KM_ERROR_OK;

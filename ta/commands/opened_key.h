@@ -15,20 +15,17 @@ struct opened_key {
 };
 
 // read_params: the set that a command brings; TEE_ERROR_BAD_PARAMETERS when it cannot be read.
-[[nodiscard]] TEE_Result read_params(byte_view marshalled, keymaster_key_param_set_t* params,
-                                     trace_site at = trace_site::here());
+[[nodiscard]] TEE_Result read_params(byte_view marshalled, keymaster_key_param_set_t* params);
 
 // read_use: an input of two fields, key blob and set. TEE_ERROR_GENERIC when it is too short, and
 // as read_params.
 [[nodiscard]] TEE_Result read_use(byte_view input, byte_view* blob,
-                                  keymaster_key_param_set_t* params,
-                                  trace_site at = trace_site::here());
+                                  keymaster_key_param_set_t* params);
 
 // open_checked_key: copies `blob` and opens it; refuses keys older or newer than the configured
 // system. Whatever open_key says, a blob that does not open is -62; -33 for a newer key; -41 out of
 // memory. Messages go out under `at`.
-[[nodiscard]] keymaster_error_t open_checked_key(byte_view blob, opened_key* key,
-                                                 trace_site at = trace_site::here());
+[[nodiscard]] keymaster_error_t open_checked_key(byte_view blob, opened_key* key);
 
 // key_request: the input that get_key_character_size, get_key_character and export_key share: key
 // blob, application identifier and application data, each a field. An empty field is none.
@@ -40,8 +37,7 @@ struct key_request {
 [[nodiscard]] bool read_key_request(byte_view input, key_request* request);
 
 // open_requested_key: open_checked_key, then the application binding (-33).
-[[nodiscard]] keymaster_error_t open_requested_key(const key_request& request, opened_key* key,
-                                                   trace_site at = trace_site::here());
+[[nodiscard]] keymaster_error_t open_requested_key(const key_request& request, opened_key* key);
 
 // write_set: marshals `set` without its application tags into `room`; *written receives the bytes.
 [[nodiscard]] TEE_Result write_set(const keymaster_key_param_set_t& set, byte_span room,

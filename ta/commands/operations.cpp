@@ -47,46 +47,45 @@ class live_operation {
 // Reads the parameters of an update or finish and authorises it. Both results. Bad parameters are a
 // Keymaster error here, unlike in begin: intended.
 TEE_Result authorize_step(byte_view marshalled, const live_operation& operation,
-                          keymaster_key_param_set_t* params, keymaster_error_t* km_error,
-                          trace_site at) {
+                          keymaster_key_param_set_t* params, keymaster_error_t* km_error) {
   if (unmarshal(marshalled, params) != TEE_SUCCESS) {
-    trace_error(at, "Unmarshal failed");
+    trace_error("Unmarshal failed");
     *km_error = KM_ERROR_INVALID_ARGUMENT;
     return TEE_SUCCESS;
   }
   const uint64_t challenge = operation.handle();
   const TEE_Result res = authorize_update_or_finish(*params, operation.get()->key_characteristics,
                                                     challenge, km_error);
-  if (failed(res, *km_error)) trace_error(at, "Authorization failed");
+  if (failed(res, *km_error)) trace_error("Authorization failed");
   return res;
 }
 
 // Runs the object's finish. Both results.
 TEE_Result run_finish(operation_t* operation, const keymaster_key_param_set_t& params,
                       byte_view input, heap_buffer* output, keymaster_key_param_set_t* out_params,
-                      keymaster_error_t* km_error, trace_site at) {
+                      keymaster_error_t* km_error) {
   if (operation->finish == nullptr) {
-    trace_error(at, "Finish not implemented");
+    trace_error("Finish not implemented");
     *km_error = KM_ERROR_UNIMPLEMENTED;
     return TEE_SUCCESS;
   }
   const TEE_Result res = operation->finish(operation, params, input, output, out_params, km_error);
-  if (failed(res, *km_error)) trace_error(at, "Finish failed");
+  if (failed(res, *km_error)) trace_error("Finish failed");
   return res;
 }
 
 // Writes output field and output parameters field; *total receives the bytes of both.
 TEE_Result write_finished(byte_view result, const keymaster_key_param_set_t& out_params,
-                          byte_span output, size_t* total, trace_site at) {
+                          byte_span output, size_t* total) {
   output_cursor out(output);
   byte_span params_length;
   if (!out.write_field(result) || !out.reserve(sizeof(uint32_t), &params_length)) {
-    trace_error(at, "Too short buffer");
+    trace_error("Too short buffer");
     return TEE_ERROR_GENERIC;
   }
   size_t size = 0;
   if (TEE_Result res = write_set(out_params, out.rest(), &size)) {
-    trace_error(at, "Marshal failed");
+    trace_error("Marshal failed");
     return res;
   }
   store_u32(params_length, static_cast<uint32_t>(size));
@@ -97,7 +96,7 @@ TEE_Result write_finished(byte_view result, const keymaster_key_param_set_t& out
 }  // namespace
 
 TEE_Result update(command_io* io, keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   live_operation operation(io->argument);
   if (operation.get() == nullptr) {
     *km_error = KM_ERROR_INVALID_OPERATION_HANDLE;
@@ -110,7 +109,7 @@ TEE_Result update(command_io* io, keymaster_error_t* km_error) {
   io->result = static_cast<uint32_t>(input.size());
   if (!in.read_field(&marshalled)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
   keymaster_key_param_set_t params;
-  TEE_Result res = authorize_step(marshalled, operation, &params, km_error, at);
+  TEE_Result res = authorize_step(marshalled, operation, &params, km_error);
   if (failed(res, *km_error)) return res;
   operation_t* object = operation.get();
   if (object->update == nullptr) {
@@ -128,7 +127,7 @@ TEE_Result update(command_io* io, keymaster_error_t* km_error) {
 }
 
 TEE_Result finish(command_io* io, keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   live_operation operation(io->argument);
   if (operation.get() == nullptr) {
     *km_error = KM_ERROR_INVALID_OPERATION_HANDLE;
@@ -141,14 +140,14 @@ TEE_Result finish(command_io* io, keymaster_error_t* km_error) {
     return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
   }
   keymaster_key_param_set_t params;
-  TEE_Result res = authorize_step(marshalled, operation, &params, km_error, at);
+  TEE_Result res = authorize_step(marshalled, operation, &params, km_error);
   if (failed(res, *km_error)) return res;
   heap_buffer output;
   keymaster_key_param_set_t out_params;
-  res = run_finish(operation.get(), params, input, &output, &out_params, km_error, at);
+  res = run_finish(operation.get(), params, input, &output, &out_params, km_error);
   if (failed(res, *km_error)) return res;
   operation.end();  // before anything is written: a short output does not keep it alive
-  return write_finished(output.view(), out_params, io->output, &io->output_size, at);
+  return write_finished(output.view(), out_params, io->output, &io->output_size);
 }
 
 TEE_Result _abort(command_io* io, keymaster_error_t* km_error) {

@@ -30,6 +30,7 @@ TEE_Result export_attk(byte_span output, size_t* length) {
 
 // Generates nothing, whatever its name says: intended, the factory makes the key.
 TEE_Result soter_handle_generate_attk_key_pair(command_io*, keymaster_error_t* km_error) {
+  const trace_scope scope;
   TRACE_INFO("this function should not be called in anytime but in meta mode\n");
   if (soter_check_init() != TEE_SUCCESS) {
     return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "attk_key_pair is not produced\n");
@@ -62,6 +63,7 @@ TEE_Result soter_handle_export_attk_public_key(command_io* io, keymaster_error_t
 }
 
 TEE_Result soter_handle_get_device_id(command_io* io, keymaster_error_t* km_error) {
+  const trace_scope scope;
   size_t length = io->output.size();
   const TEE_Result res =
       retrieve_property_from_vault(REQUEST_DEVICE_ID, io->output.data(), &length);
@@ -78,6 +80,7 @@ TEE_Result soter_handle_get_device_id(command_io* io, keymaster_error_t* km_erro
 }
 
 TEE_Result soter_handle_setFid(command_io* io, keymaster_error_t*) {
+  const trace_scope scope;
   TRACE_DEBUG("soter handle finger print ta notify");
   if (TEE_Result res = is_from_fp_ta()) return TEE_FAIL(res, "soter deny finger print ta");
   if (TEE_Result res = take_notification(io->input)) return res;

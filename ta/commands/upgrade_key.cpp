@@ -10,18 +10,17 @@ namespace {
 
 // Opens a blob of this TA, or of the earlier one. The version checks are not run: an old key is
 // what this command is for.
-TEE_Result open_any(byte_view client_blob, opened_key* key, keymaster_error_t* km_error,
-                    trace_site at) {
+TEE_Result open_any(byte_view client_blob, opened_key* key, keymaster_error_t* km_error) {
   if (!key->blob.copy_of(client_blob)) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
   TEE_Result res = open_key(key->blob.view(), &key->material, &key->characteristics, km_error);
   if (!failed(res, *km_error)) return TEE_SUCCESS;
-  trace_error(at, "Open V2 key failed");
+  trace_error("Open V2 key failed");
   res = open_v1_key(key->blob.view(), &key->material, &key->characteristics, km_error);
-  if (failed(res, *km_error)) trace_error(at, "Open V1 key failed");
+  if (failed(res, *km_error)) trace_error("Open V1 key failed");
   return res;
 }
 
@@ -38,16 +37,16 @@ bool raise_version(keymaster_key_param_set_t* characteristics, keymaster_tag_t t
 }
 
 keymaster_error_t upgrade_characteristics(keymaster_key_param_set_t* characteristics,
-                                          const keymaster_key_param_set_t& params, trace_site at) {
+                                          const keymaster_key_param_set_t& params) {
   if (!check_app_id_and_app_data(*characteristics, unique_blob(params, KM_TAG_APPLICATION_ID),
                                  unique_blob(params, KM_TAG_APPLICATION_DATA))) {
-    trace_error(at, "Wrong AppId or AppData");
+    trace_error("Wrong AppId or AppData");
     return KM_ERROR_INVALID_KEY_BLOB;
   }
   if (!raise_version(characteristics, KM_TAG_OS_VERSION, configured().configured_os_version) ||
       !raise_version(characteristics, KM_TAG_OS_PATCHLEVEL,
                      configured().configured_os_patchlevel)) {
-    trace_error(at, "Can't upgrade key params");
+    trace_error("Can't upgrade key params");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   return KM_ERROR_OK;
@@ -56,7 +55,7 @@ keymaster_error_t upgrade_characteristics(keymaster_key_param_set_t* characteris
 }  // namespace
 
 TEE_Result upgrade_key(command_io* io, keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   input_cursor in(io->input);
   byte_view marshalled;
   byte_view blob;
@@ -66,9 +65,9 @@ TEE_Result upgrade_key(command_io* io, keymaster_error_t* km_error) {
   keymaster_key_param_set_t params;
   if (TEE_Result res = read_params(marshalled, &params)) return res;
   opened_key key;
-  const TEE_Result res = open_any(blob, &key, km_error, at);
+  const TEE_Result res = open_any(blob, &key, km_error);
   if (failed(res, *km_error)) return res;
-  *km_error = upgrade_characteristics(&key.characteristics, params, at);
+  *km_error = upgrade_characteristics(&key.characteristics, params);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   if (TEE_Result saved =
           save_key(key.material.view(), key.characteristics, io->output, &io->output_size)) {

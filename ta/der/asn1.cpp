@@ -92,10 +92,10 @@ int32_t asn1_choice_write(std::span<const asn1_alternative> table, der_cursor* o
   return DER_INVALID;
 }
 
-void* asn1_list_add(const asn1_list_of& kind, asn1_list* list, trace_site at) {
+void* asn1_list_add(const asn1_list_of& kind, asn1_list* list) {
   auto* item = static_cast<asn1_link*>(heap_take(kind.item_size));
   if (item == nullptr) {
-    trace_error(at, "Out of memory, need %uB", static_cast<unsigned>(kind.item_size));
+    trace_error("Out of memory, need %uB", static_cast<unsigned>(kind.item_size));
     return nullptr;
   }
   kind.type->initialise(member(item, kind.value_offset));
@@ -125,10 +125,10 @@ int32_t asn1_list_write(const asn1_list_of& kind, der_cursor* out, const asn1_li
   return der_wrap(out, kind.tag, total);
 }
 
-void* asn1_alloc(const asn1_type& type, size_t size, trace_site at) {
+void* asn1_alloc(const asn1_type& type, size_t size) {
   void* record = heap_take(size);
   if (record == nullptr) {
-    trace_error(at, "Out of memory, need %uB", static_cast<unsigned>(size));
+    trace_error("Out of memory, need %uB", static_cast<unsigned>(size));
     return nullptr;
   }
   type.initialise(record);
@@ -153,11 +153,11 @@ int32_t asn1_encode(const asn1_type& type, const void* value, byte_span buffer) 
 }
 
 int32_t asn1_encode_growing(const asn1_type& type, const void* value, size_t first_size,
-                            heap_buffer* encoding, trace_site at) {
+                            heap_buffer* encoding) {
   for (size_t size = first_size;; size *= 2) {
     encoding->reset();
     if (!encoding->allocate(size)) {
-      trace_error(at, "Out of memory, need %uB", static_cast<unsigned>(size));
+      trace_error("Out of memory, need %uB", static_cast<unsigned>(size));
       return DER_NO_MEMORY;
     }
     const int32_t length = asn1_encode(type, value, encoding->span());

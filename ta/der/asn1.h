@@ -7,7 +7,7 @@
 
 #include "ta/base/bytes.h"
 #include "ta/base/heap.h"
-#include "ta/base/trace.h"
+#include "ta/base/results.h"
 #include "ta/der/der.h"
 
 namespace keymaster {
@@ -97,7 +97,7 @@ struct asn1_list_of {
 };
 // A new item, initialised and linked in; null, traced as "Out of memory, need %uB", if there is
 // none.
-[[nodiscard]] void* asn1_list_add(const asn1_list_of& kind, asn1_list* list, trace_site at);
+[[nodiscard]] void* asn1_list_add(const asn1_list_of& kind, asn1_list* list);
 void asn1_list_free(const asn1_list_of& kind, asn1_list* list);
 [[nodiscard]] int32_t asn1_list_write(const asn1_list_of& kind, der_cursor* out,
                                       const asn1_list& list);
@@ -113,7 +113,7 @@ struct asn1_list_type {
 
 // asn1_alloc: a record on the heap, initialised; null, traced, when out of memory. asn1_release
 // frees its fields and the record; null is ignored.
-[[nodiscard]] void* asn1_alloc(const asn1_type& type, size_t size, trace_site at);
+[[nodiscard]] void* asn1_alloc(const asn1_type& type, size_t size);
 void asn1_release(const asn1_type& type, void* record, size_t size);
 
 // asn1_owner: owns a record on the heap; null is legal.
@@ -140,8 +140,7 @@ class asn1_owner {
 // asn1_encode_growing: the same into a heap buffer that starts at `first_size` bytes and is doubled
 // while the writer finds it too small. DER_NO_MEMORY, traced, when it cannot grow.
 [[nodiscard]] int32_t asn1_encode_growing(const asn1_type& type, const void* value,
-                                          size_t first_size, heap_buffer* encoding,
-                                          trace_site at = trace_site::here());
+                                          size_t first_size, heap_buffer* encoding);
 
 // Values. INTEGER: uint64_t. BOOLEAN: uint8_t. NULL: nothing, its presence is the value.
 
@@ -205,9 +204,9 @@ extern const asn1_type ASN1_TIME_TYPE;
 // NOLINTBEGIN(bugprone-macro-parentheses): the arguments are type names
 // Every record type X has X_TYPE, X_alloc (null, traced, when out of memory), X_free and X_write,
 // which encodes to the start of a buffer and returns the length or a negative code.
-#define KM_DECLARE_ASN1_OPERATIONS(type)                                \
-  [[nodiscard]] type* type##_alloc(trace_site at = trace_site::here()); \
-  void type##_free(type* record);                                       \
+#define KM_DECLARE_ASN1_OPERATIONS(type) \
+  [[nodiscard]] type* type##_alloc();    \
+  void type##_free(type* record);        \
   [[nodiscard]] int32_t type##_write(const type* record, uint8_t* buffer, size_t size);
 #define KM_DECLARE_ASN1_RECORD(type)  \
   extern const asn1_type type##_TYPE; \
@@ -216,8 +215,8 @@ extern const asn1_type ASN1_TIME_TYPE;
 // The same for a record whose operations are asn1_sequence<...>, asn1_choice<...> or
 // asn1_list_type<...>.
 #define KM_DEFINE_ASN1_OPERATIONS(type)                                    \
-  type* type##_alloc(trace_site at) {                                      \
-    return static_cast<type*>(asn1_alloc(type##_TYPE, sizeof(type), at));  \
+  type* type##_alloc() {                                                   \
+    return static_cast<type*>(asn1_alloc(type##_TYPE, sizeof(type)));      \
   }                                                                        \
   void type##_free(type* record) {                                         \
     asn1_release(type##_TYPE, record, sizeof(type));                       \

@@ -150,6 +150,7 @@ int32_t ASN1_BIT_STRING_set_bit(ASN1_BIT_STRING* string, uint32_t index, bool va
 }
 
 int32_t _ASN1_OID_write(der_cursor* out, const ASN1_OID* oid) {
+  const trace_scope scope;
   size_t count = 0;
   for (const ASN1_OID* segment = oid; segment != nullptr; segment = segment->parent) {
     count += segment->count;

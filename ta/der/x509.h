@@ -138,9 +138,8 @@ KM_DECLARE_ASN1_RECORD(X509_CERT)
 [[nodiscard]] int32_t X509_NAME_add(X509_NAME* name, const ASN1_OID* attribute, byte_view value);
 
 // A new entry, empty and linked in; the list owns it. Null when out of memory.
-[[nodiscard]] X509_ATTR* X509_NAME_alloc_item(X509_NAME* name, trace_site at = trace_site::here());
-[[nodiscard]] X509_EXTENSION* X509_EXTENSIONS_alloc_item(X509_EXTENSIONS* extensions,
-                                                         trace_site at = trace_site::here());
+[[nodiscard]] X509_ATTR* X509_NAME_alloc_item(X509_NAME* name);
+[[nodiscard]] X509_EXTENSION* X509_EXTENSIONS_alloc_item(X509_EXTENSIONS* extensions);
 
 // The identifiers of RSA carry an explicit NULL (RFC 4055), those of EC keys their named curve.
 void X509_ALGOR_set_rsa(X509_ALGOR* algorithm, const ASN1_OID* id);

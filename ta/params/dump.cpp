@@ -4,32 +4,32 @@
 namespace keymaster {
 namespace {
 
-void dump_value(const keymaster_key_param_t& param, trace_site at) {
+void dump_value(const keymaster_key_param_t& param) {
   const uint32_t level = TEE_TRACE_DEBUG;
   switch (tag_class(param.tag)) {
     case KM_INVALID:
-      return trace(level, at, "    KM_INVALID");
+      return trace(level, "    KM_INVALID");
     case KM_ENUM:
     case KM_ENUM_REP:
-      return trace(level, at, "    KM_ENUM: %d", static_cast<int>(param.enumerated));
+      return trace(level, "    KM_ENUM: %d", static_cast<int>(param.enumerated));
     case KM_UINT:
     case KM_UINT_REP:
-      return trace(level, at, "    KM_UINT: 0x%08x", param.integer);
+      return trace(level, "    KM_UINT: 0x%08x", param.integer);
     case KM_ULONG:
     case KM_ULONG_REP:
-      return trace(level, at, "    KM_ULONG: 0x%016llx",
+      return trace(level, "    KM_ULONG: 0x%016llx",
                    static_cast<unsigned long long>(param.long_integer));
     case KM_DATE:
-      return trace(level, at, "    KM_DATE: 0x%016llx",
+      return trace(level, "    KM_DATE: 0x%016llx",
                    static_cast<unsigned long long>(param.date_time));
     case KM_BOOL:
-      return trace(level, at, "    KM_BOOL: %d", param.boolean);
+      return trace(level, "    KM_BOOL: %d", param.boolean);
     case KM_BIGNUM:
-      return trace(level, at, "    KM_BIGNUM, length %dB", static_cast<int>(param.data_length));
+      return trace(level, "    KM_BIGNUM, length %dB", static_cast<int>(param.data_length));
     case KM_BYTES:
-      return trace(level, at, "    KM_BYTES, length %dB", static_cast<int>(param.data_length));
+      return trace(level, "    KM_BYTES, length %dB", static_cast<int>(param.data_length));
     default:
-      return trace(level, at, "    Invalid tag type");
+      return trace(level, "    Invalid tag type");
   }
 }
 
@@ -37,11 +37,11 @@ void dump_value(const keymaster_key_param_t& param, trace_site at) {
 
 void _keymaster_dump_key_param_set(const char* file, int line,
                                    const keymaster_key_param_set_t& set) {
-  const trace_site at = trace_site::here();
-  trace(TEE_TRACE_DEBUG, at, "Dump at %s:%d", file, line);
+  const trace_scope scope;
+  trace(TEE_TRACE_DEBUG, "Dump at %s:%d", file, line);
   for (const keymaster_key_param_t& param : set) {
-    trace(TEE_TRACE_DEBUG, at, "Tag: 0x%08x", param.tag);
-    dump_value(param, at);
+    trace(TEE_TRACE_DEBUG, "Tag: 0x%08x", param.tag);
+    dump_value(param);
   }
 }
 

@@ -13,21 +13,21 @@ bool is_hidden(keymaster_tag_t tag) {
 
 // Reads one entry with its blob. The record that comes in may carry anything where the data pointer
 // stands; it is replaced before anyone can see it.
-TEE_Result read_entry(input_cursor* in, keymaster_key_param_t* entry, trace_site at) {
+TEE_Result read_entry(input_cursor* in, keymaster_key_param_t* entry) {
   keymaster_key_param_t record{};
   if (!in->read_into(object_bytes(record))) {
-    trace_error(at, "Too short input");
+    trace_error("Too short input");
     return TEE_ERROR_GENERIC;
   }
   if (has_blob(record.tag)) {
     byte_view bytes;
     heap_buffer data;
     if (!in->read_bytes(record.data_length, &bytes)) {
-      trace_error(at, "Too short input");
+      trace_error("Too short input");
       return TEE_ERROR_GENERIC;
     }
     if (!data.copy_of(bytes)) {
-      trace_error(at, "Out of memory, require %dB", static_cast<int>(record.data_length));
+      trace_error("Out of memory, require %dB", static_cast<int>(record.data_length));
       return TEE_ERROR_OUT_OF_MEMORY;
     }
     record.long_integer = 0;
@@ -39,40 +39,39 @@ TEE_Result read_entry(input_cursor* in, keymaster_key_param_t* entry, trace_site
 
 // Writes one entry with its blob. An address of this TA must not leave it: the value field of a
 // blob entry, which no reader interprets, goes out as zeros.
-TEE_Result write_entry(output_cursor* out, const keymaster_key_param_t& param, trace_site at) {
+TEE_Result write_entry(output_cursor* out, const keymaster_key_param_t& param) {
   keymaster_key_param_t record = param;
   const bool blob = has_blob(param.tag);
   if (blob) record.long_integer = 0;
   if (!out->write_bytes(object_bytes(std::as_const(record)))) {
-    trace_error(at, "Too short buffer");
+    trace_error("Too short buffer");
     return TEE_ERROR_GENERIC;
   }
   if (!blob) return TEE_SUCCESS;
   if (param.data == nullptr) {
-    trace_error(at, "Invalid keymaster_key_param_set_t");
+    trace_error("Invalid keymaster_key_param_set_t");
     return TEE_ERROR_BAD_PARAMETERS;
   }
   if (!out->write_bytes(param.blob())) {
-    trace_error(at, "Too short buffer");
+    trace_error("Too short buffer");
     return TEE_ERROR_GENERIC;
   }
   return TEE_SUCCESS;
 }
 
-TEE_Result write_set(const keymaster_key_param_set_t& set, bool include_all, byte_span buffer,
-                     trace_site at) {
+TEE_Result write_set(const keymaster_key_param_set_t& set, bool include_all, byte_span buffer) {
   uint32_t count = 0;
   for (const keymaster_key_param_t& param : set) {
     if (include_all || !is_hidden(param.tag)) count++;
   }
   output_cursor out(buffer);
   if (!out.write_u32(count)) {
-    trace_error(at, "Too short buffer");
+    trace_error("Too short buffer");
     return TEE_ERROR_GENERIC;
   }
   for (const keymaster_key_param_t& param : set) {
     if (!include_all && is_hidden(param.tag)) continue;
-    if (TEE_Result res = write_entry(&out, param, at)) return res;
+    if (TEE_Result res = write_entry(&out, param)) return res;
   }
   return TEE_SUCCESS;
 }
@@ -80,6 +79,7 @@ TEE_Result write_set(const keymaster_key_param_set_t& set, bool include_all, byt
 }  // namespace
 
 TEE_Result unmarshal(byte_view input, keymaster_key_param_set_t* set) {
+  const trace_scope scope;
   if (set == nullptr) return TEE_ERROR_SHORT_BUFFER;
   set->params = nullptr;
   set->length = 0;
@@ -98,7 +98,7 @@ TEE_Result unmarshal(byte_view input, keymaster_key_param_set_t* set) {
   auto* records = reinterpret_cast<keymaster_key_param_t*>(array.data());
   for (uint32_t i = 0; i < count; i++) {
     keymaster_key_param_t entry{};
-    if (TEE_Result res = read_entry(&in, &entry, trace_site::here())) {
+    if (TEE_Result res = read_entry(&in, &entry)) {
       free_param_entries(records, i);
       return res;
     }
@@ -122,6 +122,7 @@ uint32_t marshal_size(const keymaster_key_param_set_t& set, bool include_all) {
 
 TEE_Result marshal(const keymaster_key_param_set_t& set, bool include_all, uint8_t** buffer,
                    uint32_t* size) {
+  const trace_scope scope;
   uint8_t* given = std::exchange(*buffer, nullptr);
   const uint32_t capacity = std::exchange(*size, 0);
   const uint32_t need = marshal_size(set, include_all);
@@ -134,7 +135,7 @@ TEE_Result marshal(const keymaster_key_param_set_t& set, bool include_all, uint8
     return TEE_FAIL(TEE_ERROR_SHORT_BUFFER, "Too short marshalling buffer");
   }
   const byte_span to = given == nullptr ? own.span() : byte_span{given, need};
-  if (TEE_Result res = write_set(set, include_all, to, trace_site::here())) return res;
+  if (TEE_Result res = write_set(set, include_all, to)) return res;
   *buffer = given == nullptr ? own.release() : given;
   *size = need;
   return TEE_SUCCESS;

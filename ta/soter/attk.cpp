@@ -26,28 +26,27 @@ byte_view text_bytes(std::string_view text) {
 }
 
 // The public key in DER. No key that fits the room for its PEM text has a longer one.
-TEE_Result export_der(TEE_ObjectHandle key, uint32_t key_bits, size_t capacity, heap_buffer* der,
-                      trace_site at) {
+TEE_Result export_der(TEE_ObjectHandle key, uint32_t key_bits, size_t capacity, heap_buffer* der) {
   tee_operation operation;
   TEE_OperationHandle handle{};
   if (TEE_Result res =
           TEE_AllocateOperation(&handle, TEE_ALG_RSA_NOPAD, TEE_MODE_EXPORT, key_bits)) {
-    trace_error(at, "TEE_AllocateOperation failed: %08x\n", res);
+    trace_error("TEE_AllocateOperation failed: %08x\n", res);
     return res;
   }
   operation.reset(handle);
   if (TEE_Result res = TEE_SetOperationKey(operation.get(), key)) {
-    trace_error(at, "TEE_SetOperationKey failed: %08x\n", res);
+    trace_error("TEE_SetOperationKey failed: %08x\n", res);
     return res;
   }
   if (!der->allocate(capacity)) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   size_t length = capacity;
   if (TEE_Result res =
           TEE_AsymmetricExport(operation.get(), TEE_EXPORT_FORMAT_SPKI, der->data(), &length)) {
-    trace_error(at, "TEE_AsymmetricExport failed: %08x\n", res);
+    trace_error("TEE_AsymmetricExport failed: %08x\n", res);
     return res;
   }
   der->truncate(length);
@@ -57,6 +56,7 @@ TEE_Result export_der(TEE_ObjectHandle key, uint32_t key_bits, size_t capacity, 
 }  // namespace
 
 tee_object convert_key_to_object(const soter_key_pair_t& key_pair, uint32_t* key_bits) {
+  const trace_scope scope;
   *key_bits = ATTK_BITS;
   tee_object object;
   if (TEE_Result res =
@@ -84,10 +84,10 @@ tee_object convert_key_to_object(const soter_key_pair_t& key_pair, uint32_t* key
 
 TEE_Result export_rsa_public_key(TEE_ObjectHandle key, uint32_t key_bits, byte_span buffer,
                                  size_t* length) {
+  const trace_scope scope;
   *length = 0;
   heap_buffer der;
-  if (TEE_Result res =
-          export_der(key, key_bits, std::min(buffer.size(), MAX_DER), &der, trace_site::here())) {
+  if (TEE_Result res = export_der(key, key_bits, std::min(buffer.size(), MAX_DER), &der)) {
     return res;
   }
   heap_buffer base64;

@@ -24,27 +24,27 @@ TEE_Result create_counter(tee_object* object) {
                                     &zero, sizeof(zero), object->receive());
 }
 
-TEE_Result open_or_create_counter(tee_object* object, trace_site at) {
+TEE_Result open_or_create_counter(tee_object* object) {
   const TEE_Result res = open_counter(object);
   if (res != TEE_ERROR_ITEM_NOT_FOUND) return res;
-  trace(TEE_TRACE_INFO, at, "No counter object, we need create one\n");
+  trace(TEE_TRACE_INFO, "No counter object, we need create one\n");
   if (create_counter(object) != TEE_SUCCESS) {
     // Whoever else made it has done what is needed.
-    trace(TEE_TRACE_DEBUG, at, "retry to open counter object");
+    trace(TEE_TRACE_DEBUG, "retry to open counter object");
     return open_counter(object);
   }
-  trace(TEE_TRACE_INFO, at, "Create counter object success\n");
+  trace(TEE_TRACE_INFO, "Create counter object success\n");
   return TEE_SUCCESS;
 }
 
-TEE_Result read_counter(const tee_object& object, uint64_t* counter, trace_site at) {
+TEE_Result read_counter(const tee_object& object, uint64_t* counter) {
   // One byte more than expected, so that an object that is too long is seen.
   uint8_t data[sizeof(*counter) + 1];
   tee_size count = 0;
   if (TEE_Result res = TEE_ReadObjectData(object.get(), data, sizeof(data), &count)) return res;
   if (count != sizeof(*counter)) {
-    trace_error(at, "counter object is not %d bytes, %d bytes\n",
-                static_cast<int>(sizeof(*counter)), static_cast<int>(count));
+    trace_error("counter object is not %d bytes, %d bytes\n", static_cast<int>(sizeof(*counter)),
+                static_cast<int>(count));
     return TEE_ERROR_BAD_STATE;
   }
   copy_bytes(object_bytes(*counter), byte_view(data).first(sizeof(*counter)));
@@ -52,13 +52,13 @@ TEE_Result read_counter(const tee_object& object, uint64_t* counter, trace_site 
 }
 
 // One write, which the platform does whole or not at all.
-TEE_Result write_counter(const tee_object& object, uint64_t counter, trace_site at) {
+TEE_Result write_counter(const tee_object& object, uint64_t counter) {
   if (TEE_Result res = TEE_SeekObjectData(object.get(), 0, TEE_DATA_SEEK_SET)) {
-    trace_error(at, "seek pos to the beginning error\n");
+    trace_error("seek pos to the beginning error\n");
     return res;
   }
   if (TEE_Result res = TEE_WriteObjectData(object.get(), &counter, sizeof(counter))) {
-    trace_error(at, "write object error\n");
+    trace_error("write object error\n");
     return res;
   }
   return TEE_SUCCESS;
@@ -67,14 +67,14 @@ TEE_Result write_counter(const tee_object& object, uint64_t counter, trace_site 
 }  // namespace
 
 TEE_Result increase_and_get_counter(uint64_t* counter) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   *counter = 0;
   tee_object object;
   uint64_t value = 0;
-  if (TEE_Result res = open_or_create_counter(&object, at)) return res;
-  if (TEE_Result res = read_counter(object, &value, at)) return res;
+  if (TEE_Result res = open_or_create_counter(&object)) return res;
+  if (TEE_Result res = read_counter(object, &value)) return res;
   value++;
-  if (TEE_Result res = write_counter(object, value, at)) return res;
+  if (TEE_Result res = write_counter(object, value)) return res;
   *counter = value;
   return TEE_SUCCESS;
 }

@@ -15,54 +15,54 @@ namespace keymaster {
 namespace {
 
 // Whether setting a member went well.
-bool is_set(int error, const char* member, trace_site at) {
-  if (error != 0) trace_error(at, "set %s error %d\n", member, error);
+bool is_set(int error, const char* member) {
+  if (error != 0) trace_error("set %s error %d\n", member, error);
   return error == 0;
 }
 
-bool make_root(json_value* root, trace_site at) {
+bool make_root(json_value* root) {
   if (root->make_object()) return true;
-  trace_error(at, "json error root_value %p root_object %p\n", static_cast<const void*>(root),
+  trace_error("json error root_value %p root_object %p\n", static_cast<const void*>(root),
               static_cast<const void*>(root->object()));
   return false;
 }
 
-bool serialize(const json_value& root, heap_buffer* document, trace_site at) {
+bool serialize(const json_value& root, heap_buffer* document) {
   if (json_serialize(root, document)) return true;
-  trace_error(at, "json serialization error\n");
+  trace_error("json serialization error\n");
   return false;
 }
 
-bool is_text(byte_view raw, trace_site at) {
+bool is_text(byte_view raw) {
   const auto length = static_cast<size_t>(std::ranges::find(raw, 0) - raw.begin());
   if (length == raw.size() && is_valid_utf8(raw)) return true;
-  trace_error(at, "Not a valid utf8 string, strlen(raw) %d length %d", static_cast<int>(length),
+  trace_error("Not a valid utf8 string, strlen(raw) %d length %d", static_cast<int>(length),
               static_cast<int>(raw.size()));
   return false;
 }
 
 // A document without the finger is one that the server may still accept.
-bool set_finger(json_list* members, trace_site at) {
+bool set_finger(json_list* members) {
   uint32_t fid = 0;
   if (TEE_Result res = get_fid(&fid)) {
-    trace_error(at, "get finger id error %x, continue without fid\n", res);
+    trace_error("get finger id error %x, continue without fid\n", res);
     return true;
   }
-  return is_set(json_set_number(members, "fid", fid), "finger id", at);
+  return is_set(json_set_number(members, "fid", fid), "finger id");
 }
 
-TEE_Result set_counter(json_list* members, trace_site at) {
+TEE_Result set_counter(json_list* members) {
   uint64_t counter = 0;
   if (TEE_Result res = increase_and_get_counter(&counter)) {
-    trace_error(at, "increase counter error %x\n", res);
+    trace_error("increase counter error %x\n", res);
     return res;
   }
   const int error = json_set_number(members, "counter", static_cast<double>(counter));
-  return is_set(error, "counter", at) ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
+  return is_set(error, "counter") ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
 }
 
 // The versions may be missing: intended, a document goes on without them.
-bool set_device(json_list* members, trace_site at) {
+bool set_device(json_list* members) {
   const soter_prop_set_t& device = soter_prop_set();
   const struct {
     const char* member;
@@ -77,7 +77,7 @@ bool set_device(json_list* members, trace_site at) {
       {"cpu_id", device.cpu_id.view(), "cpu id", false},
   };
   return std::ranges::all_of(rows, [&](const auto& row) {
-    return is_set(json_set_string(members, row.member, row.text), row.name, at) || row.may_miss;
+    return is_set(json_set_string(members, row.member, row.text), row.name) || row.may_miss;
   });
 }
 
@@ -88,68 +88,68 @@ size_t pem_capacity(uint32_t key_bits) {
   return std::max(USUAL, size_t{key_bits} / 8 * 4);
 }
 
-TEE_Result set_public_key(json_list* members, byte_view key_material, trace_site at) {
+TEE_Result set_public_key(json_list* members, byte_view key_material) {
   uint32_t key_bits = 0;
   const tee_object key = resolve_key_from_data(key_material, &key_bits);
   if (!key) {
-    trace_error(at, "resolve key from data stream error\n");
+    trace_error("resolve key from data stream error\n");
     return TEE_ERROR_BAD_FORMAT;
   }
   heap_buffer pem;
   if (!pem.allocate(pem_capacity(key_bits))) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   size_t length = 0;
   if (TEE_Result res = export_rsa_public_key(key.get(), key_bits, pem.span(), &length)) {
-    trace_error(at, "export public key error\n");
+    trace_error("export public key error\n");
     return res;
   }
   const int error = json_set_string(members, "pub_key", pem.view().first(length));
-  return is_set(error, "publickey", at) ? TEE_SUCCESS : TEE_ERROR_BAD_STATE;
+  return is_set(error, "publickey") ? TEE_SUCCESS : TEE_ERROR_BAD_STATE;
 }
 
 }  // namespace
 
 bool produce_soter_sign_json(uint64_t uid, byte_view raw, heap_buffer* document) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   document->reset();
   if (soter_check_init() != TEE_SUCCESS) {
     TRACE_ERROR("soter is not ready\n");
     return false;
   }
   json_value root;
-  if (!make_root(&root, at) || !is_text(raw, at)) return false;
+  if (!make_root(&root) || !is_text(raw)) return false;
   json_list* members = root.object();
-  if (!is_set(json_set_string(members, "raw", raw), "raw message", at) ||
-      !set_finger(members, at) || set_counter(members, at) != TEE_SUCCESS ||
-      !is_set(json_set_number(members, "uid", static_cast<double>(uid)), "uid", at) ||
-      !set_device(members, at) || !serialize(root, document, at)) {
+  if (!is_set(json_set_string(members, "raw", raw), "raw message") || !set_finger(members) ||
+      set_counter(members) != TEE_SUCCESS ||
+      !is_set(json_set_number(members, "uid", static_cast<double>(uid)), "uid") ||
+      !set_device(members) || !serialize(root, document)) {
     return false;
   }
-  TRACE_DEBUG("%s success", at.function);
+  TRACE_DEBUG("%s success", trace_scope::current());
   return true;
 }
 
 TEE_Result produce_soter_export_json(const keymaster_key_param_set_t& key_params,
-                                     byte_view key_material, heap_buffer* document, trace_site at) {
+                                     byte_view key_material, heap_buffer* document) {
   document->reset();
   json_value root;
-  if (!make_root(&root, at)) return TEE_ERROR_OUT_OF_MEMORY;
+  if (!make_root(&root)) return TEE_ERROR_OUT_OF_MEMORY;
   json_list* members = root.object();
   if (contains_tag(key_params, KM_TAG_SOTER_COUNTER)) {
-    trace(TEE_TRACE_DEBUG, at, "This key need increase the counter");
-    if (TEE_Result res = set_counter(members, at)) return res;
+    trace(TEE_TRACE_DEBUG, "This key need increase the counter");
+    if (TEE_Result res = set_counter(members)) return res;
   }
   if (const auto* uid = get_unique(key_params, KM_TAG_SOTER_UID)) {
-    trace(TEE_TRACE_DEBUG, at, "soter key has uid\n");
+    trace(TEE_TRACE_DEBUG, "soter key has uid\n");
     if (int error = json_set_number(members, "uid", uid->integer)) {
-      trace_error(at, "set number error %x\n", static_cast<unsigned>(error));
+      trace_error("set number error %x\n", static_cast<unsigned>(error));
       return TEE_ERROR_OUT_OF_MEMORY;
     }
   }
-  if (TEE_Result res = set_public_key(members, key_material, at)) return res;
-  return serialize(root, document, at) ? TEE_SUCCESS : TEE_ERROR_BAD_STATE;
+  if (TEE_Result res = set_public_key(members, key_material)) return res;
+  return serialize(root, document) ? TEE_SUCCESS : TEE_ERROR_BAD_STATE;
 }
 
 }  // namespace keymaster

@@ -20,7 +20,6 @@ namespace keymaster {
 // key material; TEE_ERROR_BAD_STATE: the text could not be made; TEE_ERROR_OUT_OF_MEMORY; a code of
 // the counter or of the platform. The counter stays raised whatever fails after it.
 [[nodiscard]] TEE_Result produce_soter_export_json(const keymaster_key_param_set_t& key_params,
-                                                   byte_view key_material, heap_buffer* document,
-                                                   trace_site at = trace_site::here());
+                                                   byte_view key_material, heap_buffer* document);
 
 }  // namespace keymaster

@@ -13,6 +13,7 @@ namespace {
 
 // The key of a blob; none unless it opens and holds an RSA key. Nothing else of the blob counts.
 tee_object retrieve_key_from_pobj(byte_view blob, uint32_t* key_bits) {
+  const trace_scope scope;
   heap_buffer material;
   keymaster_key_param_set_t characteristics;
   keymaster_error_t km_error = KM_ERROR_OK;
@@ -30,36 +31,36 @@ tee_object retrieve_key_from_pobj(byte_view blob, uint32_t* key_bits) {
 }
 
 // The blob of the signing key; empty when there is none.
-byte_view sign_key_blob(const keymaster_key_param_set_t& key_params, trace_site at) {
+byte_view sign_key_blob(const keymaster_key_param_set_t& key_params) {
   const byte_view blob = unique_blob(key_params, KM_TAG_SOTER_SIGN_KEY_BLOB);
   if (!blob.empty()) {
-    trace(TEE_TRACE_DEBUG, at, "use key blob argument to retrieve sign key\n");
+    trace(TEE_TRACE_DEBUG, "use key blob argument to retrieve sign key\n");
     return blob;
   }
   const byte_view name = unique_blob(key_params, KM_TAG_SOTER_SIGN_KEY_NAME);
   if (!name.empty()) {
-    trace(TEE_TRACE_DEBUG, at, "use key name argument as key blob to retrieve sign key\n");
+    trace(TEE_TRACE_DEBUG, "use key name argument as key blob to retrieve sign key\n");
   }
   return name;
 }
 
 // Leaves *key empty when whoever is to sign has no key that the platform takes.
 TEE_Result choose_sign_key(const keymaster_key_param_set_t& key_params, tee_object* key,
-                           uint32_t* key_bits, trace_site at) {
+                           uint32_t* key_bits) {
   if (contains_tag(key_params, KM_TAG_SOTER_ATTK_SIGNS)) {
-    trace(TEE_TRACE_DEBUG, at, "soter use attkey sign\n");
+    trace(TEE_TRACE_DEBUG, "soter use attkey sign\n");
     if (TEE_Result res = soter_check_init()) {
-      trace_error(at, "soter is not ready\n");
+      trace_error("soter is not ready\n");
       return res;
     }
     *key = convert_key_to_object(soter_key_pair(), key_bits);
     return TEE_SUCCESS;
   }
   if (!contains_tag(key_params, KM_TAG_SOTER_KEY_SIGNS)) return TEE_ERROR_BAD_PARAMETERS;
-  trace(TEE_TRACE_DEBUG, at, "soter use normal key sign\n");
-  const byte_view blob = sign_key_blob(key_params, at);
+  trace(TEE_TRACE_DEBUG, "soter use normal key sign\n");
+  const byte_view blob = sign_key_blob(key_params);
   if (blob.empty()) {
-    trace_error(at, "no sign key with key blob\n");
+    trace_error("no sign key with key blob\n");
     return TEE_ERROR_ITEM_NOT_FOUND;
   }
   *key = retrieve_key_from_pobj(blob, key_bits);
@@ -70,15 +71,15 @@ TEE_Result choose_sign_key(const keymaster_key_param_set_t& key_params, tee_obje
 
 TEE_Result soter_enhance_export_key(const keymaster_key_param_set_t& key_params,
                                     byte_view key_material, byte_span output, size_t* length) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   *length = 0;
   heap_buffer document;
-  if (TEE_Result res = produce_soter_export_json(key_params, key_material, &document, at)) {
+  if (TEE_Result res = produce_soter_export_json(key_params, key_material, &document)) {
     return res;
   }
   tee_object key;
   uint32_t key_bits = 0;
-  if (TEE_Result res = choose_sign_key(key_params, &key, &key_bits, at)) return res;
+  if (TEE_Result res = choose_sign_key(key_params, &key, &key_bits)) return res;
   if (!key) return TEE_FAIL(TEE_ERROR_BAD_STATE, "Sign key is null\n");
   heap_buffer signature;
   if (TEE_Result res = digest_and_sign(key.get(), key_bits, document.view(), &signature)) {

@@ -32,6 +32,7 @@ TEE_Result get_client_property(TEE_Identity* identity) {
 }
 
 TEE_Result is_from_fp_ta() {
+  const trace_scope scope;
   TEE_Identity client;
   if (TEE_Result res = get_client_property(&client)) {
     return TEE_FAIL(res, "get client property error, 0x%x\n", res);
@@ -42,9 +43,9 @@ TEE_Result is_from_fp_ta() {
   return is_fingerprint_ta ? TEE_SUCCESS : TEE_ERROR_ACCESS_DENIED;
 }
 
-TEE_Result take_notification(byte_view notification, trace_site at) {
+TEE_Result take_notification(byte_view notification) {
   if (notification.size() != NOTIFICATION_SIZE) {
-    trace_error(at, "finger print ta input argument error");
+    trace_error("finger print ta input argument error");
     return TEE_ERROR_BAD_PARAMETERS;
   }
   input_cursor in(notification);
@@ -54,7 +55,7 @@ TEE_Result take_notification(byte_view notification, trace_site at) {
     return TEE_ERROR_BAD_PARAMETERS;
   }
   if (version != NOTIFICATION_VERSION) {
-    trace_error(at, "finger print ta input argument version mismatch expected %u actual %u\n",
+    trace_error("finger print ta input argument version mismatch expected %u actual %u\n",
                 NOTIFICATION_VERSION, version);
     return TEE_ERROR_BAD_FORMAT;
   }

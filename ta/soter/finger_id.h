@@ -4,7 +4,7 @@
 #include "tee_internal_api.h"
 
 #include "ta/base/bytes.h"
-#include "ta/base/trace.h"
+#include "ta/base/results.h"
 
 namespace keymaster {
 
@@ -19,8 +19,7 @@ namespace keymaster {
 // which must be 0; 4 u32 fid, the matched fingerprint's identifier; 8 u64 time of the match in ms
 // of TEE system time. TEE_ERROR_BAD_PARAMETERS: another length. TEE_ERROR_BAD_FORMAT: another
 // version; nothing is stored.
-[[nodiscard]] TEE_Result take_notification(byte_view notification,
-                                           trace_site at = trace_site::here());
+[[nodiscard]] TEE_Result take_notification(byte_view notification);
 
 // SOTER's own code: no fresh fingerprint.
 constexpr TEE_Result SOTER_ERROR_STALE_FID = 0xFFFF3001;

@@ -1,7 +1,7 @@
 // A list of byte strings under 16-bit keys.
 #include "ta/soter/key_list.h"
 
-#include "ta/base/trace.h"
+#include "ta/base/results.h"
 
 namespace keymaster {
 
@@ -14,6 +14,7 @@ key_list::~key_list() {
 }
 
 bool key_list::add(uint16_t key, heap_buffer&& value) {
+  const trace_scope scope;
   if (find(key) != nullptr) return false;
   auto* added = heap_new<item>();
   if (added == nullptr) {

@@ -43,6 +43,7 @@ soter_data_t* loaded;
 
 // Fills one value of the key.
 TEE_Result init_vlb_with_tag(heap_buffer* field, const tlv_box& box, uint16_t tag) {
+  const trace_scope scope;
   byte_view value;
   if (tlv_box_get_bytes_ptr(box, tag, &value) != 0) {
     return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "Get length error for %x\n", tag);
@@ -60,6 +61,7 @@ TEE_Result init_vlb_with_tag(heap_buffer* field, const tlv_box& box, uint16_t ta
 }
 
 TEE_Result parse_buf_fill_key(soter_key_pair_t* key, byte_view serialized) {
+  const trace_scope scope;
   const heap_ptr<tlv_box> box = tlv_box_parse(serialized);
   if (!box) return TEE_ERROR_OUT_OF_MEMORY;
   const struct {
@@ -82,6 +84,7 @@ TEE_Result parse_buf_fill_key(soter_key_pair_t* key, byte_view serialized) {
 }
 
 TEE_Result load_key(soter_key_pair_t* key) {
+  const trace_scope scope;
   heap_buffer serialized;
   if (!serialized.allocate(KEY_BOX_CAPACITY)) {
     return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "No memory for serialization\n");
@@ -93,10 +96,10 @@ TEE_Result load_key(soter_key_pair_t* key) {
   return parse_buf_fill_key(key, serialized.view().first(used));
 }
 
-TEE_Result retrieve_soter_property(heap_ptr<tlv_box>* box, trace_site at) {
+TEE_Result retrieve_soter_property(heap_ptr<tlv_box>* box) {
   heap_buffer serialized;
   if (!serialized.allocate(PROPERTY_CAPACITY)) {
-    trace(TEE_TRACE_DEBUG, at, "No memory for buf");
+    trace(TEE_TRACE_DEBUG, "No memory for buf");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   size_t length = serialized.size();
@@ -106,11 +109,12 @@ TEE_Result retrieve_soter_property(heap_ptr<tlv_box>* box, trace_site at) {
   }
   *box = tlv_box_parse(serialized.view().first(length));
   if (*box) return TEE_SUCCESS;
-  trace(TEE_TRACE_DEBUG, at, "parse property tlv box error");
+  trace(TEE_TRACE_DEBUG, "parse property tlv box error");
   return TEE_ERROR_GENERIC;
 }
 
 TEE_Result init_prop_with_tag(heap_buffer* field, const tlv_box& box, uint16_t tag) {
+  const trace_scope scope;
   byte_view value;
   if (tlv_box_get_bytes_ptr(box, tag, &value) != 0) {
     TRACE_DEBUG("tlv_box_get_bytes_ptr error for tag 0x%x\n", tag);
@@ -122,15 +126,15 @@ TEE_Result init_prop_with_tag(heap_buffer* field, const tlv_box& box, uint16_t t
   return TEE_ERROR_OUT_OF_MEMORY;
 }
 
-TEE_Result init_fp_uuid(soter_prop_set_t* props, const tlv_box& box, trace_site at) {
+TEE_Result init_fp_uuid(soter_prop_set_t* props, const tlv_box& box) {
   byte_view uuid;
   if (tlv_box_get_bytes_ptr(box, TAG_FP_UUID, &uuid) != 0) {
-    trace(TEE_TRACE_DEBUG, at, "get fp uuid bytes ptr error");
+    trace(TEE_TRACE_DEBUG, "get fp uuid bytes ptr error");
     return TEE_ERROR_GENERIC;
   }
   if (uuid.size() != sizeof(props->fp_uuid)) {
-    trace(TEE_TRACE_DEBUG, at, "fp_uuid length unmatch expect %zu actual %d\n",
-          sizeof(props->fp_uuid), static_cast<int>(uuid.size()));
+    trace(TEE_TRACE_DEBUG, "fp_uuid length unmatch expect %zu actual %d\n", sizeof(props->fp_uuid),
+          static_cast<int>(uuid.size()));
     return TEE_ERROR_GENERIC;
   }
   copy_bytes(props->fp_uuid, uuid);
@@ -138,6 +142,7 @@ TEE_Result init_fp_uuid(soter_prop_set_t* props, const tlv_box& box, trace_site 
 }
 
 TEE_Result init_soter_cpuid(soter_prop_set_t* props) {
+  const trace_scope scope;
   if (!props->cpu_id.allocate(CPU_ID_CAPACITY)) {
     TRACE_DEBUG("No memory for cpu_id");
     return TEE_ERROR_OUT_OF_MEMORY;
@@ -154,45 +159,48 @@ TEE_Result init_soter_cpuid(soter_prop_set_t* props) {
 }
 
 // Reads a text property of the TEE; `what` names the field in messages.
-TEE_Result get_tee_property(heap_buffer* field, const char* property, const char* what,
-                            trace_site at) {
+TEE_Result get_tee_property(heap_buffer* field, const char* property, const char* what) {
   if (!field->allocate(TEE_TEXT_CAPACITY)) {
-    trace(TEE_TRACE_DEBUG, at, "No memory for %s", what);
+    trace(TEE_TRACE_DEBUG, "No memory for %s", what);
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   auto* text = reinterpret_cast<char*>(field->data());
   auto size = static_cast<tee_size>(TEE_TEXT_CAPACITY);
   if (TEE_Result res =
           TEE_GetPropertyAsString(TEE_PROPSET_TEE_IMPLEMENTATION, property, text, &size)) {
-    TRACE_DEBUG("get client id property error, 0x%x\n", res);
-    trace(TEE_TRACE_DEBUG, at, "get_tee_property os manufacturer error 0x%x\n", res);
+    {
+      const trace_scope scope;
+      TRACE_DEBUG("get client id property error, 0x%x\n", res);
+    }
+    trace(TEE_TRACE_DEBUG, "get_tee_property os manufacturer error 0x%x\n", res);
     return res;
   }
   field->truncate(size == 0 ? 0 : size - 1);  // it counts the terminating zero
   return TEE_SUCCESS;
 }
 
-TEE_Result load_properties(soter_prop_set_t* props, trace_site at) {
+TEE_Result load_properties(soter_prop_set_t* props) {
   heap_ptr<tlv_box> box;
-  if (TEE_Result res = retrieve_soter_property(&box, at)) return res;
+  if (TEE_Result res = retrieve_soter_property(&box)) return res;
   if (TEE_Result res = init_prop_with_tag(&props->fp_name, *box, TAG_FP_NAME)) return res;
   if (TEE_Result res = init_prop_with_tag(&props->fp_version, *box, TAG_FP_VERSION)) return res;
-  if (TEE_Result res = init_fp_uuid(props, *box, at)) return res;
+  if (TEE_Result res = init_fp_uuid(props, *box)) return res;
   if (TEE_Result res = init_soter_cpuid(props)) {
-    trace(TEE_TRACE_DEBUG, at, "init soter cpuid error 0x%x\n", res);
+    trace(TEE_TRACE_DEBUG, "init soter cpuid error 0x%x\n", res);
     return res;
   }
   if (TEE_Result res =
-          get_tee_property(&props->tee_name, "gpd.tee.trustedos.manufacturer", "tee_name", at)) {
+          get_tee_property(&props->tee_name, "gpd.tee.trustedos.manufacturer", "tee_name")) {
     return res;
   }
   return get_tee_property(&props->tee_version, "gpd.tee.trustedos.implementation.version",
-                          "tee_version", at);
+                          "tee_version");
 }
 
 }  // namespace
 
 TEE_Result init_soter_key(soter_key_pair_t* key) {
+  const trace_scope scope;
   *key = {};
   const TEE_Result res = load_key(key);
   TRACE_DEBUG("Init Soter key pair %s\n", res == TEE_SUCCESS ? "success" : "fail");
@@ -200,8 +208,9 @@ TEE_Result init_soter_key(soter_key_pair_t* key) {
 }
 
 TEE_Result init_soter_prop_set(soter_prop_set_t* props) {
+  const trace_scope scope;
   *props = {};
-  const TEE_Result res = load_properties(props, trace_site::here());
+  const TEE_Result res = load_properties(props);
   if (res == TEE_SUCCESS) {
     TRACE_DEBUG("Init soter data success\n");
   } else {
@@ -212,6 +221,7 @@ TEE_Result init_soter_prop_set(soter_prop_set_t* props) {
 }
 
 TEE_Result soter_init() {
+  const trace_scope scope;
   heap_ptr<soter_data_t> data(heap_new<soter_data_t>());
   if (!data) return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   if (TEE_Result res = init_soter_key(&data->key_pair)) return res;

@@ -19,11 +19,10 @@ constexpr size_t USUAL_SIGNATURE = 256;  // of a 2048-bit key
 
 // An operation without a hash is a raw private-key one, which cannot sign a digest: the platform
 // must not even be asked. Intended: such keys fail here, after the counter has moved.
-TEE_Result refuse_undigested(const rsa_sign_operation_t& operation, byte_view document,
-                             trace_site at) {
+TEE_Result refuse_undigested(const rsa_sign_operation_t& operation, byte_view document) {
   const TEE_Result res =
       document.size() > operation.key_size() ? TEE_ERROR_OUT_OF_MEMORY : TEE_ERROR_BAD_STATE;
-  trace_error(at, "AsymmetricSignDigest failed with 0x%08x\n", res);
+  trace_error("AsymmetricSignDigest failed with 0x%08x\n", res);
   return res;
 }
 
@@ -40,11 +39,11 @@ bool write_signed_document(byte_view document, byte_view signature, byte_span ro
 
 TEE_Result soter_do_sign_finish(rsa_sign_operation_t* operation, byte_view document,
                                 heap_buffer* signature) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   message_t& message = operation->message;
-  if (!message.is_hashed()) return refuse_undigested(*operation, document, at);
+  if (!message.is_hashed()) return refuse_undigested(*operation, document);
   if (TEE_Result res =
-          message.hash.digest_final(document, message.buffer.span(), &message.length, at)) {
+          message.hash.digest_final(document, message.buffer.span(), &message.length)) {
     return res;
   }
   heap_buffer made;
@@ -54,7 +53,7 @@ TEE_Result soter_do_sign_finish(rsa_sign_operation_t* operation, byte_view docum
   // The longest salt, whatever the digest: unlike other keys' signatures, intended.
   const TEE_Attribute salt = value_attribute(TEE_ATTR_RSA_PSS_SALT_LENGTH, TEE_PSS_SALT_MAX_LENGTH);
   const size_t count = operation->padding == KM_PAD_RSA_PSS ? 1 : 0;
-  if (TEE_Result res = sign_digest(operation->main, {&salt, count}, message.data(), &made, at)) {
+  if (TEE_Result res = sign_digest(operation->main, {&salt, count}, message.data(), &made)) {
     return res;
   }
   *signature = std::move(made);
@@ -62,6 +61,7 @@ TEE_Result soter_do_sign_finish(rsa_sign_operation_t* operation, byte_view docum
 }
 
 TEE_Result do_digest_with_sha(byte_view data, byte_span digest) {
+  const trace_scope scope;
   tee_operation sha;
   if (TEE_Result res = sha.allocate(TEE_ALG_SHA256, TEE_MODE_DIGEST, 0)) return res;
   size_t length = 0;
@@ -70,6 +70,7 @@ TEE_Result do_digest_with_sha(byte_view data, byte_span digest) {
 
 TEE_Result do_sign_with_rsa(TEE_ObjectHandle key, uint32_t key_bits, byte_view digest,
                             heap_buffer* signature) {
+  const trace_scope scope;
   tee_operation rsa;
   if (TEE_Result res = rsa.allocate(TEE_ALG_RSASSA_PKCS1_V1_5_SHA256, TEE_MODE_SIGN, key_bits)) {
     return res;
@@ -79,7 +80,7 @@ TEE_Result do_sign_with_rsa(TEE_ObjectHandle key, uint32_t key_bits, byte_view d
   if (!made.allocate(std::max(USUAL_SIGNATURE, size_t{key_bits} / 8))) {
     return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   }
-  if (TEE_Result res = sign_digest(rsa, {}, digest, &made, trace_site::here())) return res;
+  if (TEE_Result res = sign_digest(rsa, {}, digest, &made)) return res;
   *signature = std::move(made);
   return TEE_SUCCESS;
 }
@@ -98,6 +99,7 @@ TEE_Result soter_check_resources() {
 TEE_Result soter_enhance_sign_finish(rsa_sign_operation_t* operation,
                                      const keymaster_key_param_set_t& key_params, byte_view message,
                                      heap_buffer* output) {
+  const trace_scope scope;
   uint64_t uid = 0;
   if (const auto* given = get_unique(key_params, KM_TAG_SOTER_UID)) {
     TRACE_DEBUG("soter key has uid\n");

@@ -3,26 +3,28 @@
 
 #include <cstring>
 
-#include "ta/base/trace.h"
+#include "ta/base/results.h"
 
 namespace keymaster {
 namespace {
 
 constexpr size_t ITEM_HEADER = 4;
 
-void trace_out_of_memory(size_t size, trace_site at = trace_site::here()) {
-  trace_error(at, "Out of memory, need %dB", static_cast<int>(size));
+void trace_out_of_memory(size_t size) {
+  trace_error("Out of memory, need %dB", static_cast<int>(size));
 }
 
 }  // namespace
 
 heap_ptr<tlv_box> tlv_box_create() {
+  const trace_scope scope;
   heap_ptr<tlv_box> box(heap_new<tlv_box>());
   if (!box) trace_out_of_memory(sizeof(tlv_box));
   return box;
 }
 
 heap_ptr<tlv_box> tlv_box_parse(byte_view buffer) {
+  const trace_scope scope;
   heap_ptr<tlv_box> box = tlv_box_create();
   if (!box) return {};
   heap_buffer copy;
@@ -44,6 +46,7 @@ heap_ptr<tlv_box> tlv_box_parse(byte_view buffer) {
 }
 
 int tlv_box_serialize(tlv_box* box) {
+  const trace_scope scope;
   if (box->is_closed()) return -1;
   heap_buffer serialized;
   if (!serialized.allocate(box->length)) {
@@ -70,6 +73,7 @@ size_t tlv_box_get_size(const tlv_box& box) {
 }
 
 int tlv_box_putobject(tlv_box* box, uint16_t tag, byte_view value) {
+  const trace_scope scope;
   if (box->is_closed() || box->items.get(tag) != nullptr || value.size() > UINT16_MAX) return -1;
   heap_buffer copy;
   if (!copy.copy_of(value)) {

@@ -3,7 +3,7 @@
 #pragma once
 
 #include "ta/base/heap.h"
-#include "ta/base/trace.h"
+#include "ta/base/results.h"
 #include "ta/params/param_set.h"
 
 namespace keymaster {
@@ -13,6 +13,6 @@ namespace keymaster {
 // unmarshal. TEE_ERROR_GENERIC: a length passes the end. On failure *plaintext is as it was.
 [[nodiscard]] TEE_Result parse_plaintext(heap_buffer* plaintext, keymaster_error_t unreadable_set,
                                          keymaster_key_param_set_t* characteristics,
-                                         keymaster_error_t* km_error, trace_site at);
+                                         keymaster_error_t* km_error);
 
 }  // namespace keymaster

@@ -23,43 +23,41 @@ constexpr size_t HEADER_SIZE = TAG_OFFSET + TAG_SIZE;
 static_assert(HEADER_SIZE == 93);
 
 // The cipher of a blob: AES-256-GCM under the key that `ksk` and the blob's salt give.
-TEE_Result start_gcm(byte_view header, TEE_ObjectHandle ksk, uint32_t mode, tee_operation* gcm,
-                     trace_site at) {
+TEE_Result start_gcm(byte_view header, TEE_ObjectHandle ksk, uint32_t mode, tee_operation* gcm) {
   tee_object kk;
   if (TEE_Result res = TEE_DeriveKK(ksk, header.subspan(SALT_OFFSET, SALT_SIZE), &kk)) {
-    trace_error(at, "DeriveKK failed with 0x%08x\n", res);
+    trace_error("DeriveKK failed with 0x%08x\n", res);
     return res;
   }
-  if (TEE_Result res = gcm->allocate(TEE_ALG_AES_GCM, mode, KK_BITS, at)) return res;
-  if (TEE_Result res = gcm->set_key(kk.get(), at)) return res;
-  return gcm->ae_init(header.subspan(NONCE_OFFSET, NONCE_SIZE), TAG_SIZE * 8, at);
+  if (TEE_Result res = gcm->allocate(TEE_ALG_AES_GCM, mode, KK_BITS)) return res;
+  if (TEE_Result res = gcm->set_key(kk.get())) return res;
+  return gcm->ae_init(header.subspan(NONCE_OFFSET, NONCE_SIZE), TAG_SIZE * 8);
 }
 
 // Encrypts the pieces of the plaintext one behind the other into `ciphertext`.
 TEE_Result encrypt_pieces(tee_operation* gcm, std::span<const byte_view> pieces,
-                          output_cursor* ciphertext, trace_site at) {
+                          output_cursor* ciphertext) {
   for (const byte_view piece : pieces) {
     size_t produced = 0;
     byte_span room;
-    if (TEE_Result res = gcm->ae_update(piece, ciphertext->rest(), &produced, at)) return res;
+    if (TEE_Result res = gcm->ae_update(piece, ciphertext->rest(), &produced)) return res;
     if (!ciphertext->reserve(produced, &room)) return TEE_ERROR_GENERIC;
   }
   return TEE_SUCCESS;
 }
 
-TEE_Result finish_encryption(tee_operation* gcm, byte_span tag, output_cursor* ciphertext,
-                             trace_site at) {
+TEE_Result finish_encryption(tee_operation* gcm, byte_span tag, output_cursor* ciphertext) {
   const byte_span last = ciphertext->rest();
   tee_size last_size = static_cast<tee_size>(last.size());
   tee_size tag_size = static_cast<tee_size>(tag.size());
   if (TEE_Result res = TEE_AEEncryptFinal(gcm->get(), nullptr, 0, last.data(), &last_size,
                                           tag.data(), &tag_size)) {
-    trace_error(at, "AEEncryptFinal failed with 0x%08x\n", res);
+    trace_error("AEEncryptFinal failed with 0x%08x\n", res);
     return res;
   }
   if (tag_size != TAG_SIZE) {
     // The second number is the final call's output, not the tag's size: intended.
-    trace_error(at, "Wrong tag size, expect %dB, got %dB", static_cast<int>(TAG_SIZE),
+    trace_error("Wrong tag size, expect %dB, got %dB", static_cast<int>(TAG_SIZE),
                 static_cast<int>(last_size));
     return TEE_ERROR_GENERIC;
   }
@@ -68,7 +66,7 @@ TEE_Result finish_encryption(tee_operation* gcm, byte_span tag, output_cursor* c
 }
 
 // Fills a blob of exactly the right size, in TA memory.
-TEE_Result seal(byte_view key, byte_view characteristics, byte_span blob, trace_site at) {
+TEE_Result seal(byte_view key, byte_view characteristics, byte_span blob) {
   const byte_span salt = blob.subspan(SALT_OFFSET, SALT_SIZE);
   const byte_span nonce = blob.subspan(NONCE_OFFSET, NONCE_SIZE);
   TEE_GenerateRandom(salt.data(), static_cast<tee_size>(salt.size()));
@@ -77,8 +75,7 @@ TEE_Result seal(byte_view key, byte_view characteristics, byte_span blob, trace_
   blob[0] = rpmb ? PROTECTED_BY_RPMB_KSK : PROTECTED_BY_DERIVED_KSK;
 
   tee_operation gcm;
-  if (TEE_Result res =
-          start_gcm(blob, rpmb ? rpmb_ksk() : derived_ksk(), TEE_MODE_ENCRYPT, &gcm, at)) {
+  if (TEE_Result res = start_gcm(blob, rpmb ? rpmb_ksk() : derived_ksk(), TEE_MODE_ENCRYPT, &gcm)) {
     return res;
   }
   uint8_t key_length[4];
@@ -87,22 +84,20 @@ TEE_Result seal(byte_view key, byte_view characteristics, byte_span blob, trace_
   store_u32(characteristics_length, static_cast<uint32_t>(characteristics.size()));
   const byte_view pieces[] = {key_length, key, characteristics_length, characteristics};
   output_cursor ciphertext(blob.subspan(HEADER_SIZE));
-  if (TEE_Result res = encrypt_pieces(&gcm, pieces, &ciphertext, at)) return res;
-  if (TEE_Result res =
-          finish_encryption(&gcm, blob.subspan(TAG_OFFSET, TAG_SIZE), &ciphertext, at)) {
+  if (TEE_Result res = encrypt_pieces(&gcm, pieces, &ciphertext)) return res;
+  if (TEE_Result res = finish_encryption(&gcm, blob.subspan(TAG_OFFSET, TAG_SIZE), &ciphertext)) {
     return res;
   }
   if (ciphertext.left() != 0) {
-    trace_error(at, "Unmatched total size, expected: %d actual: %d\n",
-                static_cast<int>(blob.size()), static_cast<int>(blob.size() - ciphertext.left()));
+    trace_error("Unmatched total size, expected: %d actual: %d\n", static_cast<int>(blob.size()),
+                static_cast<int>(blob.size() - ciphertext.left()));
     return TEE_ERROR_GENERIC;
   }
   return TEE_SUCCESS;
 }
 
 // The KSK that a blob names. Both results.
-TEE_Result choose_ksk(uint8_t protection, TEE_ObjectHandle* ksk, keymaster_error_t* km_error,
-                      trace_site at) {
+TEE_Result choose_ksk(uint8_t protection, TEE_ObjectHandle* ksk, keymaster_error_t* km_error) {
   switch (protection) {
     case PROTECTED_BY_DERIVED_KSK:
       *ksk = derived_ksk();
@@ -110,10 +105,10 @@ TEE_Result choose_ksk(uint8_t protection, TEE_ObjectHandle* ksk, keymaster_error
     case PROTECTED_BY_RPMB_KSK:
       *ksk = rpmb_ksk();
       if (*ksk != TEE_HANDLE_NULL) return TEE_SUCCESS;
-      trace_error(at, "RPMB KSK died, fail to open key");
+      trace_error("RPMB KSK died, fail to open key");
       return KEY_STORE_ERROR_KSK_MISSING;
     default:
-      trace_error(at, "Unknown key protection");
+      trace_error("Unknown key protection");
       *km_error = KM_ERROR_INVALID_KEY_BLOB;
       return TEE_SUCCESS;
   }
@@ -121,15 +116,15 @@ TEE_Result choose_ksk(uint8_t protection, TEE_ObjectHandle* ksk, keymaster_error
 
 // Decrypts and authenticates; *produced receives the bytes that both calls gave.
 TEE_Result decrypt(tee_operation* gcm, byte_view ciphertext, byte_view tag, byte_span plaintext,
-                   size_t* produced, trace_site at) {
+                   size_t* produced) {
   size_t updated = 0;
-  if (TEE_Result res = gcm->ae_update(ciphertext, plaintext, &updated, at)) return res;
+  if (TEE_Result res = gcm->ae_update(ciphertext, plaintext, &updated)) return res;
   const byte_span last = plaintext.subspan(updated);
   tee_size last_size = static_cast<tee_size>(last.size());
   if (TEE_Result res =
           TEE_AEDecryptFinal(gcm->get(), nullptr, 0, last.data(), &last_size,
                              const_cast<uint8_t*>(tag.data()), static_cast<tee_size>(tag.size()))) {
-    trace_error(at, "AEDecryptFinal failed with 0x%08x\n", res);
+    trace_error("AEDecryptFinal failed with 0x%08x\n", res);
     return res;
   }
   *produced = updated + last_size;
@@ -137,27 +132,26 @@ TEE_Result decrypt(tee_operation* gcm, byte_view ciphertext, byte_view tag, byte
 }
 
 // Decrypts the blob into *plaintext. Both results.
-TEE_Result unseal(byte_view blob, heap_buffer* plaintext, keymaster_error_t* km_error,
-                  trace_site at) {
+TEE_Result unseal(byte_view blob, heap_buffer* plaintext, keymaster_error_t* km_error) {
   TEE_ObjectHandle ksk{};
-  const TEE_Result chosen = choose_ksk(blob[0], &ksk, km_error, at);
+  const TEE_Result chosen = choose_ksk(blob[0], &ksk, km_error);
   if (failed(chosen, *km_error)) return chosen;
   tee_operation gcm;
-  if (TEE_Result res = start_gcm(blob, ksk, TEE_MODE_DECRYPT, &gcm, at)) return res;
+  if (TEE_Result res = start_gcm(blob, ksk, TEE_MODE_DECRYPT, &gcm)) return res;
   const byte_view ciphertext = blob.subspan(HEADER_SIZE);
   if (!plaintext->allocate(ciphertext.size())) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
   size_t produced = 0;
   if (TEE_Result res = decrypt(&gcm, ciphertext, blob.subspan(TAG_OFFSET, TAG_SIZE),
-                               plaintext->span(), &produced, at)) {
+                               plaintext->span(), &produced)) {
     return res;
   }
   if (produced != ciphertext.size()) {
-    trace_error(at, "Too short output of AES, expect %dB, got %dB",
-                static_cast<int>(ciphertext.size()), static_cast<int>(produced));
+    trace_error("Too short output of AES, expect %dB, got %dB", static_cast<int>(ciphertext.size()),
+                static_cast<int>(produced));
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;
@@ -166,17 +160,17 @@ TEE_Result unseal(byte_view blob, heap_buffer* plaintext, keymaster_error_t* km_
 }  // namespace
 
 TEE_Result parse_plaintext(heap_buffer* plaintext, keymaster_error_t unreadable_set,
-                           keymaster_key_param_set_t* characteristics, keymaster_error_t* km_error,
-                           trace_site at) {
+                           keymaster_key_param_set_t* characteristics,
+                           keymaster_error_t* km_error) {
   input_cursor in(plaintext->view());
   byte_view key;
   byte_view marshalled;
   if (!in.read_field(&key) || !in.read_field(&marshalled)) {
-    trace_error(at, "Too short input");
+    trace_error("Too short input");
     return TEE_ERROR_GENERIC;
   }
   if (unmarshal(marshalled, characteristics) != TEE_SUCCESS) {
-    trace_error(at, "Unmarshal failed");
+    trace_error("Unmarshal failed");
     *km_error = unreadable_set;
     return TEE_SUCCESS;
   }
@@ -186,6 +180,7 @@ TEE_Result parse_plaintext(heap_buffer* plaintext, keymaster_error_t unreadable_
 
 TEE_Result save_key(byte_view key, const keymaster_key_param_set_t& characteristics, byte_span blob,
                     size_t* blob_size) {
+  const trace_scope scope;
   *blob_size = 0;
   uint8_t* marshalled = nullptr;
   uint32_t marshalled_size = 0;
@@ -199,7 +194,7 @@ TEE_Result save_key(byte_view key, const keymaster_key_param_set_t& characterist
   if (!sealed.allocate(static_cast<size_t>(size))) {
     return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   }
-  if (TEE_Result res = seal(key, owner.view(), sealed.span(), trace_site::here())) return res;
+  if (TEE_Result res = seal(key, owner.view(), sealed.span())) return res;
   copy_bytes(blob, sealed.view());
   *blob_size = sealed.size();
   return TEE_SUCCESS;
@@ -207,6 +202,7 @@ TEE_Result save_key(byte_view key, const keymaster_key_param_set_t& characterist
 
 TEE_Result open_key(byte_view blob, heap_buffer* key, keymaster_key_param_set_t* characteristics,
                     keymaster_error_t* km_error) {
+  const trace_scope scope;
   key->reset();
   *characteristics = {};
   *km_error = KM_ERROR_OK;
@@ -214,10 +210,9 @@ TEE_Result open_key(byte_view blob, heap_buffer* key, keymaster_key_param_set_t*
     return KM_FAIL(km_error, KM_ERROR_INVALID_KEY_BLOB, "Too short key blob");
   }
   heap_buffer plaintext;
-  TEE_Result res = unseal(blob, &plaintext, km_error, trace_site::here());
+  TEE_Result res = unseal(blob, &plaintext, km_error);
   if (failed(res, *km_error)) return res;
-  res = parse_plaintext(&plaintext, KM_ERROR_INVALID_ARGUMENT, characteristics, km_error,
-                        trace_site::here());
+  res = parse_plaintext(&plaintext, KM_ERROR_INVALID_ARGUMENT, characteristics, km_error);
   if (!failed(res, *km_error)) *key = std::move(plaintext);
   return res;
 }

@@ -33,11 +33,10 @@ constexpr vault_command RETRIEVE_PROPERTY = {12, REQUEST_AND_BYTES, "TA property
 
 // Carries out one command in a session of its own. `*length`: capacity of the output slot's buffer
 // on entry, what the vault wrote on success.
-TEE_Result call_vault(const vault_command& command, TEE_Param* params, size_t* length,
-                      trace_site at) {
+TEE_Result call_vault(const vault_command& command, TEE_Param* params, size_t* length) {
   tee_session session;
   if (TEE_Result res = session.open(VAULT, TEE_TIMEOUT_INFINITE)) {
-    trace_error(at, "Open vault session fails, 0x%x\n", res);
+    trace_error("Open vault session fails, 0x%x\n", res);
     return res;
   }
   TEE_Result res = session.invoke(command.id, command.types, params);
@@ -46,27 +45,27 @@ TEE_Result call_vault(const vault_command& command, TEE_Param* params, size_t* l
   if (res == TEE_SUCCESS && reported > *length) res = TEE_ERROR_GENERIC;
   if (res == TEE_SUCCESS) {
     *length = reported;
-    trace(TEE_TRACE_DEBUG, at, "Retrieve %s success\n", command.what);
+    trace(TEE_TRACE_DEBUG, "Retrieve %s success\n", command.what);
   } else {
-    trace(command.failure_level, at, "Retrieve %s fails, 0x%x\n", command.what, res);
+    trace(command.failure_level, "Retrieve %s fails, 0x%x\n", command.what, res);
   }
   return res;
 }
 
 TEE_Result retrieve_bytes(const vault_command& command, uint8_t* buffer, size_t size,
-                          size_t* used_length, trace_site at) {
+                          size_t* used_length) {
   if (buffer == nullptr) {
-    trace_error(at, "Buf is null\n");
+    trace_error("Buf is null\n");
     return TEE_ERROR_SHORT_BUFFER;
   }
   if (used_length == nullptr) {
-    trace_error(at, "used_length pointer is null\n");
+    trace_error("used_length pointer is null\n");
     return TEE_ERROR_BAD_PARAMETERS;
   }
   TEE_Param params[4] = {};
   params[0].memref.buffer = buffer;
   params[0].memref.size = static_cast<tee_size>(size);
-  if (TEE_Result res = call_vault(command, params, &size, at)) return res;
+  if (TEE_Result res = call_vault(command, params, &size)) return res;
   *used_length = size;
   return TEE_SUCCESS;
 }
@@ -74,15 +73,18 @@ TEE_Result retrieve_bytes(const vault_command& command, uint8_t* buffer, size_t 
 }  // namespace
 
 TEE_Result retrieve_key_from_vault(uint8_t* buffer, size_t size, size_t* used_length) {
-  return retrieve_bytes(RETRIEVE_KEY, buffer, size, used_length, trace_site::here());
+  const trace_scope scope;
+  return retrieve_bytes(RETRIEVE_KEY, buffer, size, used_length);
 }
 
 TEE_Result retrieve_data_from_vault(uint8_t* buffer, size_t size, size_t* used_length) {
-  return retrieve_bytes(RETRIEVE_DATA, buffer, size, used_length, trace_site::here());
+  const trace_scope scope;
+  return retrieve_bytes(RETRIEVE_DATA, buffer, size, used_length);
 }
 
 TEE_Result retrieve_property_from_vault(const uint8_t* request, uint8_t* output,
                                         size_t* output_length) {
+  const trace_scope scope;
   if (request == nullptr || output == nullptr) {
     return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "request %p output %p\n",
                     static_cast<const void*>(request), static_cast<const void*>(output));
@@ -95,7 +97,7 @@ TEE_Result retrieve_property_from_vault(const uint8_t* request, uint8_t* output,
   params[0].memref.size = REQUEST_SIZE;
   params[1].memref.buffer = output;
   params[1].memref.size = static_cast<tee_size>(*output_length);
-  return call_vault(RETRIEVE_PROPERTY, params, output_length, trace_site::here());
+  return call_vault(RETRIEVE_PROPERTY, params, output_length);
 }
 
 }  // namespace keymaster

@@ -10,14 +10,15 @@ namespace keymaster {
 namespace {
 
 void aes_decrypt_free(operation_t* operation) {
-  free_operation<aes_decrypt_operation_t>(operation, trace_site::here());
+  const trace_scope scope;
+  free_operation<aes_decrypt_operation_t>(operation);
 }
 
 // Passes on the oldest `count` bytes that were held as the tag.
 TEE_Result feed_held(aes_decrypt_operation_t* operation, size_t count, byte_span output,
-                     size_t* produced, trace_site at) {
+                     size_t* produced) {
   uint8_t* tag = operation->tag;
-  if (TEE_Result res = aes_feed(operation, {tag, count}, output, produced, at)) return res;
+  if (TEE_Result res = aes_feed(operation, {tag, count}, output, produced)) return res;
   std::copy(tag + count, tag + operation->tag_held, tag);
   operation->tag_held -= count;
   return TEE_SUCCESS;
@@ -25,14 +26,14 @@ TEE_Result feed_held(aes_decrypt_operation_t* operation, size_t count, byte_span
 
 // GCM: all but the last tag_size() bytes of the stream so far are decrypted.
 TEE_Result update_tagged(aes_decrypt_operation_t* operation, byte_view input, byte_span output,
-                         size_t* produced, trace_site at) {
+                         size_t* produced) {
   const size_t tag_size = operation->tag_size();
   const byte_view tail = input.last(std::min(input.size(), tag_size));
   const size_t overflow = operation->tag_held + tail.size();
   const size_t due = overflow > tag_size ? overflow - tag_size : 0;
-  if (TEE_Result res = feed_held(operation, due, output, produced, at)) return res;
+  if (TEE_Result res = feed_held(operation, due, output, produced)) return res;
   const byte_view body = input.first(input.size() - tail.size());
-  if (TEE_Result res = aes_feed(operation, body, output, produced, at)) return res;
+  if (TEE_Result res = aes_feed(operation, body, output, produced)) return res;
   copy_bytes(byte_span(operation->tag).subspan(operation->tag_held), tail);
   operation->tag_held += tail.size();
   return TEE_SUCCESS;
@@ -51,19 +52,19 @@ keymaster_error_t release_held_block(const aes_decrypt_operation_t& operation, b
 // PKCS7: when the stream so far, this input included, fills whole blocks, the last one goes
 // straight into the operation, never through `output`, which others can write to.
 TEE_Result update_padded(aes_decrypt_operation_t* operation, byte_view input, byte_span output,
-                         size_t* produced, trace_site at) {
+                         size_t* produced) {
   const bool holds_back = !operation->ends_in_partial_block();
   const size_t tail = holds_back ? std::min(input.size(), AES_BLOCK_SIZE) : 0;
   const size_t body = input.size() - tail;
-  if (TEE_Result res = aes_feed(operation, input.first(body), output, produced, at)) return res;
+  if (TEE_Result res = aes_feed(operation, input.first(body), output, produced)) return res;
   size_t held = 0;
-  return aes_feed(operation, input.subspan(body), operation->held_block, &held, at);
+  return aes_feed(operation, input.subspan(body), operation->held_block, &held);
 }
 
 TEE_Result aes_decrypt_update(operation_t* operation, const keymaster_key_param_set_t& params,
                               byte_view input, size_t* consumed, byte_span output, size_t* produced,
                               keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   auto* record = static_cast<aes_decrypt_operation_t*>(operation);
   *consumed = input.size();
   *produced = 0;
@@ -74,14 +75,13 @@ TEE_Result aes_decrypt_update(operation_t* operation, const keymaster_key_param_
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   record->data_started = true;
   record->total_input += input.size();
-  if (record->is_gcm()) return update_tagged(record, input, output, produced, at);
-  if (pads) return update_padded(record, input, output, produced, at);
-  return aes_feed(record, input, output, produced, at);
+  if (record->is_gcm()) return update_tagged(record, input, output, produced);
+  if (pads) return update_padded(record, input, output, produced);
+  return aes_feed(record, input, output, produced);
 }
 
 // A stream shorter than a tag is refused like one with a wrong tag.
-TEE_Result check_tag(aes_decrypt_operation_t* operation, keymaster_error_t* km_error,
-                     trace_site at) {
+TEE_Result check_tag(aes_decrypt_operation_t* operation, keymaster_error_t* km_error) {
   TEE_Result res = TEE_ERROR_MAC_INVALID;
   tee_size made = 0;
   if (operation->tag_held == operation->tag_size()) {
@@ -93,12 +93,12 @@ TEE_Result check_tag(aes_decrypt_operation_t* operation, keymaster_error_t* km_e
     return TEE_SUCCESS;
   }
   if (res != TEE_SUCCESS) {
-    trace_error(at, "AEDecryptFinal failed with 0x%08x\n", res);
+    trace_error("AEDecryptFinal failed with 0x%08x\n", res);
     return res;
   }
   if (made != 0) {
     // The name is that of the encryption's call, which is intended.
-    trace_error(at, "AEEncryptFinal make output %dB", static_cast<int>(made));
+    trace_error("AEEncryptFinal make output %dB", static_cast<int>(made));
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;
@@ -118,13 +118,13 @@ bool is_padded(byte_view block) {
 }
 
 TEE_Result strip_padding(const aes_decrypt_operation_t& operation, heap_buffer* output,
-                         keymaster_error_t* km_error, trace_site at) {
+                         keymaster_error_t* km_error) {
   const byte_view block = operation.held_block;
   if (!is_padded(block)) {
-    trace_error(at, "Illegal padding");
+    trace_error("Illegal padding");
     *km_error = KM_ERROR_INVALID_ARGUMENT;
   } else if (!output->copy_of(block.first(AES_BLOCK_SIZE - block.back()))) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return TEE_SUCCESS;
@@ -133,9 +133,9 @@ TEE_Result strip_padding(const aes_decrypt_operation_t& operation, heap_buffer* 
 TEE_Result aes_decrypt_finish(operation_t* operation, const keymaster_key_param_set_t&, byte_view,
                               heap_buffer* output, keymaster_key_param_set_t*,
                               keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   auto* record = static_cast<aes_decrypt_operation_t*>(operation);
-  if (record->is_gcm()) return check_tag(record, km_error, at);
+  if (record->is_gcm()) return check_tag(record, km_error);
   const bool pads = record->padding == KM_PAD_PKCS7;
   // The platform must not be asked to end a stream in the middle of a block; and padding is never
   // empty.
@@ -143,9 +143,9 @@ TEE_Result aes_decrypt_finish(operation_t* operation, const keymaster_key_param_
       (pads && record->total_input == 0)) {
     return KM_FAIL(km_error, KM_ERROR_INVALID_INPUT_LENGTH, "Input data not align to block size");
   }
-  const TEE_Result res = aes_end_cipher(*record, km_error, at);
+  const TEE_Result res = aes_end_cipher(*record, km_error);
   if (failed(res, *km_error) || !pads) return res;
-  return strip_padding(*record, output, km_error, at);
+  return strip_padding(*record, output, km_error);
 }
 
 }  // namespace
@@ -154,12 +154,12 @@ operation_t* create_aes_decrypt(byte_view key_material, const keymaster_key_para
                                 const keymaster_key_param_set_t& begin_params,
                                 keymaster_key_param_set_t* out_params,
                                 keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   return create_operation_object<aes_decrypt_operation_t>(
-      {aes_decrypt_free, aes_decrypt_update, aes_decrypt_finish}, km_error, at,
+      {aes_decrypt_free, aes_decrypt_update, aes_decrypt_finish}, km_error,
       [&](aes_decrypt_operation_t* operation) {
         return aes_prepare(operation, TEE_MODE_DECRYPT, key_material, begin_params, out_params,
-                           km_error, at);
+                           km_error);
       });
 }
 

@@ -35,24 +35,24 @@ bool aes_block_mode(const keymaster_key_param_set_t& params, uint32_t* value) {
   return true;
 }
 
-TEE_Result load_key(aes_encrypt_operation_t* operation, byte_view key_material, trace_site at) {
+TEE_Result load_key(aes_encrypt_operation_t* operation, byte_view key_material) {
   const TEE_Result res = aes_resolve_key_data(key_material, &operation->key, &operation->key_bits);
-  if (res != TEE_SUCCESS) trace_error(at, "Resolve key data failed");
+  if (res != TEE_SUCCESS) trace_error("Resolve key data failed");
   return res;
 }
 
 // Only an upper bound: the key's minimum is a matter of authorisation, and the platform knows which
 // lengths it offers.
 keymaster_error_t read_mac_length(aes_encrypt_operation_t* operation,
-                                  const keymaster_key_param_set_t& begin_params, trace_site at) {
+                                  const keymaster_key_param_set_t& begin_params) {
   const keymaster_key_param_t* mac_length = get_unique(begin_params, KM_TAG_MAC_LENGTH);
   if (mac_length == nullptr) {
-    trace_error(at, "No or too many KM_TAG_MAC_LENGTH");
+    trace_error("No or too many KM_TAG_MAC_LENGTH");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   operation->mac_bits = mac_length->integer;
   if (operation->mac_bits > MAX_MAC_BITS || operation->mac_bits % 8 != 0) {
-    trace_error(at, "Unsupported mac length %d", static_cast<int>(operation->mac_bits));
+    trace_error("Unsupported mac length %d", static_cast<int>(operation->mac_bits));
     return KM_ERROR_UNSUPPORTED_MAC_LENGTH;
   }
   return KM_ERROR_OK;
@@ -60,17 +60,17 @@ keymaster_error_t read_mac_length(aes_encrypt_operation_t* operation,
 
 // What the begin parameters ask for, apart from the nonce.
 keymaster_error_t read_request(aes_encrypt_operation_t* operation,
-                               const keymaster_key_param_set_t& begin_params, trace_site at) {
+                               const keymaster_key_param_set_t& begin_params) {
   uint32_t block_mode = 0;
   if (!aes_block_mode(begin_params, &block_mode)) {
-    trace_error(at, "No or too many KM_TAG_BLOCK_MODE");
+    trace_error("No or too many KM_TAG_BLOCK_MODE");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   aes_padding(begin_params, &operation->padding);
   operation->mode = mode_of(block_mode);
   if (operation->mode == nullptr) return KM_ERROR_UNSUPPORTED_BLOCK_MODE;
   if (operation->is_gcm()) {
-    if (auto error = read_mac_length(operation, begin_params, at)) return error;
+    if (auto error = read_mac_length(operation, begin_params)) return error;
   }
   const bool padding_fits = operation->padding == KM_PAD_NONE ||
                             (operation->padding == KM_PAD_PKCS7 && operation->mode->whole_blocks);
@@ -95,8 +95,8 @@ keymaster_error_t settle_nonce(const aes_mode_t& mode,
   return nonce->size() == mode.nonce_size ? KM_ERROR_OK : KM_ERROR_INVALID_ARGUMENT;
 }
 
-TEE_Result init_platform(aes_encrypt_operation_t* operation, byte_view nonce, trace_site at) {
-  if (operation->is_gcm()) return operation->main.ae_init(nonce, operation->mac_bits, at);
+TEE_Result init_platform(aes_encrypt_operation_t* operation, byte_view nonce) {
+  if (operation->is_gcm()) return operation->main.ae_init(nonce, operation->mac_bits);
   const auto size = static_cast<tee_size>(nonce.size());
   TEE_CipherInit(operation->main.get(), size == 0 ? nullptr : nonce.data(), size);
   return TEE_SUCCESS;
@@ -104,15 +104,14 @@ TEE_Result init_platform(aes_encrypt_operation_t* operation, byte_view nonce, tr
 
 TEE_Result start_stream(aes_encrypt_operation_t* operation,
                         const keymaster_key_param_set_t& begin_params,
-                        keymaster_key_param_set_t* out_params, keymaster_error_t* km_error,
-                        trace_site at) {
+                        keymaster_key_param_set_t* out_params, keymaster_error_t* km_error) {
   uint8_t room[MAX_NONCE_SIZE];
   byte_view nonce;
   *km_error = settle_nonce(*operation->mode, begin_params, room, &nonce);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
-  if (TEE_Result res = init_platform(operation, nonce, at)) return res;
+  if (TEE_Result res = init_platform(operation, nonce)) return res;
   if (!nonce.empty() && !add_blob(out_params, KM_TAG_NONCE, nonce)) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return TEE_SUCCESS;
@@ -147,18 +146,16 @@ const operation_methods_t* aes_get_operation_methods(uint32_t purpose) {
 
 TEE_Result aes_prepare(aes_encrypt_operation_t* operation, uint32_t tee_mode,
                        byte_view key_material, const keymaster_key_param_set_t& begin_params,
-                       keymaster_key_param_set_t* out_params, keymaster_error_t* km_error,
-                       trace_site at) {
-  if (TEE_Result res = load_key(operation, key_material, at)) return res;
-  *km_error = read_request(operation, begin_params, at);
+                       keymaster_key_param_set_t* out_params, keymaster_error_t* km_error) {
+  if (TEE_Result res = load_key(operation, key_material)) return res;
+  *km_error = read_request(operation, begin_params);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   tee_operation& main = operation->main;
-  if (TEE_Result res =
-          main.allocate(operation->mode->algorithm, tee_mode, operation->key_bits, at)) {
+  if (TEE_Result res = main.allocate(operation->mode->algorithm, tee_mode, operation->key_bits)) {
     return res;
   }
-  if (TEE_Result res = main.set_key(operation->key.get(), at)) return res;
-  return start_stream(operation, begin_params, out_params, km_error, at);
+  if (TEE_Result res = main.set_key(operation->key.get())) return res;
+  return start_stream(operation, begin_params, out_params, km_error);
 }
 
 keymaster_error_t aes_take_associated_data(aes_encrypt_operation_t* operation,
@@ -172,12 +169,12 @@ keymaster_error_t aes_take_associated_data(aes_encrypt_operation_t* operation,
 }
 
 TEE_Result aes_feed(aes_encrypt_operation_t* operation, byte_view input, byte_span output,
-                    size_t* produced, trace_site at) {
+                    size_t* produced) {
   if (input.empty()) return TEE_SUCCESS;
   const byte_span room = output.subspan(*produced);
   if (operation->is_gcm()) {
     size_t made = 0;
-    const TEE_Result res = operation->main.ae_update(input, room, &made, at);
+    const TEE_Result res = operation->main.ae_update(input, room, &made);
     *produced += made;
     return res;
   }
@@ -185,23 +182,22 @@ TEE_Result aes_feed(aes_encrypt_operation_t* operation, byte_view input, byte_sp
   const TEE_Result res = TEE_CipherUpdate(operation->main.get(), input.data(),
                                           static_cast<tee_size>(input.size()), room.data(), &size);
   if (res != TEE_SUCCESS) {
-    trace_error(at, "CipherUpdate failed with 0x%08x\n", res);
+    trace_error("CipherUpdate failed with 0x%08x\n", res);
     return res;
   }
   *produced += size;
   return TEE_SUCCESS;
 }
 
-TEE_Result aes_end_cipher(const aes_encrypt_operation_t& operation, keymaster_error_t* km_error,
-                          trace_site at) {
+TEE_Result aes_end_cipher(const aes_encrypt_operation_t& operation, keymaster_error_t* km_error) {
   tee_size made = 0;
   const TEE_Result res = TEE_CipherDoFinal(operation.main.get(), nullptr, 0, nullptr, &made);
   if (res != TEE_SUCCESS) {
-    trace_error(at, "CipherDoFinal failed with 0x%08x\n", res);
+    trace_error("CipherDoFinal failed with 0x%08x\n", res);
     return res;
   }
   if (made != 0) {
-    trace_error(at, "CipherDoFinal make output %dB, expected %dB", static_cast<int>(made), 0);
+    trace_error("CipherDoFinal make output %dB, expected %dB", static_cast<int>(made), 0);
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;

@@ -52,7 +52,7 @@ struct aes_decrypt_operation_t : aes_encrypt_operation_t {
                                      byte_view key_material,
                                      const keymaster_key_param_set_t& begin_params,
                                      keymaster_key_param_set_t* out_params,
-                                     keymaster_error_t* km_error, trace_site at);
+                                     keymaster_error_t* km_error);
 
 // aes_take_associated_data: hands the KM_TAG_ASSOCIATED_DATA of an update to the platform.
 // KM_ERROR_INVALID_TAG outside GCM, after the first data, or for more than one.
@@ -62,13 +62,11 @@ struct aes_decrypt_operation_t : aes_encrypt_operation_t {
 // aes_feed: passes `input` through the cipher into `output`, behind the *produced bytes that are
 // already there, and adds what comes out to *produced. TEE_ERROR_SHORT_BUFFER when it does not fit.
 [[nodiscard]] TEE_Result aes_feed(aes_encrypt_operation_t* operation, byte_view input,
-                                  byte_span output, size_t* produced,
-                                  trace_site at = trace_site::here());
+                                  byte_span output, size_t* produced);
 
 // aes_end_cipher: ends a stream of any mode but GCM. All data is out by then: -1000 if the platform
 // makes more.
 [[nodiscard]] TEE_Result aes_end_cipher(const aes_encrypt_operation_t& operation,
-                                        keymaster_error_t* km_error,
-                                        trace_site at = trace_site::here());
+                                        keymaster_error_t* km_error);
 
 }  // namespace keymaster

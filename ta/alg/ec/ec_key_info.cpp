@@ -37,6 +37,7 @@ bool put_coordinate(byte_view number, byte_span room) {
 
 TEE_Result ec_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key,
                            keymaster_error_t* km_error) {
+  const trace_scope scope;
   input_cursor in(key_material);
   uint32_t key_bits = 0;
   byte_view coordinates[2];

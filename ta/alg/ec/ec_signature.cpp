@@ -71,34 +71,34 @@ bool decode_length(input_cursor* in, uint32_t* length) {
   return true;
 }
 
-bool read_header(input_cursor* in, uint8_t tag, uint32_t* length, trace_site at) {
+bool read_header(input_cursor* in, uint8_t tag, uint32_t* length) {
   uint8_t found = 0;
   const bool is_there = read_byte(in, &found);
   if (!is_there || found != tag) {
-    trace_error(at, "Wrong tag, expect 0x%02x, got 0x%02x", tag, found);
+    trace_error("Wrong tag, expect 0x%02x, got 0x%02x", tag, found);
     return false;
   }
   if (!decode_length(in, length)) {
-    trace_error(at, "Decode length failed");
+    trace_error("Decode length failed");
     return false;
   }
   return true;
 }
 
 // Reads one INTEGER into `number`, right-aligned; `name` is R or S.
-bool read_integer(input_cursor* in, byte_span number, char name, trace_site at) {
+bool read_integer(input_cursor* in, byte_span number, char name) {
   uint32_t length = 0;
-  if (!read_header(in, TAG_INTEGER, &length, at)) return false;
+  if (!read_header(in, TAG_INTEGER, &length)) return false;
   const size_t available = in->left();
   byte_view content;
   if (!in->read_bytes(length, &content)) {
-    trace_error(at, "Wrong length of integer, %dB available, got %dB", static_cast<int>(available),
+    trace_error("Wrong length of integer, %dB available, got %dB", static_cast<int>(available),
                 static_cast<int>(length));
     return false;
   }
   if (!content.empty() && content.front() == 0) content = content.subspan(1);
   if (content.size() > number.size()) {
-    trace_error(at, "Wrong length of %c, expect max %dB, got %dB", name,
+    trace_error("Wrong length of %c, expect max %dB, got %dB", name,
                 static_cast<int>(number.size()), static_cast<int>(content.size()));
     return false;
   }
@@ -108,15 +108,15 @@ bool read_integer(input_cursor* in, byte_span number, char name, trace_site at) 
 }
 
 // Only the encoder's own form is accepted: no trailing bytes, no longer forms than need be.
-TEE_Result check_canonical(byte_view der, byte_view r, byte_view s, trace_site at) {
+TEE_Result check_canonical(byte_view der, byte_view r, byte_view s) {
   heap_buffer encoded;
   if (TEE_Result res = der_encode_ec_signature(r, s, &encoded)) return res;
   if (encoded.size() != der.size()) {
-    trace_error(at, "Encoding size mismatch");
+    trace_error("Encoding size mismatch");
     return TEE_ERROR_GENERIC;
   }
   if (!std::ranges::equal(encoded.view(), der)) {
-    trace_error(at, "Encoding mismatch");
+    trace_error("Encoding mismatch");
     return TEE_ERROR_GENERIC;
   }
   return TEE_SUCCESS;
@@ -137,6 +137,7 @@ bool encode_length(output_cursor* out, uint32_t length) {
 }
 
 TEE_Result der_encode_ec_signature(byte_view r, byte_view s, heap_buffer* signature) {
+  const trace_scope scope;
   const integer_t first(r);
   const integer_t second(s);
   const uint32_t content = encoded_size(first.content()) + encoded_size(second.content());
@@ -155,18 +156,18 @@ TEE_Result der_encode_ec_signature(byte_view r, byte_view s, heap_buffer* signat
 }
 
 TEE_Result der_decode_ec_signature(byte_view der, byte_span r, byte_span s) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   if (der.size() < 2) return TEE_FAIL(TEE_ERROR_GENERIC, "Wrong der length\n");
   input_cursor in(der);
   uint32_t content = 0;
-  if (!read_header(&in, TAG_SEQUENCE, &content, at)) return TEE_ERROR_GENERIC;
+  if (!read_header(&in, TAG_SEQUENCE, &content)) return TEE_ERROR_GENERIC;
   if (content != in.left()) {
     const uint64_t expected = uint64_t{der.size() - in.left()} + content;
     return TEE_FAIL(TEE_ERROR_GENERIC, "Wrong length of sequence, expect %dB, got %dB",
                     static_cast<int>(expected), static_cast<int>(der.size()));
   }
-  if (!read_integer(&in, r, 'R', at) || !read_integer(&in, s, 'S', at)) return TEE_ERROR_GENERIC;
-  return check_canonical(der, r, s, at);
+  if (!read_integer(&in, r, 'R') || !read_integer(&in, s, 'S')) return TEE_ERROR_GENERIC;
+  return check_canonical(der, r, s);
 }
 
 }  // namespace keymaster

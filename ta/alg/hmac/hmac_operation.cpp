@@ -29,34 +29,33 @@ struct hmac_verify_operation_t : hmac_operation_t {
 
 // Everything of create that can fail after the record is there.
 TEE_Result prepare(hmac_operation_t* operation, byte_view key_material,
-                   const keymaster_key_param_set_t& begin_params, keymaster_error_t* km_error,
-                   trace_site at) {
+                   const keymaster_key_param_set_t& begin_params, keymaster_error_t* km_error) {
   hmac_key_t key;
   const TEE_Result resolved = hmac_resolve_key_data(key_material, &key, km_error);
   if (failed(resolved, *km_error)) {
-    trace_error(at, "Resolve key data failed");
+    trace_error("Resolve key data failed");
     return resolved;
   }
   operation->key = std::move(key.object);
   operation->key_bits = key.key_bits;
   const auto* mac_length = get_unique(begin_params, KM_TAG_MAC_LENGTH);
   if (mac_length == nullptr) {
-    trace_error(at, "No or too many KM_TAG_MAC_LENGTH");
+    trace_error("No or too many KM_TAG_MAC_LENGTH");
     *km_error = KM_ERROR_INVALID_ARGUMENT;
     return TEE_SUCCESS;
   }
   operation->mac_bits = mac_length->integer;
   const hmac_hash_t* hash = hmac_hash_of_type(key.object_type);
   if (hash == nullptr) {
-    trace_error(at, "Unsupported key type");
+    trace_error("Unsupported key type");
     *km_error = KM_ERROR_INVALID_KEY_BLOB;
     return TEE_SUCCESS;
   }
   if (TEE_Result res =
-          operation->mac.allocate(hash->mac_algorithm, TEE_MODE_MAC, operation->key_bits, at)) {
+          operation->mac.allocate(hash->mac_algorithm, TEE_MODE_MAC, operation->key_bits)) {
     return res;
   }
-  if (TEE_Result res = operation->mac.set_key(operation->key.get(), at)) return res;
+  if (TEE_Result res = operation->mac.set_key(operation->key.get())) return res;
   TEE_MACInit(operation->mac.get(), nullptr, 0);
   return TEE_SUCCESS;
 }
@@ -70,11 +69,13 @@ TEE_Result feed(operation_t* operation, byte_view input, size_t* consumed, size_
 }
 
 void hmac_sign_free(operation_t* operation) {
-  free_operation<hmac_sign_operation_t>(operation, trace_site::here());
+  const trace_scope scope;
+  free_operation<hmac_sign_operation_t>(operation);
 }
 
 void hmac_verify_free(operation_t* operation) {
-  free_operation<hmac_verify_operation_t>(operation, trace_site::here());
+  const trace_scope scope;
+  free_operation<hmac_verify_operation_t>(operation);
 }
 
 TEE_Result hmac_sign_update(operation_t* operation, const keymaster_key_param_set_t&,
@@ -94,6 +95,7 @@ TEE_Result hmac_verify_update(operation_t* operation, const keymaster_key_param_
 TEE_Result hmac_sign_finish(operation_t* operation, const keymaster_key_param_set_t&, byte_view,
                             heap_buffer* output, keymaster_key_param_set_t*,
                             keymaster_error_t* km_error) {
+  const trace_scope scope;
   auto* record = static_cast<hmac_operation_t*>(operation);
   const size_t wanted = record->mac_bits / 8;
   heap_buffer result;
@@ -122,6 +124,7 @@ TEE_Result hmac_sign_finish(operation_t* operation, const keymaster_key_param_se
 TEE_Result hmac_verify_finish(operation_t* operation, const keymaster_key_param_set_t&, byte_view,
                               heap_buffer*, keymaster_key_param_set_t*,
                               keymaster_error_t* km_error) {
+  const trace_scope scope;
   const auto* record = static_cast<hmac_operation_t*>(operation);
   return KM_FAIL(km_error, KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory, need %dB",
                  static_cast<int>(record->mac_bits / 8));
@@ -130,22 +133,22 @@ TEE_Result hmac_verify_finish(operation_t* operation, const keymaster_key_param_
 operation_t* create_hmac_sign(byte_view key_material, const keymaster_key_param_set_t&,
                               const keymaster_key_param_set_t& begin_params,
                               keymaster_key_param_set_t*, keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   return create_operation_object<hmac_sign_operation_t>(
-      {hmac_sign_free, hmac_sign_update, hmac_sign_finish}, km_error, at,
+      {hmac_sign_free, hmac_sign_update, hmac_sign_finish}, km_error,
       [&](hmac_operation_t* operation) {
-        return prepare(operation, key_material, begin_params, km_error, at);
+        return prepare(operation, key_material, begin_params, km_error);
       });
 }
 
 operation_t* create_hmac_verify(byte_view key_material, const keymaster_key_param_set_t&,
                                 const keymaster_key_param_set_t& begin_params,
                                 keymaster_key_param_set_t*, keymaster_error_t* km_error) {
-  const trace_site at = trace_site::here();
+  const trace_scope scope;
   return create_operation_object<hmac_verify_operation_t>(
-      {hmac_verify_free, hmac_verify_update, hmac_verify_finish}, km_error, at,
+      {hmac_verify_free, hmac_verify_update, hmac_verify_finish}, km_error,
       [&](hmac_operation_t* operation) {
-        return prepare(operation, key_material, begin_params, km_error, at);
+        return prepare(operation, key_material, begin_params, km_error);
       });
 }
 

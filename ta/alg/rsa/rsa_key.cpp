@@ -25,25 +25,25 @@ constexpr uint32_t NUMBERS[] = {
 constexpr size_t MODULUS = 0;
 constexpr size_t PUBLIC_EXPONENT = 1;
 
-keymaster_error_t check_key_size(uint32_t key_bits, trace_site at) {
+keymaster_error_t check_key_size(uint32_t key_bits) {
   if (key_bits % 8 == 0 && key_bits <= MAX_KEY_BITS) return KM_ERROR_OK;
-  trace_error(at, "Invalid RSA key size %d", static_cast<int>(key_bits));
+  trace_error("Invalid RSA key size %d", static_cast<int>(key_bits));
   return KM_ERROR_UNSUPPORTED_KEY_SIZE;
 }
 
 keymaster_error_t check_generate(keymaster_key_param_set_t* description, uint64_t* exponent,
-                                 uint32_t* key_bits, trace_site at) {
-  if (auto error = add_provenance(description, KM_ORIGIN_GENERATED, creation_time::ADDED, at)) {
+                                 uint32_t* key_bits) {
+  if (auto error = add_provenance(description, KM_ORIGIN_GENERATED, creation_time::ADDED)) {
     return error;
   }
   const auto* given = get_unique(*description, KM_TAG_RSA_PUBLIC_EXPONENT);
   if (given == nullptr) {
-    trace_error(at, "No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified");
+    trace_error("No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   *exponent = given->long_integer;
-  if (auto error = required_key_bits(*description, key_bits, at)) return error;
-  return check_key_size(*key_bits, at);
+  if (auto error = required_key_bits(*description, key_bits)) return error;
+  return check_key_size(*key_bits);
 }
 
 // A given exponent must have the field's bytes at its end, leading zeros included.
@@ -54,19 +54,18 @@ bool ends_with(uint64_t exponent, byte_view field) {
          std::ranges::equal(byte_view(bytes).last(field.size()), field);
 }
 
-keymaster_error_t settle_exponent(keymaster_key_param_set_t* description, byte_view field,
-                                  trace_site at) {
+keymaster_error_t settle_exponent(keymaster_key_param_set_t* description, byte_view field) {
   const auto* given = get_unique(*description, KM_TAG_RSA_PUBLIC_EXPONENT);
   const byte_view significant = without_leading_zeros(field);
   const bool fits = given != nullptr ? ends_with(given->long_integer, field)
                                      : significant.size() <= EXPONENT_SIZE;
   if (!fits) {
-    trace_error(at, "Public exponent mismatch");
+    trace_error("Public exponent mismatch");
     return KM_ERROR_IMPORT_PARAMETER_MISMATCH;
   }
   if (given == nullptr &&
       !add_long(description, KM_TAG_RSA_PUBLIC_EXPONENT, load_u64_big_endian(significant))) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;
@@ -74,38 +73,36 @@ keymaster_error_t settle_exponent(keymaster_key_param_set_t* description, byte_v
 
 // Import neither adds the creation time nor refuses it: intended, the description may carry it.
 keymaster_error_t check_import(keymaster_key_param_set_t* description,
-                               std::span<const byte_view> numbers, uint32_t* key_bits,
-                               trace_site at) {
-  if (auto error = add_provenance(description, KM_ORIGIN_IMPORTED, creation_time::NOT_ADDED, at)) {
+                               std::span<const byte_view> numbers, uint32_t* key_bits) {
+  if (auto error = add_provenance(description, KM_ORIGIN_IMPORTED, creation_time::NOT_ADDED)) {
     return error;
   }
   // The field's length as it stands: a modulus with a leading zero guesses 8 bits more, intended.
   const uint64_t guessed_bits = uint64_t{numbers[MODULUS].size()} * 8;
-  if (auto error = settle_key_bits(description, guessed_bits, key_bits, at)) return error;
-  if (auto error = check_key_size(*key_bits, at)) return error;
-  return settle_exponent(description, numbers[PUBLIC_EXPONENT], at);
+  if (auto error = settle_key_bits(description, guessed_bits, key_bits)) return error;
+  if (auto error = check_key_size(*key_bits)) return error;
+  return settle_exponent(description, numbers[PUBLIC_EXPONENT]);
 }
 
 // The messages of an export name the platform's calls, and every failure leaves as -1000.
-TEE_Result export_public_key(const tee_object& key, byte_span output, size_t* produced,
-                             trace_site at) {
+TEE_Result export_public_key(const tee_object& key, byte_span output, size_t* produced) {
   TEE_OperationHandle handle{};
   TEE_Result res = TEE_AllocateOperation(&handle, TEE_ALG_RSA_NOPAD, TEE_MODE_EXPORT, 0);
   tee_operation operation;
   operation.reset(handle);
   if (res != TEE_SUCCESS) {
-    trace_error(at, "TEE_AllocateOperation failed: %08x\n", res);
+    trace_error("TEE_AllocateOperation failed: %08x\n", res);
     return res;
   }
   res = TEE_SetOperationKey(operation.get(), key.get());
   if (res != TEE_SUCCESS) {
-    trace_error(at, "TEE_SetOperationKey failed: %08x\n", res);
+    trace_error("TEE_SetOperationKey failed: %08x\n", res);
     return res;
   }
   auto size = static_cast<tee_size>(output.size());
   res = TEE_AsymmetricExport(operation.get(), TEE_EXPORT_FORMAT_SPKI, output.data(), &size);
   if (res != TEE_SUCCESS) {
-    trace_error(at, "TEE_AsymmetricExport failed: %08x\n", res);
+    trace_error("TEE_AsymmetricExport failed: %08x\n", res);
     return res;
   }
   *produced = size;
@@ -116,9 +113,10 @@ TEE_Result export_public_key(const tee_object& key, byte_span output, size_t* pr
 
 TEE_Result rsa_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material,
                             keymaster_error_t* km_error) {
+  const trace_scope scope;
   uint64_t exponent = 0;
   uint32_t key_bits = 0;
-  *km_error = check_generate(description, &exponent, &key_bits, trace_site::here());
+  *km_error = check_generate(description, &exponent, &key_bits);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   uint8_t bytes[EXPONENT_SIZE];
   store_u64_big_endian(bytes, exponent);
@@ -129,11 +127,12 @@ TEE_Result rsa_generate_key(keymaster_key_param_set_t* description, heap_buffer*
 
 TEE_Result rsa_import_key(keymaster_key_param_set_t* description, byte_view key_data,
                           heap_buffer* key_material, keymaster_error_t* km_error) {
+  const trace_scope scope;
   input_cursor in(key_data);
   byte_view numbers[std::size(NUMBERS)];
   if (!read_numbers(&in, numbers)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
   uint32_t key_bits = 0;
-  *km_error = check_import(description, numbers, &key_bits, trace_site::here());
+  *km_error = check_import(description, numbers, &key_bits);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   const byte_view consumed = key_data.first(key_data.size() - in.left());
   heap_buffer record;
@@ -148,25 +147,28 @@ TEE_Result rsa_import_key(keymaster_key_param_set_t* description, byte_view key_
 
 TEE_Result rsa_export_key(byte_view key_material, byte_span output, size_t* produced,
                           keymaster_error_t* km_error) {
+  const trace_scope scope;
   *produced = 0;
   uint32_t key_bits = 0;
   const tee_object key = resolve_key_from_data(key_material, &key_bits);
   if (!key) {
     return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "resolve key from data stream error\n");
   }
-  if (export_public_key(key, output, produced, trace_site::here()) != TEE_SUCCESS) {
+  if (export_public_key(key, output, produced) != TEE_SUCCESS) {
     *km_error = KM_ERROR_UNKNOWN_ERROR;
   }
   return TEE_SUCCESS;
 }
 
 TEE_Result rsa_resolve_key_data(byte_view key_material, tee_object* key, uint32_t* key_bits) {
+  const trace_scope scope;
   TEE_Attribute attributes[std::size(NUMBERS)];
   if (!read_attributes(key_material, NUMBERS, key_bits, attributes)) return TEE_ERROR_GENERIC;
   return load_key(TEE_TYPE_RSA_KEYPAIR, *key_bits, attributes, key);
 }
 
 tee_object resolve_key_from_data(byte_view key_material, uint32_t* key_bits) {
+  const trace_scope scope;
   tee_object key;
   if (rsa_resolve_key_data(key_material, &key, key_bits) != TEE_SUCCESS) {
     TRACE_ERROR("Resolve key data failed");

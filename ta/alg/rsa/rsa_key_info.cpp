@@ -9,15 +9,14 @@ namespace {
 
 constexpr size_t FIRST_BUFFER_SIZE = 512;
 
-keymaster_error_t encode_key(byte_view modulus, byte_view exponent, heap_buffer* encoding,
-                             trace_site at) {
+keymaster_error_t encode_key(byte_view modulus, byte_view exponent, heap_buffer* encoding) {
   const asn1_owner<RSA_PUBKEY, RSA_PUBKEY_free> key(RSA_PUBKEY_alloc());
   if (!key || ASN1_OCTET_STRING_set(&key->n, modulus) != 0 ||
       ASN1_OCTET_STRING_set(&key->e, exponent) != 0) {
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   const int32_t length =
-      asn1_encode_growing(RSA_PUBKEY_TYPE, key.get(), FIRST_BUFFER_SIZE, encoding, at);
+      asn1_encode_growing(RSA_PUBKEY_TYPE, key.get(), FIRST_BUFFER_SIZE, encoding);
   return length < 0 ? KM_ERROR_MEMORY_ALLOCATION_FAILED : KM_ERROR_OK;
 }
 
@@ -25,6 +24,7 @@ keymaster_error_t encode_key(byte_view modulus, byte_view exponent, heap_buffer*
 
 TEE_Result rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key,
                             keymaster_error_t* km_error) {
+  const trace_scope scope;
   input_cursor in(key_material);
   uint32_t key_bits = 0;
   byte_view numbers[2];
@@ -32,7 +32,7 @@ TEE_Result rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_
     return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
   }
   heap_buffer encoding;
-  *km_error = encode_key(numbers[0], numbers[1], &encoding, trace_site::here());
+  *km_error = encode_key(numbers[0], numbers[1], &encoding);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   X509_ALGOR_set_rsa(&subject_public_key->algorithm, &OID_RSA_ENCRYPTION);
   if (ASN1_BIT_STRING_set(&subject_public_key->key, encoding.size() * uint64_t{8},

@@ -36,26 +36,26 @@ constexpr rsa_choice_t ENCRYPTION_CHOICES[] = {
       TEE_ALG_RSAES_OAEP_PLATFORM_SHA512}},
 };
 
-keymaster_error_t load(rsa_operation_t* operation, byte_view key_material, trace_site at) {
+keymaster_error_t load(rsa_operation_t* operation, byte_view key_material) {
   if (rsa_resolve_key_data(key_material, &operation->key, &operation->key_bits) != TEE_SUCCESS) {
-    trace_error(at, "Resolve key data failed");
+    trace_error("Resolve key data failed");
     return KM_ERROR_UNKNOWN_ERROR;
   }
   if (!operation->message.buffer.allocate(operation->key_bits / 8)) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
   return KM_ERROR_OK;
 }
 
 keymaster_error_t read_request(rsa_operation_t* operation, bool is_signature,
-                               const keymaster_key_param_set_t& begin_params, trace_site at) {
+                               const keymaster_key_param_set_t& begin_params) {
   if (!requested_padding(begin_params, &operation->padding)) {
-    trace_error(at, "No or too many KM_TAG_PADDING");
+    trace_error("No or too many KM_TAG_PADDING");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   if (!requested_digest(begin_params, &operation->message.digest) && is_signature) {
-    trace_error(at, "No or too many KM_TAG_DIGEST");
+    trace_error("No or too many KM_TAG_DIGEST");
     return KM_ERROR_INVALID_ARGUMENT;
   }
   return KM_ERROR_OK;
@@ -71,11 +71,11 @@ keymaster_error_t choose(const rsa_operation_t& operation, std::span<const rsa_c
   return *algorithm == 0 ? KM_ERROR_INCOMPATIBLE_DIGEST : KM_ERROR_OK;
 }
 
-keymaster_error_t check_pss_fits(const rsa_operation_t& operation, trace_site at) {
+keymaster_error_t check_pss_fits(const rsa_operation_t& operation) {
   if (operation.padding != KM_PAD_RSA_PSS) return KM_ERROR_OK;
   const size_t needed = find_digest(operation.message.digest)->size + PSS_OVERHEAD;
   if (needed <= operation.key_size()) return KM_ERROR_OK;
-  trace_error(at, "Too short key to fit digest, flag and salt, key_size %d, need %d",
+  trace_error("Too short key to fit digest, flag and salt, key_size %d, need %d",
               static_cast<int>(operation.key_bits), static_cast<int>(needed * 8));
   return KM_ERROR_INCOMPATIBLE_DIGEST;
 }
@@ -83,12 +83,12 @@ keymaster_error_t check_pss_fits(const rsa_operation_t& operation, trace_site at
 // Everything of create that needs no operation of the platform.
 keymaster_error_t settle_request(rsa_operation_t* operation, const rsa_purpose_t& purpose,
                                  byte_view key_material,
-                                 const keymaster_key_param_set_t& begin_params, uint32_t* algorithm,
-                                 trace_site at) {
-  if (auto error = load(operation, key_material, at)) return error;
-  if (auto error = read_request(operation, purpose.is_signature, begin_params, at)) return error;
+                                 const keymaster_key_param_set_t& begin_params,
+                                 uint32_t* algorithm) {
+  if (auto error = load(operation, key_material)) return error;
+  if (auto error = read_request(operation, purpose.is_signature, begin_params)) return error;
   if (auto error = choose(*operation, purpose.choices, algorithm)) return error;
-  return check_pss_fits(*operation, at);
+  return check_pss_fits(*operation);
 }
 
 // The digest that signing and verification will use, for its authorisation.
@@ -158,27 +158,26 @@ const rsa_purpose_t RSA_DECRYPT = {ENCRYPTION_CHOICES, false, TEE_MODE_DECRYPT, 
 
 TEE_Result rsa_prepare(rsa_operation_t* operation, const rsa_purpose_t& purpose,
                        byte_view key_material, const keymaster_key_param_set_t& begin_params,
-                       keymaster_error_t* km_error, trace_site at) {
+                       keymaster_error_t* km_error) {
   uint32_t algorithm = 0;
-  *km_error = settle_request(operation, purpose, key_material, begin_params, &algorithm, at);
+  *km_error = settle_request(operation, purpose, key_material, begin_params, &algorithm);
   if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
   const bool undigested = operation->message.digest == KM_DIGEST_NONE;
   if (purpose.is_signature && !undigested) {
-    if (TEE_Result res = operation->message.start_hash(at)) return res;
+    if (TEE_Result res = operation->message.start_hash()) return res;
   }
   const uint32_t mode = undigested ? purpose.undigested_mode : purpose.mode;
-  if (TEE_Result res = operation->main.allocate(algorithm, mode, operation->key_bits, at)) {
+  if (TEE_Result res = operation->main.allocate(algorithm, mode, operation->key_bits)) {
     return res;
   }
-  return operation->main.set_key(operation->key.get(), at);
+  return operation->main.set_key(operation->key.get());
 }
 
 TEE_Result rsa_keep(rsa_operation_t* operation, byte_view input, size_t reserved,
-                    const char* purpose, size_t* consumed, keymaster_error_t* km_error,
-                    trace_site at) {
+                    const char* purpose, size_t* consumed, keymaster_error_t* km_error) {
   const uint64_t total = uint64_t{operation->message.length} + input.size();
   if (total + reserved > operation->key_size()) {
-    trace_error(at, "Input too long to %s, key_size %d, input %dB", purpose,
+    trace_error("Input too long to %s, key_size %d, input %dB", purpose,
                 static_cast<int>(operation->key_bits), static_cast<int>(total));
     *consumed = 0;
     *km_error = KM_ERROR_INVALID_INPUT_LENGTH;
@@ -190,10 +189,10 @@ TEE_Result rsa_keep(rsa_operation_t* operation, byte_view input, size_t reserved
 }
 
 TEE_Result rsa_take_signed(rsa_operation_t* operation, byte_view input, const char* purpose,
-                           size_t* consumed, keymaster_error_t* km_error, trace_site at) {
+                           size_t* consumed, keymaster_error_t* km_error) {
   if (!operation->message.is_hashed()) {
     const size_t reserved = operation->padding == KM_PAD_RSA_PKCS1_1_5_SIGN ? PKCS1_OVERHEAD : 0;
-    return rsa_keep(operation, input, reserved, purpose, consumed, km_error, at);
+    return rsa_keep(operation, input, reserved, purpose, consumed, km_error);
   }
   TEE_DigestUpdate(operation->message.hash.get(), input.data(),
                    static_cast<tee_size>(input.size()));
@@ -214,11 +213,10 @@ void rsa_build_pkcs1_block(rsa_operation_t* operation) {
 }
 
 TEE_Result rsa_crypt(rsa_call call, const rsa_operation_t& operation, byte_view input,
-                     heap_buffer* result, size_t* produced, keymaster_error_t* km_error,
-                     trace_site at) {
+                     heap_buffer* result, size_t* produced, keymaster_error_t* km_error) {
   *produced = 0;
   if (!result->allocate(operation.key_size())) {
-    trace_error(at, "Out of memory");
+    trace_error("Out of memory");
     *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
     return TEE_SUCCESS;
   }
@@ -229,13 +227,12 @@ TEE_Result rsa_crypt(rsa_call call, const rsa_operation_t& operation, byte_view 
   return res;
 }
 
-TEE_Result rsa_settle_crypt(TEE_Result res, const char* failure, keymaster_error_t* km_error,
-                            trace_site at) {
+TEE_Result rsa_settle_crypt(TEE_Result res, const char* failure, keymaster_error_t* km_error) {
   if (res == TEE_ERROR_BAD_PARAMETERS) {
     *km_error = KM_ERROR_INVALID_ARGUMENT;
     return TEE_SUCCESS;
   }
-  if (res != TEE_SUCCESS) trace_error(at, "%s 0x%08x", failure, res);
+  if (res != TEE_SUCCESS) trace_error("%s 0x%08x", failure, res);
   return res;
 }
 

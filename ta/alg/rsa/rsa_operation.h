@@ -66,20 +66,19 @@ extern const rsa_purpose_t RSA_DECRYPT;
 [[nodiscard]] TEE_Result rsa_prepare(rsa_operation_t* operation, const rsa_purpose_t& purpose,
                                      byte_view key_material,
                                      const keymaster_key_param_set_t& begin_params,
-                                     keymaster_error_t* km_error, trace_site at);
+                                     keymaster_error_t* km_error);
 
 // rsa_keep: appends `input` to the message, which may take `reserved` bytes less than the key's
 // size. *consumed receives the bytes taken: all, or none with KM_ERROR_INVALID_INPUT_LENGTH.
 // `purpose` stands in the message, as in "Input too long to sign".
 [[nodiscard]] TEE_Result rsa_keep(rsa_operation_t* operation, byte_view input, size_t reserved,
                                   const char* purpose, size_t* consumed,
-                                  keymaster_error_t* km_error, trace_site at = trace_site::here());
+                                  keymaster_error_t* km_error);
 
 // rsa_take_signed: the update of signing and verification: hashes `input`, or keeps it.
 [[nodiscard]] TEE_Result rsa_take_signed(rsa_operation_t* operation, byte_view input,
                                          const char* purpose, size_t* consumed,
-                                         keymaster_error_t* km_error,
-                                         trace_site at = trace_site::here());
+                                         keymaster_error_t* km_error);
 
 // rsa_build_pkcs1_block: turns the kept message into the EMSA-PKCS1-v1_5 block (RFC 8017, 9.2) in
 // which it stands for the whole DigestInfo.
@@ -91,12 +90,12 @@ void rsa_build_pkcs1_block(rsa_operation_t* operation);
 using rsa_call = decltype(TEE_AsymmetricEncrypt);
 [[nodiscard]] TEE_Result rsa_crypt(rsa_call call, const rsa_operation_t& operation, byte_view input,
                                    heap_buffer* result, size_t* produced,
-                                   keymaster_error_t* km_error, trace_site at);
+                                   keymaster_error_t* km_error);
 
 // rsa_settle_crypt: what the outcome of rsa_crypt means where its input is the client's:
 // KM_ERROR_INVALID_ARGUMENT when the platform refuses it; any other code is traced behind `failure`
 // and passed on.
 [[nodiscard]] TEE_Result rsa_settle_crypt(TEE_Result res, const char* failure,
-                                          keymaster_error_t* km_error, trace_site at);
+                                          keymaster_error_t* km_error);
 
 }  // namespace keymaster
