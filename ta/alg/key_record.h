@@ -8,15 +8,19 @@
 
 namespace keymaster {
 
-// generate_key_record: generates a key of `object_type` with the platform's `parameter` and builds
-// its record from the attributes `ids`, none of which is longer than `longest` bytes. A platform
-// that cannot make the key: its code, together with KM_ERROR_UNKNOWN_ERROR. -41,
+// key_form: what a record is made of.
+struct key_form {
+  uint32_t object_type;  // TEE_TYPE_*
+  uint32_t key_bits;
+  std::span<const uint32_t> ids;  // the attributes of the numbers, in order
+  size_t longest;                 // no number has more bytes
+};
+
+// generate_key_record: generates a key with the platform's `parameter` and builds its record. A
+// platform that cannot make the key: its code, together with KM_ERROR_UNKNOWN_ERROR. -41,
 // TEE_ERROR_OUT_OF_MEMORY: out of memory. -1000: the platform tells two lengths of one number.
-// Messages go out under `at`.
-[[nodiscard]] TEE_Result generate_key_record(uint32_t object_type, uint32_t key_bits,
-                                             const TEE_Attribute& parameter,
-                                             std::span<const uint32_t> ids, size_t longest,
-                                             heap_buffer* record, keymaster_error_t* km_error);
+outcome generate_key_record(const key_form& form, const TEE_Attribute& parameter,
+                            heap_buffer* record);
 
 // read_numbers: reads numbers.size() numbers into views of the source; false when it is too short.
 [[nodiscard]] bool read_numbers(input_cursor* in, std::span<byte_view> numbers);

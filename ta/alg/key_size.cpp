@@ -7,8 +7,7 @@ keymaster_error_t required_key_bits(const keymaster_key_param_set_t& description
                                     uint32_t* key_bits) {
   const keymaster_key_param_t* size = get_unique(description, KM_TAG_KEY_SIZE);
   if (size == nullptr) {
-    trace_error("No or too many KM_TAG_KEY_SIZE or specified");
-    return KM_ERROR_INVALID_ARGUMENT;
+    return refuse(KM_ERROR_INVALID_ARGUMENT, "No or too many KM_TAG_KEY_SIZE or specified");
   }
   *key_bits = size->integer;
   return KM_ERROR_OK;
@@ -20,13 +19,11 @@ keymaster_error_t settle_key_bits(keymaster_key_param_set_t* description, uint64
   *key_bits = guessed_bits > UINT32_MAX ? UINT32_MAX : static_cast<uint32_t>(guessed_bits);
   const keymaster_key_param_t* given = get_unique(*description, KM_TAG_KEY_SIZE);
   if (given != nullptr && given->integer != *key_bits) {
-    trace_error("Key size mismatch (given %d, guessed %d)", static_cast<int>(given->integer),
-                static_cast<int>(*key_bits));
-    return KM_ERROR_IMPORT_PARAMETER_MISMATCH;
+    return refuse(KM_ERROR_IMPORT_PARAMETER_MISMATCH, "Key size mismatch (given %d, guessed %d)",
+                  static_cast<int>(given->integer), static_cast<int>(*key_bits));
   }
   if (given == nullptr && !add_integer(description, KM_TAG_KEY_SIZE, *key_bits)) {
-    trace_error("Out of memory");
-    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
   return KM_ERROR_OK;
 }

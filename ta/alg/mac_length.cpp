@@ -7,8 +7,8 @@ keymaster_error_t check_min_mac_bits(uint32_t min_mac_bits, uint32_t lowest, uin
   if (min_mac_bits >= lowest && min_mac_bits <= highest && min_mac_bits % 8 == 0) {
     return KM_ERROR_OK;
   }
-  trace_error("Invalid KM_TAG_MIN_MAC_LENGTH %d", static_cast<int>(min_mac_bits));
-  return KM_ERROR_UNSUPPORTED_MIN_MAC_LENGTH;
+  return refuse(KM_ERROR_UNSUPPORTED_MIN_MAC_LENGTH, "Invalid KM_TAG_MIN_MAC_LENGTH %d",
+                static_cast<int>(min_mac_bits));
 }
 
 }  // namespace keymaster

@@ -1,7 +1,7 @@
 // The data of an asymmetric operation, and the signatures over it.
 #include "ta/alg/message.h"
 
-#include "ta/base/results.h"
+#include <algorithm>
 
 namespace keymaster {
 namespace {
@@ -15,53 +15,47 @@ constexpr digest_t DIGESTS[] = {
 }  // namespace
 
 const digest_t* find_digest(uint32_t digest) {
-  for (const digest_t& row : DIGESTS) {
-    if (row.digest == digest) return &row;
-  }
-  return nullptr;
+  const auto* row = std::ranges::find(DIGESTS, digest, &digest_t::digest);
+  return row == std::end(DIGESTS) ? nullptr : row;
 }
 
 TEE_Result message_t::start_hash() {
   return hash.allocate(find_digest(digest)->algorithm, TEE_MODE_DIGEST, 0);
 }
 
-TEE_Result message_t::finish_hash() {
-  return hash.digest_final({}, buffer.span(), &length);
-}
-
 void message_t::append(byte_view input) {
+  if (is_hashed()) {
+    TEE_DigestUpdate(hash.get(), input.data(), static_cast<tee_size>(input.size()));
+    return;
+  }
   copy_bytes(buffer.span().subspan(length), input);
   length += input.size();
+}
+
+TEE_Result message_t::finish_hash() {
+  return hash.digest_final({}, buffer.span(), &length);
 }
 
 TEE_Result sign_digest(const tee_operation& main, std::span<const TEE_Attribute> params,
                        byte_view digest, heap_buffer* signature) {
   auto size = static_cast<tee_size>(signature->size());
-  const TEE_Result res = TEE_AsymmetricSignDigest(
-      main.get(), params.data(), static_cast<uint32_t>(params.size()), digest.data(),
-      static_cast<tee_size>(digest.size()), signature->data(), &size);
-  if (res != TEE_SUCCESS) {
-    trace_error("AsymmetricSignDigest failed with 0x%08x\n", res);
-    return res;
-  }
+  TRY(checked(TEE_AsymmetricSignDigest(
+                  main.get(), params.data(), static_cast<uint32_t>(params.size()), digest.data(),
+                  static_cast<tee_size>(digest.size()), signature->data(), &size),
+              "AsymmetricSignDigest"));
   signature->truncate(size);
   return TEE_SUCCESS;
 }
 
-TEE_Result verify_digest(const tee_operation& main, std::span<const TEE_Attribute> params,
-                         byte_view digest, byte_view signature, keymaster_error_t* km_error) {
+outcome verify_digest(const tee_operation& main, std::span<const TEE_Attribute> params,
+                      byte_view digest, byte_view signature) {
   const TEE_Result res =
       TEE_AsymmetricVerifyDigest(main.get(), params.data(), static_cast<uint32_t>(params.size()),
                                  digest.data(), static_cast<tee_size>(digest.size()),
                                  signature.data(), static_cast<tee_size>(signature.size()));
-  if (res == TEE_ERROR_SIGNATURE_INVALID) {
-    *km_error = KM_ERROR_VERIFICATION_FAILED;
-    return TEE_SUCCESS;
-  }
-  if (res != TEE_SUCCESS) {
-    trace_error("TEE_AsymmetricVerifyDigest return 0x%08x", res);
-  }
-  return res;
+  if (res == TEE_SUCCESS) return DONE;
+  if (res == TEE_ERROR_SIGNATURE_INVALID) return KM_ERROR_VERIFICATION_FAILED;
+  return fail(res, "TEE_AsymmetricVerifyDigest return 0x%08x", res);
 }
 
 }  // namespace keymaster

@@ -30,10 +30,10 @@ struct message_t {
 
   // start_hash: makes `hash` for `digest`, which find_digest must know.
   [[nodiscard]] TEE_Result start_hash();
+  // append: hashes `input`, or keeps it: then it must fit the room.
+  void append(byte_view input);
   // finish_hash: puts the digest into the buffer. TEE_ERROR_SHORT_BUFFER: the buffer is shorter.
   [[nodiscard]] TEE_Result finish_hash();
-  // append: keeps `input`, which must fit the room.
-  void append(byte_view input);
 };
 
 // sign_digest: signs `digest` into `signature`, which has room for it and is cut to what was made.
@@ -42,8 +42,7 @@ struct message_t {
                                      heap_buffer* signature);
 
 // verify_digest: KM_ERROR_VERIFICATION_FAILED for every signature that is not a good one.
-[[nodiscard]] TEE_Result verify_digest(const tee_operation& main,
-                                       std::span<const TEE_Attribute> params, byte_view digest,
-                                       byte_view signature, keymaster_error_t* km_error);
+outcome verify_digest(const tee_operation& main, std::span<const TEE_Attribute> params,
+                      byte_view digest, byte_view signature);
 
 }  // namespace keymaster

@@ -6,22 +6,17 @@
 #include "ta/commands/configured.h"
 
 namespace keymaster {
-namespace {
 
 keymaster_error_t add_own_tag(keymaster_key_param_set_t* description, keymaster_tag_t tag,
                               const char* name, uint64_t value) {
   if (contains_tag(*description, tag)) {
-    trace_error("Shouldn't specify %s", name);
-    return KM_ERROR_INVALID_ARGUMENT;
+    return refuse(KM_ERROR_INVALID_ARGUMENT, "Shouldn't specify %s", name);
   }
   if (!add_long(description, tag, value)) {
-    trace_error("Out of memory");
-    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
   return KM_ERROR_OK;
 }
-
-}  // namespace
 
 keymaster_error_t add_provenance(keymaster_key_param_set_t* description, uint32_t origin,
                                  creation_time created) {
@@ -39,7 +34,7 @@ keymaster_error_t add_provenance(keymaster_key_param_set_t* description, uint32_
   };
   for (const auto& [tag, name, value] : tags) {
     if (tag == KM_TAG_CREATION_DATETIME && created == creation_time::NOT_ADDED) continue;
-    if (auto error = add_own_tag(description, tag, name, value)) return error;
+    TRY(add_own_tag(description, tag, name, value));
   }
   return KM_ERROR_OK;
 }

@@ -23,7 +23,7 @@ bool requested_value(const keymaster_key_param_set_t& params, keymaster_tag_t ta
 
 const algorithm_t* find_algorithm(uint32_t algorithm) {
   for (const algorithm_t* descriptor : REGISTRY) {
-    if (descriptor != nullptr && descriptor->algorithm == algorithm) return descriptor;
+    if (descriptor->algorithm == algorithm) return descriptor;
   }
   return nullptr;
 }
@@ -40,10 +40,9 @@ bool requested_padding(const keymaster_key_param_set_t& params, uint32_t* value)
   return requested_value(params, KM_TAG_PADDING, value);
 }
 
-TEE_Result refuse_export(byte_view, byte_span, size_t* produced, keymaster_error_t* km_error) {
+outcome refuse_export(byte_view, byte_span, size_t* produced) {
   *produced = 0;
-  *km_error = KM_ERROR_UNSUPPORTED_KEY_FORMAT;
-  return TEE_SUCCESS;
+  return KM_ERROR_UNSUPPORTED_KEY_FORMAT;
 }
 
 }  // namespace keymaster

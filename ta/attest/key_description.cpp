@@ -1,7 +1,10 @@
 // The key description extension: templates, and how they are filled.
 #include "ta/attest/key_description.h"
 
+#include <algorithm>
+
 #include "product/values.h"
+#include "ta/base/outcome.h"
 #include "ta/der/oids.h"
 
 namespace keymaster {
@@ -128,13 +131,6 @@ constexpr keymaster_tag_t PASSED_OVER[] = {
     KM_TAG_SOTER_SIGN_KEY_BLOB,
 };
 
-bool passed_over(keymaster_tag_t tag) {
-  for (const keymaster_tag_t known : PASSED_OVER) {
-    if (known == tag) return true;
-  }
-  return false;
-}
-
 const asn1_field* field_of(keymaster_tag_t tag) {
   for (size_t i = 0; i < std::size(AUTHORISATION_TAGS); i++) {
     if (AUTHORISATION_TAGS[i] == tag) return &AuthorizationList_FIELDS[i];
@@ -147,27 +143,18 @@ bool fill(const asn1_field& field, const keymaster_key_param_t& param, Authoriza
   const trace_scope scope;
   auto* base = reinterpret_cast<uint8_t*>(list);
   void* value = base + field.offset;
-  switch (tag_class(param.tag)) {
-    case KM_ENUM_REP: {
-      uint64_t* element = SET_OF_INTEGER_alloc_item(static_cast<SET_OF_INTEGER*>(value));
-      if (element == nullptr) return false;
-      *element = param.enumerated;
-      break;
-    }
-    case KM_BYTES:
-      if (ASN1_OCTET_STRING_set(static_cast<ASN1_OCTET_STRING*>(value), param.blob()) != 0) {
-        return false;
-      }
-      break;
-    case KM_BOOL:
-      break;
-    case KM_ENUM:
-    case KM_UINT:
-      *static_cast<uint64_t*>(value) = param.integer;
-      break;
-    default:
-      *static_cast<uint64_t*>(value) = param.long_integer;
-      break;
+  const uint32_t kind = tag_class(param.tag);
+  if (kind == KM_ENUM_REP) {
+    uint64_t* element = SET_OF_INTEGER_alloc_item(static_cast<SET_OF_INTEGER*>(value));
+    if (element == nullptr) return false;
+    *element = param.enumerated;
+  } else if (kind == KM_BYTES) {
+    auto* string = static_cast<ASN1_OCTET_STRING*>(value);
+    if (ASN1_OCTET_STRING_set(string, param.blob()) != 0) return false;
+  } else if (kind == KM_ENUM || kind == KM_UINT) {
+    *static_cast<uint64_t*>(value) = param.integer;
+  } else if (kind != KM_BOOL) {
+    *static_cast<uint64_t*>(value) = param.long_integer;
   }
   base[field.presence] = 1;
   return true;
@@ -179,8 +166,8 @@ keymaster_error_t settle_unique_id(const keymaster_key_param_set_t& hardware,
   if (!contains_tag(hardware, KM_TAG_INCLUDE_UNIQUE_ID)) return KM_ERROR_OK;
   const auto* created = get_unique(hardware, KM_TAG_CREATION_DATETIME);
   if (created == nullptr) {
-    trace_error("Unique ID cannot be generated without creation datetime");
-    return KM_ERROR_INVALID_KEY_BLOB;
+    return refuse(KM_ERROR_INVALID_KEY_BLOB,
+                  "Unique ID cannot be generated without creation datetime");
   }
   return generate_unique_id(unique_id, created->date_time,
                             unique_blob(hardware, KM_TAG_APPLICATION_ID),
@@ -192,8 +179,7 @@ keymaster_error_t set_challenge(const keymaster_key_param_set_t& attest_params,
   const auto* given = get_unique(attest_params, KM_TAG_ATTESTATION_CHALLENGE);
   if (given == nullptr) return KM_ERROR_OK;
   if (given->data_length > MAX_CHALLENGE_SIZE) return KM_ERROR_INVALID_INPUT_LENGTH;
-  return ASN1_OCTET_STRING_set(challenge, given->blob()) == 0 ? KM_ERROR_OK
-                                                              : KM_ERROR_MEMORY_ALLOCATION_FAILED;
+  return der_error(ASN1_OCTET_STRING_set(challenge, given->blob()));
 }
 
 // The device is locked and verified under a fixed boot key: the platform offers no other source.
@@ -201,9 +187,7 @@ keymaster_error_t set_root_of_trust(AuthorizationList* list) {
   RootOfTrust& root = list->root_of_trust;
   const byte_view key(reinterpret_cast<const uint8_t*>(VERIFIED_BOOT_KEY),
                       sizeof(VERIFIED_BOOT_KEY) - 1);
-  if (ASN1_OCTET_STRING_set(&root.verified_boot_key, key) != 0) {
-    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  }
+  TRY(der_error(ASN1_OCTET_STRING_set(&root.verified_boot_key, key)));
   root.device_locked = 1;
   root.verified_boot_state = 0;
   list->has_root_of_trust = 1;
@@ -214,15 +198,10 @@ keymaster_error_t fill_description(const keymaster_key_param_set_t& hardware,
                                    const keymaster_key_param_set_t& software,
                                    const keymaster_key_param_set_t& attest_params,
                                    KeyDescription* description) {
-  keymaster_error_t error = KM_ERROR_OK;
-  if (fill_auth_list_by_param_set(hardware, &description->tee_enforced, &error) != 0 ||
-      fill_auth_list_by_param_set(software, &description->software_enforced, &error) != 0) {
-    return error;
-  }
-  error = settle_unique_id(hardware, &description->unique_id);
-  if (error != KM_ERROR_OK) return error;
-  error = set_challenge(attest_params, &description->attestation_challenge);
-  if (error != KM_ERROR_OK) return error;
+  TRY(fill_auth_list_by_param_set(hardware, &description->tee_enforced));
+  TRY(fill_auth_list_by_param_set(software, &description->software_enforced));
+  TRY(settle_unique_id(hardware, &description->unique_id));
+  TRY(set_challenge(attest_params, &description->attestation_challenge));
   return set_root_of_trust(&description->tee_enforced);
 }
 
@@ -238,22 +217,19 @@ uint64_t* SET_OF_INTEGER_alloc_item(SET_OF_INTEGER* set) {
   return item == nullptr ? nullptr : &item->value;
 }
 
-int32_t fill_auth_list_by_param_set(const keymaster_key_param_set_t& set, AuthorizationList* list,
-                                    keymaster_error_t* km_error) {
+keymaster_error_t fill_auth_list_by_param_set(const keymaster_key_param_set_t& set,
+                                              AuthorizationList* list) {
   const trace_scope scope;
   for (const keymaster_key_param_t& param : set) {
-    if (passed_over(param.tag)) continue;
+    if (std::ranges::find(PASSED_OVER, param.tag) != std::end(PASSED_OVER)) continue;
     const asn1_field* field = field_of(param.tag);
     if (field == nullptr) {
-      TRACE_ERROR("Unknown tag 0x%08x", param.tag);
+      trace(TEE_TRACE_ERROR, "Unknown tag 0x%08x", param.tag);
       continue;
     }
-    if (!fill(*field, param, list)) {
-      *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
-      return -1;
-    }
+    if (!fill(*field, param, list)) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   }
-  return 0;
+  return KM_ERROR_OK;
 }
 
 keymaster_error_t generate_unique_id(ASN1_OCTET_STRING*, uint64_t, byte_view, bool) {
@@ -267,18 +243,12 @@ keymaster_error_t character_to_extension(const keymaster_key_param_set_t& hardwa
   const trace_scope scope;
   const asn1_owner<KeyDescription, KeyDescription_free> description(KeyDescription_alloc());
   if (!description) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  if (auto error = fill_description(hardware, software, attest_params, description.get())) {
-    return error;
-  }
+  TRY(fill_description(hardware, software, attest_params, description.get()));
   heap_buffer encoding;
-  const int32_t length =
-      asn1_encode_growing(KeyDescription_TYPE, description.get(), FIRST_BUFFER_SIZE, &encoding);
-  if (length == DER_NO_MEMORY) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  if (length < 0) return KM_ERROR_UNKNOWN_ERROR;
+  TRY(der_error(
+      asn1_encode_growing(KeyDescription_TYPE, description.get(), FIRST_BUFFER_SIZE, &encoding)));
   extension->id = &OID_KEY_DESCRIPTION;
-  return ASN1_OCTET_STRING_set(&extension->value, encoding.view()) == 0
-             ? KM_ERROR_OK
-             : KM_ERROR_MEMORY_ALLOCATION_FAILED;
+  return der_error(ASN1_OCTET_STRING_set(&extension->value, encoding.view()));
 }
 
 }  // namespace keymaster

@@ -70,11 +70,10 @@ KM_DECLARE_ASN1_RECORD(KeyDescription)
 [[nodiscard]] uint64_t* SET_OF_INTEGER_alloc_item(SET_OF_INTEGER* set);
 
 // fill_auth_list_by_param_set: walks the set in order and fills the list. A scalar tag that occurs
-// again keeps its last value. Tags without a field are passed over; unknown ones are traced. 0, or
-// -1 with *km_error -41 when out of memory; what was added stays in the list.
-[[nodiscard]] int32_t fill_auth_list_by_param_set(const keymaster_key_param_set_t& set,
-                                                  AuthorizationList* list,
-                                                  keymaster_error_t* km_error);
+// again keeps its last value. Tags without a field are passed over; unknown ones are traced. -41:
+// out of memory; what was added stays in the list.
+[[nodiscard]] keymaster_error_t fill_auth_list_by_param_set(const keymaster_key_param_set_t& set,
+                                                            AuthorizationList* list);
 
 // generate_unique_id: intended to fail: this system has no unique identifiers. Always
 // KM_ERROR_UNIMPLEMENTED; nothing is written.

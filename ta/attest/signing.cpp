@@ -1,9 +1,8 @@
 // Signing of certificates with the provisioned attestation key.
-#include "tee_internal_api.h"
+#include <algorithm>
 
 #include "ta/attest/attestation_key.h"
 #include "ta/attest/certificate.h"
-#include "ta/base/results.h"
 #include "ta/der/oids.h"
 
 namespace keymaster {
@@ -26,48 +25,31 @@ constexpr signature_algorithm SIGNATURE_ALGORITHMS[] = {
     {&OID_SHA512_WITH_RSA_ENCRYPTION, TEE_ALG_SHA512, TEE_ALG_RSASSA_PKCS1_V1_5_SHA512},
 };
 
-const signature_algorithm* find_signature_algorithm(const ASN1_OID* id) {
-  for (const signature_algorithm& row : SIGNATURE_ALGORITHMS) {
-    if (row.id == id) return &row;
-  }
-  return nullptr;
-}
-
-// Results of the platform and of the writer in one number: both are negative when they fail.
-int32_t as_writer_code(TEE_Result res) {
-  return static_cast<int32_t>(res);
-}
-
 // Asks for the digest's size, which absorbs nothing, then digests.
-int32_t digest_encoding(uint32_t algorithm, byte_view encoding, heap_buffer* digest) {
+outcome digest_encoding(uint32_t algorithm, byte_view encoding, heap_buffer* digest) {
   tee_operation operation;
-  if (TEE_Result res = operation.allocate(algorithm, TEE_MODE_DIGEST, 0)) {
-    return as_writer_code(res);
-  }
+  TRY(operation.allocate(algorithm, TEE_MODE_DIGEST, 0));
   tee_size size = 0;
   const TEE_Result asked = TEE_DigestDoFinal(
       operation.get(), encoding.data(), static_cast<tee_size>(encoding.size()), nullptr, &size);
   if (asked != TEE_ERROR_SHORT_BUFFER) {
-    trace_error("DigestDoFinal failed with 0x%08x\n", asked);
-    return as_writer_code(asked == TEE_SUCCESS ? TEE_ERROR_GENERIC : asked);
+    return fail(asked == TEE_SUCCESS ? TEE_ERROR_GENERIC : asked,
+                "DigestDoFinal failed with 0x%08x\n", asked);
   }
-  if (!digest->allocate(size)) return DER_NO_MEMORY;
+  if (!digest->allocate(size)) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   size_t length = 0;
-  return as_writer_code(operation.digest_final(encoding, digest->span(), &length));
+  return operation.digest_final(encoding, digest->span(), &length);
 }
 
-int32_t sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
+outcome sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
                     heap_buffer* signature) {
   TEE_ObjectInfo info{};
   if (TEE_Result res = TEE_GetObjectInfo1(key.get(), &info)) {
-    trace_error("GetObjectInfo1 failed with 0x%08x\n", res);
-    return as_writer_code(res);
+    return fail(res, "GetObjectInfo1 failed with 0x%08x\n", res);
   }
   tee_operation operation;
-  if (TEE_Result res = operation.allocate(algorithm, TEE_MODE_SIGN, info.objectSize)) {
-    return as_writer_code(res);
-  }
-  if (TEE_Result res = operation.set_key(key.get())) return as_writer_code(res);
+  TRY(operation.allocate(algorithm, TEE_MODE_SIGN, info.objectSize));
+  TRY(operation.set_key(key.get()));
   const auto sign = [&](uint8_t* buffer, tee_size* size) {
     return TEE_AsymmetricSignDigest(operation.get(), nullptr, 0, digest.data(),
                                     static_cast<tee_size>(digest.size()), buffer, size);
@@ -75,20 +57,17 @@ int32_t sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
   tee_size size = 0;
   TEE_Result res = sign(nullptr, &size);
   if (res == TEE_ERROR_SHORT_BUFFER) {
-    if (!signature->allocate(size)) return DER_NO_MEMORY;
+    if (!signature->allocate(size)) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
     res = sign(signature->data(), &size);
   }
-  if (res != TEE_SUCCESS) {
-    trace_error("AsymmetricSignDigest failed with 0x%08x\n", res);
-    return as_writer_code(res);
-  }
+  if (res != TEE_SUCCESS) return fail(res, "AsymmetricSignDigest failed with 0x%08x\n", res);
   signature->truncate(size);
-  return 0;
+  return DONE;
 }
 
 }  // namespace
 
-TEE_Result get_attest_key(uint32_t, tee_object* key, keymaster_error_t* km_error) {
+outcome get_attest_key(uint32_t, tee_object* key) {
   const trace_scope scope;
   const TEE_Attribute attributes[] = {
       ref_attribute(TEE_ATTR_RSA_MODULUS, ATTESTATION_KEY.modulus),
@@ -98,37 +77,32 @@ TEE_Result get_attest_key(uint32_t, tee_object* key, keymaster_error_t* km_error
   tee_object loaded;
   TEE_Result res = loaded.allocate(TEE_TYPE_RSA_KEYPAIR, ATTEST_KEY_BITS);
   if (res == TEE_SUCCESS) res = loaded.populate(attributes);
-  if (res != TEE_SUCCESS) {
-    if (*km_error == KM_ERROR_OK) *km_error = KM_ERROR_UNKNOWN_ERROR;
-    return res;
-  }
+  if (res != TEE_SUCCESS) return {res, KM_ERROR_UNKNOWN_ERROR};
   *key = std::move(loaded);
-  return TEE_SUCCESS;
+  return DONE;
 }
 
-int32_t X509_CINF_sign(const X509_CINF* cinf, const tee_object& key, byte_span output) {
+outcome X509_CINF_sign(const X509_CINF* cinf, const tee_object& key, heap_buffer* certificate) {
   const trace_scope scope;
-  const signature_algorithm* algorithm = find_signature_algorithm(cinf->signature.algorithm);
-  if (algorithm == nullptr) return as_writer_code(TEE_ERROR_NOT_SUPPORTED);
+  const ASN1_OID* id = cinf->signature.algorithm;
+  const auto* algorithm = std::ranges::find(SIGNATURE_ALGORITHMS, id, &signature_algorithm::id);
+  if (algorithm == std::end(SIGNATURE_ALGORITHMS)) return TEE_ERROR_NOT_SUPPORTED;
   heap_buffer encoding;
-  const int32_t encoded = asn1_encode_growing(X509_CINF_TYPE, cinf, FIRST_BUFFER_SIZE, &encoding);
-  if (encoded < 0) return encoded;
-
+  TRY(der_error(asn1_encode_growing(X509_CINF_TYPE, cinf, FIRST_BUFFER_SIZE, &encoding)));
   heap_buffer digest;
   heap_buffer signature;
-  if (int32_t code = digest_encoding(algorithm->digest, encoding.view(), &digest)) return code;
-  if (int32_t code = sign_digest(algorithm->signature, key, digest.view(), &signature)) {
-    return code;
-  }
-  const asn1_owner<X509_CERT, X509_CERT_free> certificate(X509_CERT_alloc());
-  if (!certificate) return DER_NO_MEMORY;
-  certificate->cinf = cinf;
-  X509_ALGOR_set_rsa(&certificate->algorithm, cinf->signature.algorithm);
-  if (int32_t code = ASN1_BIT_STRING_set(&certificate->signature, signature.size() * uint64_t{8},
-                                         signature.view())) {
-    return code;
-  }
-  return X509_CERT_write(certificate.get(), output.data(), output.size());
+  TRY(digest_encoding(algorithm->digest, encoding.view(), &digest));
+  TRY(sign_digest(algorithm->signature, key, digest.view(), &signature));
+  const asn1_owner<X509_CERT, X509_CERT_free> signed_cinf(X509_CERT_alloc());
+  if (!signed_cinf) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+  signed_cinf->cinf = cinf;
+  X509_ALGOR_set_rsa(&signed_cinf->algorithm, id);
+  TRY(der_error(ASN1_BIT_STRING_set(&signed_cinf->signature, signature.size() * uint64_t{8},
+                                    signature.view())));
+  const int32_t length = asn1_encode(X509_CERT_TYPE, signed_cinf.get(), certificate->span());
+  TRY(der_error(length));
+  certificate->truncate(static_cast<size_t>(length));
+  return DONE;
 }
 
 }  // namespace keymaster

@@ -4,16 +4,16 @@
 #include "ta/auth/clock.h"
 #include "ta/auth/token.h"
 #include "ta/auth/use_log.h"
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 
 namespace keymaster {
 
 TEE_Result authorizaiton_init() {
   const trace_scope scope;
-  if (TEE_Result res = auth_tokens_init()) return res;
+  TRY(auth_tokens_init());
   if (!use_log_init()) {
     auth_tokens_destroy();
-    return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
+    return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   }
   clock_init();
   return TEE_SUCCESS;

@@ -56,13 +56,13 @@ keymaster_error_t read_user_auth(const keymaster_key_param_set_t& request, uint6
 keymaster_error_t check_secure_id(uint64_t secure_id, const keymaster_key_param_set_t& key_params,
                                   user_auth_t* user) {
   if (get_unique(key_params, KM_TAG_NO_AUTH_REQUIRED) != nullptr) {
-    return KM_REFUSE(KM_ERROR_INVALID_ARGUMENT,
-                     "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED");
+    return refuse(KM_ERROR_INVALID_ARGUMENT,
+                  "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED");
   }
   const keymaster_key_param_t* auth_type = get_unique(key_params, KM_TAG_USER_AUTH_TYPE);
   if (auth_type == nullptr) {
-    return KM_REFUSE(KM_ERROR_INVALID_ARGUMENT,
-                     "Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE");
+    return refuse(KM_ERROR_INVALID_ARGUMENT,
+                  "Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE");
   }
   user->is_demanded = true;
   user->is_given = user->is_given ||
@@ -76,15 +76,14 @@ keymaster_error_t ask_operation(begin_check_t* check) {
   const trace_scope begin("begin");
   const algorithm_t* algorithm = find_algorithm(check->algorithm);
   if (algorithm == nullptr) {
-    trace_error("Algorithm %d not implemented", static_cast<int>(check->algorithm));
-    return KM_ERROR_UNSUPPORTED_ALGORITHM;
+    return refuse(KM_ERROR_UNSUPPORTED_ALGORITHM, "Algorithm %d not implemented",
+                  static_cast<int>(check->algorithm));
   }
   const operation_methods_t* methods = algorithm->get_operation_methods(check->purpose);
   if (methods == nullptr || methods->get_padding == nullptr || methods->get_block_mode == nullptr ||
       methods->get_digest == nullptr) {
-    trace_error("Algorithm %s purpose %d not implemented", algorithm->name,
-                static_cast<int>(check->purpose));
-    return KM_ERROR_UNSUPPORTED_PURPOSE;
+    return refuse(KM_ERROR_UNSUPPORTED_PURPOSE, "Algorithm %s purpose %d not implemented",
+                  algorithm->name, static_cast<int>(check->purpose));
   }
   check->padding.is_allowed = !methods->get_padding(check->request, &check->padding.value);
   check->block_mode.is_allowed = !methods->get_block_mode(check->request, &check->block_mode.value);
@@ -99,18 +98,18 @@ keymaster_error_t check_mac_length(const begin_check_t& check, uint32_t minimum_
       (check.algorithm == KM_ALGORITHM_AES && check.block_mode.value == KM_MODE_GCM);
   const keymaster_key_param_t* bits = get_unique(check.request, KM_TAG_MAC_LENGTH);
   if (!makes_mac || bits == nullptr || minimum_bits <= bits->integer) return KM_ERROR_OK;
-  return KM_REFUSE(KM_ERROR_INVALID_MAC_LENGTH, "MAC length %d below the key's minimum %d",
-                   static_cast<int>(bits->integer), static_cast<int>(minimum_bits));
+  return refuse(KM_ERROR_INVALID_MAC_LENGTH, "MAC length %d below the key's minimum %d",
+                static_cast<int>(bits->integer), static_cast<int>(minimum_bits));
 }
 
 keymaster_error_t check_active(uint64_t active_ms) {
   if (current_time_ms() >= active_ms) return KM_ERROR_OK;
-  return KM_REFUSE(KM_ERROR_KEY_NOT_YET_VALID, "Key not yet valid");
+  return refuse(KM_ERROR_KEY_NOT_YET_VALID, "Key not yet valid");
 }
 
 keymaster_error_t check_expiry(uint64_t expire_ms) {
   if (current_time_ms() <= expire_ms) return KM_ERROR_OK;
-  return KM_REFUSE(KM_ERROR_KEY_EXPIRED, "Key expired");
+  return refuse(KM_ERROR_KEY_EXPIRED, "Key expired");
 }
 
 // Whether the purpose makes something new (which the origination date ends) rather than opening
@@ -127,7 +126,7 @@ keymaster_error_t check_rate_limit(const key_identity_t& identity, uint32_t min_
   TEE_Time now{};
   TEE_GetSystemTime(&now);
   if (now.seconds - last.seconds > min_seconds) return KM_ERROR_OK;
-  return KM_REFUSE(KM_ERROR_KEY_RATE_LIMIT_EXCEEDED, "key rate limit exceeded");
+  return refuse(KM_ERROR_KEY_RATE_LIMIT_EXCEEDED, "key rate limit exceeded");
 }
 
 // One parameter of the key, as the walk comes to it.
@@ -162,7 +161,7 @@ keymaster_error_t check_param(const keymaster_key_param_t& param, begin_check_t*
     case KM_TAG_USER_SECURE_ID:
       return check_secure_id(param.long_integer, check->key_params, &check->user);
     case KM_TAG_BOOTLOADER_ONLY:
-      return KM_REFUSE(KM_ERROR_INVALID_KEY_BLOB, "Bootloader only key");
+      return refuse(KM_ERROR_INVALID_KEY_BLOB, "Bootloader only key");
     default:
       return KM_ERROR_OK;
   }
@@ -181,7 +180,7 @@ keymaster_error_t check_allowed(const begin_check_t& check) {
       {check.digest.is_allowed, KM_ERROR_INCOMPATIBLE_DIGEST, "digest"},
   };
   for (const auto& [is_allowed, error, what] : demands) {
-    if (!is_allowed) return KM_REFUSE(error, "No such %s in key_params", what);
+    if (!is_allowed) return refuse(error, "No such %s in key_params", what);
   }
   return KM_ERROR_OK;
 }
@@ -191,7 +190,7 @@ keymaster_error_t check_allowed(const begin_check_t& check) {
 keymaster_error_t check_begin_auth(const begin_check_t& check) {
   if (!check.user.is_due()) return KM_ERROR_OK;
   if (get_unique(check.key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) {
-    return KM_REFUSE(KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
+    return refuse(KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
   }
   trace(TEE_TRACE_INFO, "OP AUTH NEEDED");
   return KM_AUTHENTICATION_DUE;
@@ -202,38 +201,24 @@ keymaster_error_t check_caller_nonce(const begin_check_t& check) {
       get_unique(check.key_params, KM_TAG_CALLER_NONCE) != nullptr) {
     return KM_ERROR_OK;
   }
-  return KM_REFUSE(KM_ERROR_CALLER_NONCE_PROHIBITED, "Caller nonce prohibited");
+  return refuse(KM_ERROR_CALLER_NONCE_PROHIBITED, "Caller nonce prohibited");
 }
 
 keymaster_error_t check_begin(begin_check_t* check) {
   constexpr uint64_t ANY_CHALLENGE = 0;
-  if (auto error = read_user_auth(check->request, ANY_CHALLENGE, &check->user)) return error;
-  if (auto error = ask_operation(check)) return error;
+  TRY(read_user_auth(check->request, ANY_CHALLENGE, &check->user));
+  TRY(ask_operation(check));
   for (const keymaster_key_param_t& param : check->key_params) {
-    if (auto error = check_param(param, check)) return error;
+    TRY(check_param(param, check));
   }
-  if (auto error = check_allowed(*check)) return error;
-  const keymaster_error_t outcome = check_begin_auth(*check);
-  if (outcome != KM_ERROR_OK && outcome != KM_AUTHENTICATION_DUE) return outcome;
-  if (auto error = check_caller_nonce(*check)) return error;
+  TRY(check_allowed(*check));
+  const keymaster_error_t due = check_begin_auth(*check);
+  if (due != KM_ERROR_OK && due != KM_AUTHENTICATION_DUE) return due;
+  TRY(check_caller_nonce(*check));
   // A full log does not refuse: the limit then goes unenforced until a record is free.
   const auto* min_seconds = get_unique(check->key_params, KM_TAG_MIN_SECONDS_BETWEEN_OPS);
   if (min_seconds != nullptr) record_key_use(check->identity, min_seconds->integer);
-  return outcome;
-}
-
-keymaster_error_t check_operation_auth(const keymaster_key_param_set_t& request,
-                                       const keymaster_key_param_set_t& key_params,
-                                       uint64_t challenge) {
-  if (get_unique(key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) return KM_ERROR_OK;
-  user_auth_t user{};
-  if (auto error = read_user_auth(request, challenge, &user)) return error;
-  for (const keymaster_key_param_t& param : key_params) {
-    if (param.tag != KM_TAG_USER_SECURE_ID) continue;
-    if (auto error = check_secure_id(param.long_integer, key_params, &user)) return error;
-  }
-  if (!user.is_due()) return KM_ERROR_OK;
-  return KM_REFUSE(KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
+  return due;
 }
 
 // What anyone can do with the public half is never restricted.
@@ -259,44 +244,48 @@ bool check_app_id_and_app_data(const keymaster_key_param_set_t& key_params, byte
     if (!contains_tag(key_params, tag)) continue;
     const keymaster_key_param_t* bound = get_unique(key_params, tag);
     if (bound == nullptr) {
-      TRACE_ERROR("Duplicated %s", name);
+      trace(TEE_TRACE_ERROR, "Duplicated %s", name);
       return false;
     }
     if (!equal_constant_time(bound->blob(), given)) {
-      TRACE_ERROR("%s mismatch", name);
+      trace(TEE_TRACE_ERROR, "%s mismatch", name);
       return false;
     }
   }
   return true;
 }
 
-TEE_Result authorize_begin(byte_view key_blob, uint32_t purpose,
-                           const keymaster_key_param_set_t& begin_params,
-                           const keymaster_key_param_set_t& key_params,
-                           keymaster_error_t* km_error) {
+outcome authorize_begin(byte_view key_blob, uint32_t purpose,
+                        const keymaster_key_param_set_t& begin_params,
+                        const keymaster_key_param_set_t& key_params) {
   const trace_scope scope;
   const keymaster_key_param_t* algorithm = get_unique(key_params, KM_TAG_ALGORITHM);
   if (algorithm == nullptr) {
-    return KM_FAIL(km_error, KM_ERROR_INVALID_KEY_BLOB,
-                   "No or too many KM_TAG_ALGORITHM in key_params");
+    return refuse(KM_ERROR_INVALID_KEY_BLOB, "No or too many KM_TAG_ALGORITHM in key_params");
   }
-  *km_error = KM_ERROR_OK;
-  if (is_public_key_use(algorithm->enumerated, purpose)) return TEE_SUCCESS;
+  if (is_public_key_use(algorithm->enumerated, purpose)) return DONE;
   begin_check_t check{.request = begin_params,
                       .key_params = key_params,
                       .algorithm = algorithm->enumerated,
                       .purpose = purpose};
-  if (TEE_Result res = identify_key(key_blob, &check.identity)) return res;
-  *km_error = check_begin(&check);
-  return TEE_SUCCESS;
+  TRY(identify_key(key_blob, &check.identity));
+  return check_begin(&check);
 }
 
-TEE_Result authorize_update_or_finish(const keymaster_key_param_set_t& request_params,
-                                      const keymaster_key_param_set_t& key_params,
-                                      uint64_t challenge, keymaster_error_t* km_error) {
+keymaster_error_t authorize_update_or_finish(const keymaster_key_param_set_t& request_params,
+                                             const keymaster_key_param_set_t& key_params,
+                                             uint64_t challenge) {
   const trace_scope scope;
-  *km_error = check_operation_auth(request_params, key_params, challenge);
-  return TEE_SUCCESS;
+  if (get_unique(key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) return KM_ERROR_OK;
+  user_auth_t user{};
+  TRY(read_user_auth(request_params, challenge, &user));
+  for (const keymaster_key_param_t& param : key_params) {
+    if (param.tag == KM_TAG_USER_SECURE_ID) {
+      TRY(check_secure_id(param.long_integer, key_params, &user));
+    }
+  }
+  if (!user.is_due()) return KM_ERROR_OK;
+  return refuse(KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
 }
 
 }  // namespace keymaster

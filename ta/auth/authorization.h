@@ -5,7 +5,7 @@
 #include <cstdint>
 
 #include "ta/base/bytes.h"
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/params/param_set.h"
 
 namespace keymaster {
@@ -16,24 +16,21 @@ namespace keymaster {
                                              byte_view app_id, byte_view app_data);
 
 // authorize_begin: all checks of an operation's start. `key_blob` identifies the key in the use log
-// and must be the copy that `key_params` come from. *km_error: KM_ERROR_OK to proceed;
-// KM_AUTHENTICATION_DUE to proceed while update and finish each ask for a token; negative to
-// refuse. A use that counts against KM_TAG_MAX_USES_PER_BOOT is counted when the walk over the
-// key's parameters meets that tag, even if a later check refuses. Fails with the platform's code
-// only when a blob too long for the use log cannot be digested. `at` is the caller, in whose name
-// missing algorithms and purposes are traced.
-[[nodiscard]] TEE_Result authorize_begin(byte_view key_blob, uint32_t purpose,
-                                         const keymaster_key_param_set_t& begin_params,
-                                         const keymaster_key_param_set_t& key_params,
-                                         keymaster_error_t* km_error);
+// and must be the copy that `key_params` come from. DONE to proceed; KM_AUTHENTICATION_DUE to
+// proceed while update and finish each ask for a token; a negative error to refuse. A use that
+// counts against KM_TAG_MAX_USES_PER_BOOT is counted when the walk over the key's parameters meets
+// that tag, even if a later check refuses. Fails with the platform's code only when a blob too long
+// for the use log cannot be digested. Missing algorithms and purposes are traced as begin's.
+outcome authorize_begin(byte_view key_blob, uint32_t purpose,
+                        const keymaster_key_param_set_t& begin_params,
+                        const keymaster_key_param_set_t& key_params);
 
 // authorize_update_or_finish: the user authentication that a key without KM_TAG_AUTH_TIMEOUT asks
 // for at each update and finish: a token for this very operation. `challenge` is the operation's
-// handle. *km_error: KM_ERROR_OK, KM_ERROR_INVALID_ARGUMENT for an invalid token or a key whose
-// tags contradict each other, KM_ERROR_KEY_USER_NOT_AUTHENTICATED. Always TEE_SUCCESS.
-[[nodiscard]] TEE_Result authorize_update_or_finish(const keymaster_key_param_set_t& request_params,
-                                                    const keymaster_key_param_set_t& key_params,
-                                                    uint64_t challenge,
-                                                    keymaster_error_t* km_error);
+// handle. KM_ERROR_OK, KM_ERROR_INVALID_ARGUMENT for an invalid token or a key whose tags
+// contradict each other, KM_ERROR_KEY_USER_NOT_AUTHENTICATED.
+[[nodiscard]] keymaster_error_t authorize_update_or_finish(
+    const keymaster_key_param_set_t& request_params, const keymaster_key_param_set_t& key_params,
+    uint64_t challenge);
 
 }  // namespace keymaster

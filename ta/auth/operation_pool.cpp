@@ -47,31 +47,26 @@ pool_slot_t* find_live_slot(uint32_t handle) {
 
 }  // namespace
 
-TEE_Result operation_pool_init() {
+void operation_pool_init() {
   for (pool_slot_t& slot : slots)
     slot = {.operation = nullptr, .handle = 0, .is_free = true};
-  return TEE_SUCCESS;
 }
 
-TEE_Result operation_pool_add(operation_t* operation, uint32_t* handle,
-                              keymaster_error_t* km_error) {
+keymaster_error_t operation_pool_add(operation_t* operation, uint32_t* handle) {
   const trace_scope scope;
   *handle = 0;
   pool_slot_t* slot = find_free_slot();
-  if (slot == nullptr) {
-    return KM_FAIL(km_error, KM_ERROR_TOO_MANY_OPERATIONS, "Too many operations");
-  }
+  if (slot == nullptr) return refuse(KM_ERROR_TOO_MANY_OPERATIONS, "Too many operations");
   *slot = {.operation = operation, .handle = draw_handle(), .is_free = false};
   *handle = slot->handle;
-  *km_error = KM_ERROR_OK;
-  return TEE_SUCCESS;
+  return KM_ERROR_OK;
 }
 
 void operation_pool_remove(uint32_t handle) {
   const trace_scope scope;
   pool_slot_t* slot = find_live_slot(handle);
   if (slot == nullptr) {
-    TRACE_ERROR("Try to free invalid operation handle");
+    trace(TEE_TRACE_ERROR, "Try to free invalid operation handle");
     return;
   }
   slot->operation = nullptr;
@@ -82,7 +77,7 @@ operation_t* operation_pool_get(uint32_t handle) {
   const trace_scope scope;
   const pool_slot_t* slot = find_live_slot(handle);
   if (slot == nullptr) {
-    TRACE_ERROR("Operation handle not found");
+    trace(TEE_TRACE_ERROR, "Operation handle not found");
     return nullptr;
   }
   return slot->operation;

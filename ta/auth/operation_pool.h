@@ -9,15 +9,12 @@
 namespace keymaster {
 
 // operation_pool_init: empties the pool, whatever an earlier instance in this process left in it.
-// Always TEE_SUCCESS.
-[[nodiscard]] TEE_Result operation_pool_init();
+void operation_pool_init();
 
 // operation_pool_add: enters `operation` in the lowest free slot under a new random handle, never 0
-// and never one that a slot still remembers. *handle is 0 and *km_error is
-// KM_ERROR_TOO_MANY_OPERATIONS when all slots are taken. The pool does not own the operation.
-// Always TEE_SUCCESS.
-[[nodiscard]] TEE_Result operation_pool_add(operation_t* operation, uint32_t* handle,
-                                            keymaster_error_t* km_error);
+// and never one that a slot still remembers. KM_ERROR_TOO_MANY_OPERATIONS, with *handle 0, when all
+// slots are taken. The pool does not own the operation.
+[[nodiscard]] keymaster_error_t operation_pool_add(operation_t* operation, uint32_t* handle);
 
 // operation_pool_remove: frees the handle's slot; the operation is the caller's to free. An unknown
 // handle is traced, nothing else.

@@ -6,6 +6,7 @@
 
 #include "ta/auth/clock.h"
 #include "ta/base/heap.h"
+#include "ta/base/outcome.h"
 #include "ta/base/tee_handles.h"
 
 namespace keymaster {
@@ -43,17 +44,11 @@ bool shares_type(const auth_token_t& token, uint32_t auth_type) {
 }
 
 TEE_Result make_token_key(tee_object* key) {
-  if (TEE_Result res = key->allocate(TEE_TYPE_HMAC_SHA256, TOKEN_KEY_BITS)) return res;
-  uint8_t seed[SEED_SIZE];
-  TEE_Result res = GetBootSeed(seed, sizeof(seed));
-  if (res == TEE_SUCCESS) {
-    const TEE_Attribute secret[] = {ref_attribute(TEE_ATTR_SECRET_VALUE, seed)};
-    res = key->populate(secret);
-  } else {
-    trace_error("GetBootSeed failed with 0x%08x\n", res);
-  }
-  wipe(seed);
-  return res;
+  TRY(key->allocate(TEE_TYPE_HMAC_SHA256, TOKEN_KEY_BITS));
+  secret_bytes<SEED_SIZE> seed;
+  TRY(checked(GetBootSeed(seed.data(), seed.size()), "GetBootSeed"));
+  const TEE_Attribute secret = ref_attribute(TEE_ATTR_SECRET_VALUE, seed);
+  return key->populate({&secret, 1});
 }
 
 bool is_younger(const auth_token_t& token, uint32_t timeout) {
@@ -79,12 +74,9 @@ TEE_Result auth_tokens_init() {
   token_key = TEE_HANDLE_NULL;
   token_cache = nullptr;
   tee_object key;
-  if (TEE_Result res = make_token_key(&key)) return res;
+  TRY(make_token_key(&key));
   token_cache = static_cast<cache_entry_t*>(heap_take(CACHE_ENTRIES * sizeof(cache_entry_t)));
-  if (token_cache == nullptr) {
-    trace_error("Out of memory");
-    return TEE_ERROR_OUT_OF_MEMORY;
-  }
+  if (token_cache == nullptr) return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   for (cache_entry_t& entry : cache())
     entry.is_free = 1;
   token_key = key.release();
@@ -101,20 +93,20 @@ void auth_tokens_destroy() {
 bool check_auth_token_valid(byte_view token) {
   const trace_scope scope;
   if (token.size() != AUTH_TOKEN_SIZE) {
-    TRACE_ERROR("Wrong auth token size, expected %dB, got %dB", static_cast<int>(AUTH_TOKEN_SIZE),
-                static_cast<int>(token.size()));
+    trace(TEE_TRACE_ERROR, "Wrong auth token size, expected %dB, got %dB",
+          static_cast<int>(AUTH_TOKEN_SIZE), static_cast<int>(token.size()));
     return false;
   }
   const auth_token_t parsed = parse(token);
   if (parsed.version != TOKEN_VERSION) {
-    TRACE_ERROR("Wrong auth token version, expected %d, got %d", TOKEN_VERSION, parsed.version);
+    trace(TEE_TRACE_ERROR, "Wrong auth token version, expected %d, got %d", TOKEN_VERSION,
+          parsed.version);
     return false;
   }
-  uint8_t mac[AUTH_TOKEN_MAC_SIZE];
+  secret_bytes<AUTH_TOKEN_MAC_SIZE> mac;  // what a forger of this token would need
   const bool valid = ComputeSignature(mac, token_key, token.first(SIGNED_SIZE)) &&
                      equal_constant_time(mac, parsed.mac);
-  wipe(mac);  // what a forger of this token would need
-  if (!valid) TRACE_ERROR("Wrong auth token MAC");
+  if (!valid) trace(TEE_TRACE_ERROR, "Wrong auth token MAC");
   return valid;
 }
 
@@ -129,8 +121,8 @@ bool ComputeSignature(std::span<uint8_t, AUTH_TOKEN_MAC_SIZE> out, TEE_ObjectHan
   size_t length = 0;
   if (hmac.mac_final(data, out, &length) != TEE_SUCCESS) return false;
   if (length != out.size()) {
-    TRACE_ERROR("Wrong MAC length, expected %dB, got %dB\n", static_cast<int>(out.size()),
-                static_cast<int>(length));
+    trace(TEE_TRACE_ERROR, "Wrong MAC length, expected %dB, got %dB\n",
+          static_cast<int>(out.size()), static_cast<int>(length));
     wipe(out);
     return false;
   }
@@ -153,7 +145,7 @@ bool check_auth(uint64_t secure_id, uint64_t challenge, byte_view token,
   } else if (challenge != 0 && challenge != given.challenge) {
     mismatch = "Challenge mismatch";
   }
-  if (mismatch != nullptr) TRACE_ERROR("%s", mismatch);
+  if (mismatch != nullptr) trace(TEE_TRACE_ERROR, "%s", mismatch);
   return mismatch == nullptr;
 }
 

@@ -35,7 +35,7 @@ static_assert(offsetof(auth_token_t, mac) == 37);
 
 // auth_tokens_init: makes the token key from the boot seed, and an empty token cache; what an
 // earlier instance in this process left is forgotten, not freed. The platform's code or
-// TEE_ERROR_OUT_OF_MEMORY; nothing stays allocated then. Messages go out under `at`.
+// TEE_ERROR_OUT_OF_MEMORY; nothing stays allocated then.
 [[nodiscard]] TEE_Result auth_tokens_init();
 
 // auth_tokens_destroy: frees key and cache.

@@ -4,7 +4,7 @@
 #include <span>
 
 #include "ta/base/heap.h"
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/base/tee_handles.h"
 
 namespace keymaster {
@@ -66,7 +66,7 @@ TEE_Result identify_key(byte_view key_blob, key_identity_t* identity) {
   identity->key_blob = key_blob;
   if (key_blob.size() <= USE_LOG_KEY_SIZE) return TEE_SUCCESS;
   tee_operation sha256;
-  if (TEE_Result res = sha256.allocate(TEE_ALG_SHA256, TEE_MODE_DIGEST, 0)) return res;
+  TRY(sha256.allocate(TEE_ALG_SHA256, TEE_MODE_DIGEST, 0));
   size_t length = 0;
   return sha256.digest_final(key_blob, identity->digest, &length);
 }
@@ -87,10 +87,10 @@ keymaster_error_t check_use_count_and_add(const key_identity_t& key, uint32_t ma
   TEE_GetSystemTime(&now);
   use_record_t* record = find_record(key);
   if (record != nullptr && record->use_count >= max_uses) {
-    return KM_REFUSE(KM_ERROR_KEY_MAX_OPS_EXCEEDED, "Key max ops exceeded");
+    return refuse(KM_ERROR_KEY_MAX_OPS_EXCEEDED, "Key max ops exceeded");
   }
   if (record == nullptr) record = take_record(key, now.seconds);
-  if (record == nullptr) return KM_REFUSE(KM_ERROR_TOO_MANY_OPERATIONS, "Too many use log");
+  if (record == nullptr) return refuse(KM_ERROR_TOO_MANY_OPERATIONS, "Too many use log");
   record->use_count++;
   return KM_ERROR_OK;
 }

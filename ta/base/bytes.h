@@ -3,6 +3,7 @@
 
 #include "tee_internal_api.h"
 
+#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <span>
@@ -24,6 +25,15 @@ void copy_bytes(byte_span to, byte_view from);
 
 // wipe: overwrites the bytes with zeros in a way that the compiler keeps.
 void wipe(byte_span bytes);
+
+// secret_bytes: a secret of N bytes on the stack, wiped when its scope ends.
+template <size_t N>
+struct secret_bytes : std::array<uint8_t, N> {
+  secret_bytes() : std::array<uint8_t, N>{} {}
+  secret_bytes(const secret_bytes&) = delete;
+  secret_bytes& operator=(const secret_bytes&) = delete;
+  ~secret_bytes() { wipe(*this); }
+};
 
 // equal_constant_time: whether both ranges have the same length and bytes. The time taken depends
 // on the lengths alone. The one comparison for whatever an attacker may guess at.

@@ -37,6 +37,9 @@ constexpr outcome DONE;
 [[nodiscard]] keymaster_error_t refuse(with_line<keymaster_error_t> code, const char* format, ...)
     __attribute__((format(printf, 2, 3), cold));
 
+// checked: the result of a platform call; a failure is traced as "<call> failed with 0x%08x".
+[[nodiscard]] TEE_Result checked(with_line<TEE_Result> res, const char* call);
+
 // TRY(step): leaves the function with the step's result if it failed. The step gives an outcome or
 // one of its codes.
 #define TRY(...) \

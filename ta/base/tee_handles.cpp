@@ -1,18 +1,9 @@
 // Owners of the platform's objects and operations.
 #include "ta/base/tee_handles.h"
 
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 
 namespace keymaster {
-namespace {
-
-// The common end of every call below: `name` is the platform call's, as it stands in the message.
-TEE_Result checked(TEE_Result res, const char* name) {
-  if (res != TEE_SUCCESS) trace_error("%s failed with 0x%08x\n", name, res);
-  return res;
-}
-
-}  // namespace
 
 TEE_Attribute ref_attribute(uint32_t id, byte_view bytes) {
   TEE_Attribute attribute{};

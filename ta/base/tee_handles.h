@@ -1,5 +1,5 @@
 // Owners of the platform's objects and operations. Each has a zero state in which every
-// call that cleans up is legal. Methods trace a failure under the caller's function and line.
+// call that cleans up is legal. Methods trace a failure in their caller's name.
 #pragma once
 
 #include "tee_internal_api.h"
@@ -7,7 +7,6 @@
 #include <utility>
 
 #include "ta/base/bytes.h"
-#include "ta/base/results.h"
 
 namespace keymaster {
 

@@ -77,6 +77,11 @@ TEE_Result fail(with_line<TEE_Result> code, const char* format, ...) {
   return code.code;
 }
 
+TEE_Result checked(with_line<TEE_Result> res, const char* call) {
+  return res.code == TEE_SUCCESS ? TEE_SUCCESS
+                                 : fail(res, "%s failed with 0x%08x\n", call, res.code);
+}
+
 keymaster_error_t refuse(with_line<keymaster_error_t> code, const char* format, ...) {
   va_list arguments;
   va_start(arguments, format);

@@ -2,6 +2,7 @@
 #pragma once
 
 #include "ta/base/bytes.h"
+#include "ta/base/outcome.h"
 #include "ta/params/param_set.h"
 
 namespace keymaster {
@@ -16,33 +17,32 @@ struct command_io {
   size_t output_size = 0;  // bytes of `output` that were produced; counts on success alone
 };
 
-// A handler returns a TEE code and writes a Keymaster code; what a failure does to the output is in
-// the command table.
-using command_handler = TEE_Result (*)(command_io* io, keymaster_error_t* km_error);
+// What a failure of a handler does to the output is in the command table.
+using command_handler = outcome (*)(command_io* io);
 
 // One handler a command, under the command's name, which is also the name it traces under.
 // docs/command-interface.md has the layout of every buffer.
 namespace commands {
 
-TEE_Result generate_key(command_io* io, keymaster_error_t* km_error);
-TEE_Result get_key_character_size(command_io* io, keymaster_error_t* km_error);
-TEE_Result get_key_character(command_io* io, keymaster_error_t* km_error);
-TEE_Result begin(command_io* io, keymaster_error_t* km_error);
-TEE_Result update(command_io* io, keymaster_error_t* km_error);
-TEE_Result finish(command_io* io, keymaster_error_t* km_error);
-TEE_Result import_key(command_io* io, keymaster_error_t* km_error);
-TEE_Result export_key(command_io* io, keymaster_error_t* km_error);
-TEE_Result delete_key(command_io* io, keymaster_error_t* km_error);
-TEE_Result delete_all_key(command_io* io, keymaster_error_t* km_error);
-TEE_Result _abort(command_io* io, keymaster_error_t* km_error);
-TEE_Result attest_key(command_io* io, keymaster_error_t* km_error);
-TEE_Result configure(command_io* io, keymaster_error_t* km_error);
-TEE_Result upgrade_key(command_io* io, keymaster_error_t* km_error);
-TEE_Result soter_handle_generate_attk_key_pair(command_io* io, keymaster_error_t* km_error);
-TEE_Result soter_handle_verify_attk_key_pair(command_io* io, keymaster_error_t* km_error);
-TEE_Result soter_handle_export_attk_public_key(command_io* io, keymaster_error_t* km_error);
-TEE_Result soter_handle_get_device_id(command_io* io, keymaster_error_t* km_error);
-TEE_Result soter_handle_setFid(command_io* io, keymaster_error_t* km_error);
+outcome generate_key(command_io* io);
+outcome get_key_character_size(command_io* io);
+outcome get_key_character(command_io* io);
+outcome begin(command_io* io);
+outcome update(command_io* io);
+outcome finish(command_io* io);
+outcome import_key(command_io* io);
+outcome export_key(command_io* io);
+outcome delete_key(command_io* io);
+outcome delete_all_key(command_io* io);
+outcome _abort(command_io* io);
+outcome attest_key(command_io* io);
+outcome configure(command_io* io);
+outcome upgrade_key(command_io* io);
+outcome soter_handle_generate_attk_key_pair(command_io* io);
+outcome soter_handle_verify_attk_key_pair(command_io* io);
+outcome soter_handle_export_attk_public_key(command_io* io);
+outcome soter_handle_get_device_id(command_io* io);
+outcome soter_handle_setFid(command_io* io);
 
 }  // namespace commands
 }  // namespace keymaster

@@ -4,7 +4,7 @@
 
 #include "tee_internal_api.h"
 
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/commands/command.h"
 #include "ta/commands/configured.h"
 
@@ -85,19 +85,12 @@ bool has_output(const command_row& row) {
 
 TEE_Result check_parameters(const command_row& row, uint32_t types, const TEE_Param* params) {
   if (types != row.types) {
-    if (row.types == IN_ONLY) {
-      trace_error("Bad argument type 0x%x\n", types);
-    } else {
-      trace_error("Bad argument type\n");
-    }
-    return TEE_ERROR_BAD_PARAMETERS;
+    return row.types == IN_ONLY ? fail(TEE_ERROR_BAD_PARAMETERS, "Bad argument type 0x%x\n", types)
+                                : fail(TEE_ERROR_BAD_PARAMETERS, "Bad argument type\n");
   }
   const bool a_refused = row.slot0 == BOTH_ZERO && params[0].value.a != 0;
   const bool b_refused = row.slot0 != UNUSED && params[0].value.b != 0;
-  if (a_refused || b_refused) {
-    trace_error("Bad argument\n");
-    return TEE_ERROR_BAD_PARAMETERS;
-  }
+  if (a_refused || b_refused) return fail(TEE_ERROR_BAD_PARAMETERS, "Bad argument\n");
   return TEE_SUCCESS;
 }
 
@@ -116,14 +109,12 @@ command_io unpack(const command_row& row, const TEE_Param* params) {
   return io;
 }
 
-TEE_Result run(const command_row& row, command_io* io, keymaster_error_t* km_error) {
+outcome run(const command_row& row, command_io* io) {
   if (row.needs_configured && !configured().is_configured) {
     const trace_scope scope(row.name);
-    trace_error("Not configured");
-    *km_error = KM_ERROR_KEYMASTER_NOT_CONFIGURED;
-    return TEE_SUCCESS;
+    return refuse(KM_ERROR_KEYMASTER_NOT_CONFIGURED, "Not configured");
   }
-  return row.handler(io, km_error);
+  return row.handler(io);
 }
 
 void settle_output(const command_row& row, const command_io& io, bool done, TEE_Param* params) {
@@ -143,22 +134,18 @@ void settle_output(const command_row& row, const command_io& io, bool done, TEE_
 
 TEE_Result dispatch(uint32_t command, uint32_t types, TEE_Param* params) {
   const command_row* row = find_command(command);
-  if (row == nullptr) {
-    trace_error("Unknown command %x\n", command);
-    return TEE_ERROR_BAD_PARAMETERS;
-  }
+  if (row == nullptr) return fail(TEE_ERROR_BAD_PARAMETERS, "Unknown command %x\n", command);
   trace(TEE_TRACE_INFO, "%s", row->name);
-  if (TEE_Result res = check_parameters(*row, types, params)) return res;
+  TRY(check_parameters(*row, types, params));
 
   command_io io = unpack(*row, params);
-  keymaster_error_t km_error = KM_ERROR_OK;
-  const TEE_Result res = run(*row, &io, &km_error);
-  settle_output(*row, io, !failed(res, km_error), params);
+  const outcome how = run(*row, &io);
+  settle_output(*row, io, !failed(how), params);
   if (row->slot0 != UNUSED) {
-    params[0].value.a = static_cast<uint32_t>(km_error);
+    params[0].value.a = static_cast<uint32_t>(how.error);
     params[0].value.b = io.result;
   }
-  return res;
+  return how.tee;
 }
 
 }  // namespace keymaster

@@ -4,7 +4,7 @@
 
 #include "ta/auth/auth_state.h"
 #include "ta/auth/operation_pool.h"
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/commands/configured.h"
 #include "ta/commands/dispatch.h"
 #include "ta/soter/finger_id.h"
@@ -19,13 +19,11 @@ TEE_Result TA_CreateEntryPoint() {
   keymaster::configured_init();
   keymaster::finger_id_init();
   if (TEE_Result res = keymaster::key_store_init()) {
-    return TEE_FAIL(res, "Init key store failed");
+    return keymaster::fail(res, "Init key store failed");
   }
-  if (TEE_Result res = keymaster::operation_pool_init()) {
-    return TEE_FAIL(res, "Init operation pool failed");
-  }
+  keymaster::operation_pool_init();
   if (TEE_Result res = keymaster::authorizaiton_init()) {
-    return TEE_FAIL(res, "Init authorization failed");
+    return keymaster::fail(res, "Init authorization failed");
   }
   return TEE_SUCCESS;
 }
@@ -45,7 +43,9 @@ void TA_CloseSessionEntryPoint(void*) {}
 TEE_Result TA_InvokeCommandEntryPoint(void* sessionContext, uint32_t commandID, uint32_t paramTypes,
                                       TEE_Param* params) {
   const keymaster::trace_scope scope;
-  TRACE_INFO("TA_InvokeCommandEntryPoint nCommandID 0x%x pSessionContext %p nParamTypes 0x%x\n",
-             commandID, sessionContext, paramTypes);
+  keymaster::trace(
+      TEE_TRACE_INFO,
+      "TA_InvokeCommandEntryPoint nCommandID 0x%x pSessionContext %p nParamTypes 0x%x\n", commandID,
+      sessionContext, paramTypes);
   return dispatch(commandID, paramTypes, params);
 }

@@ -11,101 +11,81 @@ namespace {
 
 constexpr size_t SHORTEST_BLOB = 2;
 
-// Reads the request of the two characteristics commands and opens its key. Both results.
-TEE_Result open_for_characteristics(byte_view input, opened_key* key, keymaster_error_t* km_error) {
+// Reads the request of the two characteristics commands and opens its key.
+outcome open_for_characteristics(byte_view input, opened_key* key) {
   key_request request;
-  if (!read_key_request(input, &request)) {
-    trace_error("Too short input");
-    return TEE_ERROR_GENERIC;
-  }
+  if (!read_key_request(input, &request)) return fail(TEE_ERROR_GENERIC, "Too short input");
   if (request.blob.size() < SHORTEST_BLOB) {
-    trace_error("Wrong key_blob_size %d", static_cast<int>(request.blob.size()));
-    *km_error = KM_ERROR_INVALID_KEY_BLOB;
-    return TEE_SUCCESS;
+    return refuse(KM_ERROR_INVALID_KEY_BLOB, "Wrong key_blob_size %d",
+                  static_cast<int>(request.blob.size()));
   }
-  *km_error = open_requested_key(request, key);
-  return TEE_SUCCESS;
+  return open_requested_key(request, key);
 }
 
-TEE_Result export_normal(const opened_key& key, command_io* io, keymaster_error_t* km_error) {
+outcome export_normal(const opened_key& key, command_io* io) {
   const auto* tag = get_unique(key.characteristics, KM_TAG_ALGORITHM);
-  if (tag == nullptr) {
-    trace_error("No or too many KM_TAG_ALGORITHM");
-    *km_error = KM_ERROR_INVALID_ARGUMENT;
-    return TEE_SUCCESS;
-  }
+  if (tag == nullptr) return refuse(KM_ERROR_INVALID_ARGUMENT, "No or too many KM_TAG_ALGORITHM");
   const algorithm_t* algorithm = find_algorithm(tag->enumerated);
   if (algorithm == nullptr || algorithm->export_key == nullptr) {
-    trace_error("Unsupported algorithm");
-    *km_error = KM_ERROR_UNSUPPORTED_ALGORITHM;
-    return TEE_SUCCESS;
+    return refuse(KM_ERROR_UNSUPPORTED_ALGORITHM, "Unsupported algorithm");
   }
-  const TEE_Result res =
-      algorithm->export_key(key.material.view(), io->output, &io->output_size, km_error);
-  if (failed(res, *km_error)) trace_error("Export key failed");
-  return res;
+  const outcome how = algorithm->export_key(key.material.view(), io->output, &io->output_size);
+  if (failed(how)) trace(TEE_TRACE_ERROR, "Export key failed");
+  return how;
 }
 
 }  // namespace
 
-TEE_Result get_key_character_size(command_io* io, keymaster_error_t* km_error) {
+outcome get_key_character_size(command_io* io) {
   const trace_scope scope;
   opened_key key;
-  const TEE_Result res = open_for_characteristics(io->input, &key, km_error);
-  if (failed(res, *km_error)) return res;
+  TRY(open_for_characteristics(io->input, &key));
   io->result = marshal_size(key.characteristics, false);
-  return TEE_SUCCESS;
+  return DONE;
 }
 
-TEE_Result get_key_character(command_io* io, keymaster_error_t* km_error) {
+outcome get_key_character(command_io* io) {
   const trace_scope scope;
   opened_key key;
-  const TEE_Result res = open_for_characteristics(io->input, &key, km_error);
-  if (failed(res, *km_error)) return res;
-  if (TEE_Result written = write_set(key.characteristics, io->output, &io->output_size)) {
-    return TEE_FAIL(written, "Marshal failed");
-  }
-  return TEE_SUCCESS;
+  TRY(open_for_characteristics(io->input, &key));
+  return write_set(key.characteristics, io->output, &io->output_size);
 }
 
-TEE_Result export_key(command_io* io, keymaster_error_t* km_error) {
+outcome export_key(command_io* io) {
   const trace_scope scope;
   key_request request;
-  if (!read_key_request(io->input, &request)) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
-  }
+  if (!read_key_request(io->input, &request)) return fail(TEE_ERROR_GENERIC, "Too short input");
   opened_key key;
-  *km_error = open_requested_key(request, &key);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
-  if (contains_tag(key.characteristics, KM_TAG_SOTER_KEY)) {
-    TRACE_DEBUG("soter export_key\n");
-    if (soter_enhance_export_key(key.characteristics, key.material.view(), io->output,
-                                 &io->output_size) != TEE_SUCCESS) {
-      TRACE_ERROR("Export key failed");
-    }
-    return TEE_SUCCESS;  // whatever that export did: intended, clients look at the output alone
+  TRY(open_requested_key(request, &key));
+  if (!contains_tag(key.characteristics, KM_TAG_SOTER_KEY)) {
+    trace(TEE_TRACE_DEBUG, "normal export_key\n");
+    return export_normal(key, io);
   }
-  TRACE_DEBUG("normal export_key\n");
-  return export_normal(key, io, km_error);
+  trace(TEE_TRACE_DEBUG, "soter export_key\n");
+  if (soter_enhance_export_key(key.characteristics, key.material.view(), io->output,
+                               &io->output_size) != TEE_SUCCESS) {
+    trace(TEE_TRACE_ERROR, "Export key failed");
+  }
+  return DONE;  // whatever that export did: intended, clients look at the output alone
 }
 
 // Keys live in their blobs alone: there is nothing to erase.
-TEE_Result delete_key(command_io* io, keymaster_error_t* km_error) {
+outcome delete_key(command_io* io) {
   const trace_scope scope;
-  if (io->input.size() >= SHORTEST_BLOB) return TEE_SUCCESS;
-  return KM_FAIL(km_error, KM_ERROR_INVALID_KEY_BLOB, "Keystore delete key failed");
+  if (io->input.size() >= SHORTEST_BLOB) return DONE;
+  return refuse(KM_ERROR_INVALID_KEY_BLOB, "Keystore delete key failed");
 }
 
-TEE_Result delete_all_key(command_io*, keymaster_error_t*) {
-  return TEE_SUCCESS;
+outcome delete_all_key(command_io*) {
+  return DONE;
 }
 
-TEE_Result configure(command_io* io, keymaster_error_t*) {
+outcome configure(command_io* io) {
   const trace_scope scope;
   keymaster_key_param_set_t set;
-  if (TEE_Result res = read_params(io->input, &set)) return res;
+  TRY(read_params(io->input, &set));
   configured_set(set);
-  return TEE_SUCCESS;
+  return DONE;
 }
 
 }  // namespace keymaster::commands

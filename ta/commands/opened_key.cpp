@@ -10,31 +10,23 @@ namespace keymaster {
 
 TEE_Result read_params(byte_view marshalled, keymaster_key_param_set_t* params) {
   if (unmarshal(marshalled, params) == TEE_SUCCESS) return TEE_SUCCESS;
-  trace_error("Unmarshal failed");
-  return TEE_ERROR_BAD_PARAMETERS;
+  return fail(TEE_ERROR_BAD_PARAMETERS, "Unmarshal failed");
 }
 
 TEE_Result read_use(byte_view input, byte_view* blob, keymaster_key_param_set_t* params) {
   input_cursor in(input);
   byte_view marshalled;
   if (!in.read_field(blob) || !in.read_field(&marshalled)) {
-    trace_error("Too short input");
-    return TEE_ERROR_GENERIC;
+    return fail(TEE_ERROR_GENERIC, "Too short input");
   }
   return read_params(marshalled, params);
 }
 
 keymaster_error_t open_checked_key(byte_view blob, opened_key* key) {
-  if (!key->blob.copy_of(blob)) {
-    trace_error("Out of memory");
-    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  }
-  keymaster_error_t error = KM_ERROR_OK;
-  const TEE_Result res = open_key(key->blob.view(), &key->material, &key->characteristics, &error);
-  if (failed(res, error)) {
+  if (!key->blob.copy_of(blob)) return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
+  if (failed(open_key(key->blob.view(), &key->material, &key->characteristics))) {
     // The reason is traced, not told: a blob that does not open asks for an upgrade. Intended.
-    trace_error("Open key failed");
-    return KM_ERROR_KEY_REQUIRES_UPGRADE;
+    return refuse(KM_ERROR_KEY_REQUIRES_UPGRADE, "Open key failed");
   }
   if (key_requires_upgrade(key->characteristics)) return KM_ERROR_KEY_REQUIRES_UPGRADE;
   if (key_version_mismatch(key->characteristics)) return KM_ERROR_INVALID_KEY_BLOB;
@@ -47,13 +39,31 @@ bool read_key_request(byte_view input, key_request* request) {
          in.read_field(&request->app_data);
 }
 
+keymaster_error_t check_application(const keymaster_key_param_set_t& characteristics,
+                                    byte_view app_id, byte_view app_data) {
+  if (check_app_id_and_app_data(characteristics, app_id, app_data)) return KM_ERROR_OK;
+  return refuse(KM_ERROR_INVALID_KEY_BLOB, "Wrong AppId or AppData");
+}
+
 keymaster_error_t open_requested_key(const key_request& request, opened_key* key) {
-  if (auto error = open_checked_key(request.blob, key)) return error;
-  if (!check_app_id_and_app_data(key->characteristics, request.app_id, request.app_data)) {
-    trace_error("Wrong AppId or AppData");
-    return KM_ERROR_INVALID_KEY_BLOB;
-  }
-  return KM_ERROR_OK;
+  TRY(open_checked_key(request.blob, key));
+  return check_application(key->characteristics, request.app_id, request.app_data);
+}
+
+keymaster_error_t operating_algorithm(const keymaster_key_param_set_t& characteristics,
+                                      const algorithm_t** algorithm) {
+  const auto* tag = get_unique(characteristics, KM_TAG_ALGORITHM);
+  if (tag == nullptr) return refuse(KM_ERROR_UNKNOWN_ERROR, "No KM_TAG_ALGORITHM");
+  *algorithm = find_algorithm(tag->enumerated);
+  if (*algorithm != nullptr && (*algorithm)->get_operation_methods != nullptr) return KM_ERROR_OK;
+  return refuse(KM_ERROR_UNSUPPORTED_ALGORITHM, "Algorithm %d not implemented",
+                static_cast<int>(tag->enumerated));
+}
+
+TEE_Result write_blob(byte_view material, const keymaster_key_param_set_t& characteristics,
+                      byte_span room, size_t* size) {
+  const TEE_Result res = save_key(material, characteristics, room, size);
+  return res == TEE_SUCCESS ? res : fail(res, "Can't save key to TEE storage");
 }
 
 TEE_Result write_set(const keymaster_key_param_set_t& set, byte_span room, size_t* written) {
@@ -63,7 +73,17 @@ TEE_Result write_set(const keymaster_key_param_set_t& set, byte_span room, size_
   uint32_t size = static_cast<uint32_t>(room.size() < UINT32_MAX ? room.size() : UINT32_MAX);
   const TEE_Result res = marshal(set, false, &buffer, &size);
   *written = size;
-  return res;
+  return res == TEE_SUCCESS ? res : fail(res, "Marshal failed");
+}
+
+TEE_Result write_last_set(const keymaster_key_param_set_t& set, output_cursor* out, size_t* total) {
+  byte_span length;
+  if (!out->reserve(sizeof(uint32_t), &length)) return fail(TEE_ERROR_GENERIC, "Too short buffer");
+  size_t size = 0;
+  TRY(write_set(set, out->rest(), &size));
+  store_u32(length, static_cast<uint32_t>(size));
+  *total = out->written() + size;
+  return TEE_SUCCESS;
 }
 
 }  // namespace keymaster

@@ -1,6 +1,5 @@
 // The commands of the biometric framework. Those that answer through the value slot always succeed
 // towards the TEE.
-#include "ta/base/results.h"
 #include "ta/commands/command.h"
 #include "ta/soter/attk.h"
 #include "ta/soter/finger_id.h"
@@ -29,63 +28,51 @@ TEE_Result export_attk(byte_span output, size_t* length) {
 }  // namespace
 
 // Generates nothing, whatever its name says: intended, the factory makes the key.
-TEE_Result soter_handle_generate_attk_key_pair(command_io*, keymaster_error_t* km_error) {
+outcome soter_handle_generate_attk_key_pair(command_io*) {
   const trace_scope scope;
-  TRACE_INFO("this function should not be called in anytime but in meta mode\n");
-  if (soter_check_init() != TEE_SUCCESS) {
-    return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "attk_key_pair is not produced\n");
-  }
-  return TEE_SUCCESS;
+  trace(TEE_TRACE_INFO, "this function should not be called in anytime but in meta mode\n");
+  if (soter_check_init() == TEE_SUCCESS) return DONE;
+  return refuse(KM_ERROR_UNKNOWN_ERROR, "attk_key_pair is not produced\n");
 }
 
 // Loads the key anew, whether or not it is loaded: the question is what the vault has.
-TEE_Result soter_handle_verify_attk_key_pair(command_io*, keymaster_error_t* km_error) {
+outcome soter_handle_verify_attk_key_pair(command_io*) {
   TEE_Result res = TEE_ERROR_OUT_OF_MEMORY;
   for (int attempt = 0; attempt < LOAD_ATTEMPTS && res == TEE_ERROR_OUT_OF_MEMORY; attempt++) {
     soter_key_pair_t attk;
     res = init_soter_key(&attk);
   }
-  if (res != TEE_SUCCESS) {
-    *km_error = res == TEE_ERROR_ITEM_NOT_FOUND ? ATTK_MISSING : ATTK_FAILED;
-  }
-  return TEE_SUCCESS;
+  if (res == TEE_SUCCESS) return DONE;
+  return res == TEE_ERROR_ITEM_NOT_FOUND ? ATTK_MISSING : ATTK_FAILED;
 }
 
-TEE_Result soter_handle_export_attk_public_key(command_io* io, keymaster_error_t* km_error) {
-  if (io->output.data() == nullptr) {
-    *km_error = KM_ERROR_INVALID_ARGUMENT;
-  } else if (soter_check_init() != TEE_SUCCESS) {
-    *km_error = SOTER_NOT_READY;
-  } else if (export_attk(io->output, &io->output_size) != TEE_SUCCESS) {
-    *km_error = KM_ERROR_UNKNOWN_ERROR;
-  }
-  return TEE_SUCCESS;
+outcome soter_handle_export_attk_public_key(command_io* io) {
+  if (io->output.data() == nullptr) return KM_ERROR_INVALID_ARGUMENT;
+  if (soter_check_init() != TEE_SUCCESS) return SOTER_NOT_READY;
+  const TEE_Result res = export_attk(io->output, &io->output_size);
+  return res == TEE_SUCCESS ? KM_ERROR_OK : KM_ERROR_UNKNOWN_ERROR;
 }
 
-TEE_Result soter_handle_get_device_id(command_io* io, keymaster_error_t* km_error) {
+outcome soter_handle_get_device_id(command_io* io) {
   const trace_scope scope;
   size_t length = io->output.size();
   const TEE_Result res =
       retrieve_property_from_vault(REQUEST_DEVICE_ID, io->output.data(), &length);
-  if (res == TEE_ERROR_SHORT_BUFFER) {
-    *km_error = KM_ERROR_INSUFFICIENT_BUFFER_SPACE;
-    return TEE_SUCCESS;
-  }
+  if (res == TEE_ERROR_SHORT_BUFFER) return KM_ERROR_INSUFFICIENT_BUFFER_SPACE;
   if (res != TEE_SUCCESS) {
-    return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "retrieve_device_id_from_vault fail, 0x%x\n",
-                   res);
+    return refuse(KM_ERROR_UNKNOWN_ERROR, "retrieve_device_id_from_vault fail, 0x%x\n", res);
   }
   io->output_size = length;
-  return TEE_SUCCESS;
+  return DONE;
 }
 
-TEE_Result soter_handle_setFid(command_io* io, keymaster_error_t*) {
+outcome soter_handle_setFid(command_io* io) {
   const trace_scope scope;
-  TRACE_DEBUG("soter handle finger print ta notify");
-  if (TEE_Result res = is_from_fp_ta()) return TEE_FAIL(res, "soter deny finger print ta");
-  if (TEE_Result res = take_notification(io->input)) return res;
-  TRACE_DEBUG("soter handle finger print ta notify success");
-  return TEE_SUCCESS;
+  trace(TEE_TRACE_DEBUG, "soter handle finger print ta notify");
+  if (TEE_Result res = is_from_fp_ta()) return fail(res, "soter deny finger print ta");
+  TRY(take_notification(io->input));
+  trace(TEE_TRACE_DEBUG, "soter handle finger print ta notify success");
+  return DONE;
 }
 
 }  // namespace keymaster::commands

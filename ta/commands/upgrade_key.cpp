@@ -1,5 +1,4 @@
 // upgrade_key: seals a key anew under the configured OS version and patch level.
-#include "ta/auth/authorization.h"
 #include "ta/commands/command.h"
 #include "ta/commands/configured.h"
 #include "ta/commands/opened_key.h"
@@ -10,18 +9,16 @@ namespace {
 
 // Opens a blob of this TA, or of the earlier one. The version checks are not run: an old key is
 // what this command is for.
-TEE_Result open_any(byte_view client_blob, opened_key* key, keymaster_error_t* km_error) {
+outcome open_any(byte_view client_blob, opened_key* key) {
   if (!key->blob.copy_of(client_blob)) {
-    trace_error("Out of memory");
-    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
-    return TEE_SUCCESS;
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
-  TEE_Result res = open_key(key->blob.view(), &key->material, &key->characteristics, km_error);
-  if (!failed(res, *km_error)) return TEE_SUCCESS;
-  trace_error("Open V2 key failed");
-  res = open_v1_key(key->blob.view(), &key->material, &key->characteristics, km_error);
-  if (failed(res, *km_error)) trace_error("Open V1 key failed");
-  return res;
+  const byte_view blob = key->blob.view();
+  if (!failed(open_key(blob, &key->material, &key->characteristics))) return DONE;
+  trace(TEE_TRACE_ERROR, "Open V2 key failed");
+  const outcome how = open_v1_key(blob, &key->material, &key->characteristics);
+  if (failed(how)) trace(TEE_TRACE_ERROR, "Open V1 key failed");
+  return how;
 }
 
 // Sets a version tag to the configured value; never lowers it.
@@ -38,42 +35,31 @@ bool raise_version(keymaster_key_param_set_t* characteristics, keymaster_tag_t t
 
 keymaster_error_t upgrade_characteristics(keymaster_key_param_set_t* characteristics,
                                           const keymaster_key_param_set_t& params) {
-  if (!check_app_id_and_app_data(*characteristics, unique_blob(params, KM_TAG_APPLICATION_ID),
-                                 unique_blob(params, KM_TAG_APPLICATION_DATA))) {
-    trace_error("Wrong AppId or AppData");
-    return KM_ERROR_INVALID_KEY_BLOB;
+  TRY(check_application(*characteristics, unique_blob(params, KM_TAG_APPLICATION_ID),
+                        unique_blob(params, KM_TAG_APPLICATION_DATA)));
+  if (raise_version(characteristics, KM_TAG_OS_VERSION, configured().configured_os_version) &&
+      raise_version(characteristics, KM_TAG_OS_PATCHLEVEL, configured().configured_os_patchlevel)) {
+    return KM_ERROR_OK;
   }
-  if (!raise_version(characteristics, KM_TAG_OS_VERSION, configured().configured_os_version) ||
-      !raise_version(characteristics, KM_TAG_OS_PATCHLEVEL,
-                     configured().configured_os_patchlevel)) {
-    trace_error("Can't upgrade key params");
-    return KM_ERROR_INVALID_ARGUMENT;
-  }
-  return KM_ERROR_OK;
+  return refuse(KM_ERROR_INVALID_ARGUMENT, "Can't upgrade key params");
 }
 
 }  // namespace
 
-TEE_Result upgrade_key(command_io* io, keymaster_error_t* km_error) {
+outcome upgrade_key(command_io* io) {
   const trace_scope scope;
   input_cursor in(io->input);
   byte_view marshalled;
   byte_view blob;
   if (!in.read_field(&marshalled) || !in.read_field(&blob)) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
+    return fail(TEE_ERROR_GENERIC, "Too short input");
   }
   keymaster_key_param_set_t params;
-  if (TEE_Result res = read_params(marshalled, &params)) return res;
+  TRY(read_params(marshalled, &params));
   opened_key key;
-  const TEE_Result res = open_any(blob, &key, km_error);
-  if (failed(res, *km_error)) return res;
-  *km_error = upgrade_characteristics(&key.characteristics, params);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
-  if (TEE_Result saved =
-          save_key(key.material.view(), key.characteristics, io->output, &io->output_size)) {
-    return TEE_FAIL(saved, "Can't save key to TEE storage");
-  }
-  return TEE_SUCCESS;
+  TRY(open_any(blob, &key));
+  TRY(upgrade_characteristics(&key.characteristics, params));
+  return write_blob(key.material.view(), key.characteristics, io->output, &io->output_size);
 }
 
 }  // namespace keymaster::commands

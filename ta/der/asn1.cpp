@@ -1,6 +1,8 @@
 // Records, choices and lists: the constructed values.
 #include "ta/der/asn1.h"
 
+#include "ta/base/trace.h"
+
 namespace keymaster {
 namespace {
 
@@ -12,6 +14,15 @@ void* member(void* record, size_t offset) {
 
 const void* member(const void* record, size_t offset) {
   return static_cast<const uint8_t*>(record) + offset;
+}
+
+// Zeroed memory, traced when there is none.
+void* take(size_t size) {
+  void* block = heap_take(size);
+  if (block == nullptr) {
+    trace(TEE_TRACE_ERROR, "Out of memory, need %uB", static_cast<unsigned>(size));
+  }
+  return block;
 }
 
 // What stands for the field in the encoding; null when it is left out.
@@ -46,16 +57,9 @@ int32_t write_field(const asn1_field& field, der_cursor* out, const void* record
 
 }  // namespace
 
-void asn1_sequence_initialise(std::span<const asn1_field> fields, void* record) {
+void asn1_sequence_apply(std::span<const asn1_field> fields, asn1_action action, void* record) {
   for (const asn1_field& field : fields) {
-    field.type->initialise(member(record, field.offset));
-    if (field.presence != ASN1_ALWAYS) *static_cast<uint8_t*>(member(record, field.presence)) = 0;
-  }
-}
-
-void asn1_sequence_free(std::span<const asn1_field> fields, void* record) {
-  for (const asn1_field& field : fields) {
-    field.type->free(member(record, field.offset));
+    (field.type->*action)(member(record, field.offset));
     if (field.presence != ASN1_ALWAYS) *static_cast<uint8_t*>(member(record, field.presence)) = 0;
   }
 }
@@ -71,16 +75,10 @@ int32_t asn1_sequence_write(std::span<const asn1_field> fields, der_cursor* out,
   return der_wrap(out, DER_SEQUENCE, total);
 }
 
-void asn1_choice_initialise(std::span<const asn1_alternative> table, void* value) {
+void asn1_choice_apply(std::span<const asn1_alternative> table, asn1_action action, void* value) {
   *static_cast<uint32_t*>(value) = 0;
   for (const asn1_alternative& row : table)
-    row.type->initialise(member(value, row.offset));
-}
-
-void asn1_choice_free(std::span<const asn1_alternative> table, void* value) {
-  *static_cast<uint32_t*>(value) = 0;
-  for (const asn1_alternative& row : table)
-    row.type->free(member(value, row.offset));
+    (row.type->*action)(member(value, row.offset));
 }
 
 int32_t asn1_choice_write(std::span<const asn1_alternative> table, der_cursor* out,
@@ -93,11 +91,8 @@ int32_t asn1_choice_write(std::span<const asn1_alternative> table, der_cursor* o
 }
 
 void* asn1_list_add(const asn1_list_of& kind, asn1_list* list) {
-  auto* item = static_cast<asn1_link*>(heap_take(kind.item_size));
-  if (item == nullptr) {
-    trace_error("Out of memory, need %uB", static_cast<unsigned>(kind.item_size));
-    return nullptr;
-  }
+  auto* item = static_cast<asn1_link*>(take(kind.item_size));
+  if (item == nullptr) return nullptr;
   kind.type->initialise(member(item, kind.value_offset));
   item->next = list->head;
   item->previous = nullptr;
@@ -126,12 +121,8 @@ int32_t asn1_list_write(const asn1_list_of& kind, der_cursor* out, const asn1_li
 }
 
 void* asn1_alloc(const asn1_type& type, size_t size) {
-  void* record = heap_take(size);
-  if (record == nullptr) {
-    trace_error("Out of memory, need %uB", static_cast<unsigned>(size));
-    return nullptr;
-  }
-  type.initialise(record);
+  void* record = take(size);
+  if (record != nullptr) type.initialise(record);
   return record;
 }
 
@@ -157,7 +148,7 @@ int32_t asn1_encode_growing(const asn1_type& type, const void* value, size_t fir
   for (size_t size = first_size;; size *= 2) {
     encoding->reset();
     if (!encoding->allocate(size)) {
-      trace_error("Out of memory, need %uB", static_cast<unsigned>(size));
+      trace(TEE_TRACE_ERROR, "Out of memory, need %uB", static_cast<unsigned>(size));
       return DER_NO_MEMORY;
     }
     const int32_t length = asn1_encode(type, value, encoding->span());

@@ -7,7 +7,6 @@
 
 #include "ta/base/bytes.h"
 #include "ta/base/heap.h"
-#include "ta/base/results.h"
 #include "ta/der/der.h"
 
 namespace keymaster {
@@ -38,17 +37,21 @@ struct asn1_field {
 };
 constexpr size_t ASN1_ALWAYS = SIZE_MAX;
 
-// The operations of a SEQUENCE with these fields. Free also clears every presence byte.
-void asn1_sequence_initialise(std::span<const asn1_field> fields, void* record);
-void asn1_sequence_free(std::span<const asn1_field> fields, void* record);
+// asn1_action: initialise or free, whichever is to be done to every part of a value.
+using asn1_action = void (*asn1_type::*)(void* value);
+
+// The operations of a SEQUENCE with these fields. The actions also clear every presence byte.
+void asn1_sequence_apply(std::span<const asn1_field> fields, asn1_action action, void* record);
 [[nodiscard]] int32_t asn1_sequence_write(std::span<const asn1_field> fields, der_cursor* out,
                                           const void* record);
 
 // asn1_sequence<FIELDS>::TYPE: the type of such records, for use as a field of others.
 template <const auto& FIELDS>
 struct asn1_sequence {
-  static void initialise(void* record) { asn1_sequence_initialise(FIELDS, record); }
-  static void free(void* record) { asn1_sequence_free(FIELDS, record); }
+  static void initialise(void* record) {
+    asn1_sequence_apply(FIELDS, &asn1_type::initialise, record);
+  }
+  static void free(void* record) { asn1_sequence_apply(FIELDS, &asn1_type::free, record); }
   static int32_t write(der_cursor* out, const void* record) {
     return asn1_sequence_write(FIELDS, out, record);
   }
@@ -61,15 +64,14 @@ struct asn1_alternative {
   size_t offset;
   const asn1_type* type;
 };
-void asn1_choice_initialise(std::span<const asn1_alternative> table, void* value);
-void asn1_choice_free(std::span<const asn1_alternative> table, void* value);
+void asn1_choice_apply(std::span<const asn1_alternative> table, asn1_action action, void* value);
 // DER_INVALID: no row has the selector.
 [[nodiscard]] int32_t asn1_choice_write(std::span<const asn1_alternative> table, der_cursor* out,
                                         const void* value);
 template <const auto& TABLE>
 struct asn1_choice {
-  static void initialise(void* value) { asn1_choice_initialise(TABLE, value); }
-  static void free(void* value) { asn1_choice_free(TABLE, value); }
+  static void initialise(void* value) { asn1_choice_apply(TABLE, &asn1_type::initialise, value); }
+  static void free(void* value) { asn1_choice_apply(TABLE, &asn1_type::free, value); }
   static int32_t write(der_cursor* out, const void* value) {
     return asn1_choice_write(TABLE, out, value);
   }

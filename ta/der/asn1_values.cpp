@@ -1,6 +1,7 @@
 // The simple values: how each lies in memory, is initialised, freed and written.
 #include <array>
 
+#include "ta/base/trace.h"
 #include "ta/der/asn1.h"
 
 namespace keymaster {
@@ -13,9 +14,12 @@ const T& as(const void* value) {
   return *static_cast<const T*>(value);
 }
 
-// Values without memory of their own: nothing to free.
-void free_nothing(void*) {}
-void initialise_nothing(void*) {}
+void do_nothing(void*) {}
+
+template <class T>
+void clear(void* value) {
+  *static_cast<T*>(value) = {};
+}
 
 void initialise_integer(void* value) {
   *static_cast<uint64_t*>(value) = ASN1_INTEGER_UNSET;
@@ -23,10 +27,6 @@ void initialise_integer(void* value) {
 
 int32_t write_integer(der_cursor* out, const void* value) {
   return der_write_integer(out, as<uint64_t>(value));
-}
-
-void initialise_boolean(void* value) {
-  *static_cast<uint8_t*>(value) = 0;
 }
 
 int32_t write_boolean(der_cursor* out, const void* value) {
@@ -37,30 +37,15 @@ int32_t write_null(der_cursor* out, const void*) {
   return der_write_null(out);
 }
 
-void initialise_string(void* value) {
-  *static_cast<ASN1_OCTET_STRING*>(value) = {};
-}
-
 void free_string(void* value) {
   auto* string = static_cast<ASN1_OCTET_STRING*>(value);
   heap_give_back(string->bytes, string->length);
   *string = {};
 }
 
-int32_t write_octet_string(der_cursor* out, const void* value) {
-  return der_write_octet_string(out, as<ASN1_OCTET_STRING>(value).view());
-}
-
-int32_t write_utf8_string(der_cursor* out, const void* value) {
-  return der_write_utf8_string(out, as<ASN1_OCTET_STRING>(value).view());
-}
-
-int32_t write_big_integer(der_cursor* out, const void* value) {
-  return der_write_integer(out, as<ASN1_OCTET_STRING>(value).view());
-}
-
-void initialise_bit_string(void* value) {
-  *static_cast<ASN1_BIT_STRING*>(value) = {};
+template <int32_t (*WRITE)(der_cursor*, byte_view)>
+int32_t write_string(der_cursor* out, const void* value) {
+  return WRITE(out, as<ASN1_OCTET_STRING>(value).view());
 }
 
 void free_bit_string(void* value) {
@@ -74,16 +59,8 @@ int32_t write_bit_string(der_cursor* out, const void* value) {
   return der_write_bit_string(out, {string.bytes, string.size}, string.bits);
 }
 
-void initialise_oid(void* value) {
-  *static_cast<const ASN1_OID**>(value) = nullptr;
-}
-
 int32_t write_oid(der_cursor* out, const void* value) {
   return _ASN1_OID_write(out, as<const ASN1_OID*>(value));
-}
-
-void initialise_time(void* value) {
-  *static_cast<ASN1_TIME*>(value) = {};
 }
 
 // The last `digits` decimal digits of `value`, at `*text`, which moves past them.
@@ -157,7 +134,8 @@ int32_t _ASN1_OID_write(der_cursor* out, const ASN1_OID* oid) {
   }
   heap_buffer gathered;
   if (!gathered.allocate(count * sizeof(uint64_t))) {
-    TRACE_ERROR("Out of memory, need %uB", static_cast<unsigned>(count * sizeof(uint64_t)));
+    trace(TEE_TRACE_ERROR, "Out of memory, need %uB",
+          static_cast<unsigned>(count * sizeof(uint64_t)));
     return DER_NO_MEMORY;
   }
   auto* arcs = reinterpret_cast<uint64_t*>(gathered.data());
@@ -193,14 +171,17 @@ ASN1_TIME ASN1_TIME_from_seconds(uint32_t type, uint64_t seconds) {
   };
 }
 
-const asn1_type ASN1_INTEGER_TYPE = {initialise_integer, free_nothing, write_integer};
-const asn1_type ASN1_BIG_INTEGER_TYPE = {initialise_string, free_string, write_big_integer};
-const asn1_type ASN1_BOOLEAN_TYPE = {initialise_boolean, free_nothing, write_boolean};
-const asn1_type ASN1_NULL_TYPE = {initialise_nothing, free_nothing, write_null};
-const asn1_type ASN1_OCTET_STRING_TYPE = {initialise_string, free_string, write_octet_string};
-const asn1_type ASN1_UTF8STRING_TYPE = {initialise_string, free_string, write_utf8_string};
-const asn1_type ASN1_BIT_STRING_TYPE = {initialise_bit_string, free_bit_string, write_bit_string};
-const asn1_type ASN1_OID_TYPE = {initialise_oid, free_nothing, write_oid};
-const asn1_type ASN1_TIME_TYPE = {initialise_time, free_nothing, write_time};
+const asn1_type ASN1_INTEGER_TYPE = {initialise_integer, do_nothing, write_integer};
+const asn1_type ASN1_BIG_INTEGER_TYPE = {clear<ASN1_OCTET_STRING>, free_string,
+                                         write_string<der_write_integer>};
+const asn1_type ASN1_BOOLEAN_TYPE = {clear<uint8_t>, do_nothing, write_boolean};
+const asn1_type ASN1_NULL_TYPE = {do_nothing, do_nothing, write_null};
+const asn1_type ASN1_OCTET_STRING_TYPE = {clear<ASN1_OCTET_STRING>, free_string,
+                                          write_string<der_write_octet_string>};
+const asn1_type ASN1_UTF8STRING_TYPE = {clear<ASN1_OCTET_STRING>, free_string,
+                                        write_string<der_write_utf8_string>};
+const asn1_type ASN1_BIT_STRING_TYPE = {clear<ASN1_BIT_STRING>, free_bit_string, write_bit_string};
+const asn1_type ASN1_OID_TYPE = {clear<const ASN1_OID*>, do_nothing, write_oid};
+const asn1_type ASN1_TIME_TYPE = {clear<ASN1_TIME>, do_nothing, write_time};
 
 }  // namespace keymaster

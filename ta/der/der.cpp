@@ -31,6 +31,12 @@ int32_t write_base128(der_cursor* out, uint64_t value) {
 
 }  // namespace
 
+keymaster_error_t der_error(int32_t result) {
+  if (result >= 0) return KM_ERROR_OK;
+  const bool no_room = result == DER_TOO_SMALL || result == DER_NO_MEMORY;
+  return no_room ? KM_ERROR_MEMORY_ALLOCATION_FAILED : KM_ERROR_UNKNOWN_ERROR;
+}
+
 bool der_cursor::reserve(size_t size, byte_span* room) {
   if (position_ < size) return false;
   position_ -= size;

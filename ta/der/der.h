@@ -6,6 +6,7 @@
 #include <cstdint>
 
 #include "ta/base/bytes.h"
+#include "ta/params/tags.h"
 
 namespace keymaster {
 
@@ -13,6 +14,10 @@ namespace keymaster {
 constexpr int32_t DER_TOO_SMALL = -108;  // the buffer is too small; a larger one may do
 constexpr int32_t DER_NO_MEMORY = -106;
 constexpr int32_t DER_INVALID = -104;
+
+// der_error: what such a result comes to for a client: -41 when there was no room, -1000 for any
+// other failure.
+[[nodiscard]] keymaster_error_t der_error(int32_t result);
 
 // A tag word: class in bits 28 and 29, constructed flag in bit 27, number in the bits below.
 constexpr uint32_t DER_CONTEXT = 0x20000000;

@@ -1,6 +1,7 @@
 // The X.509 records: their templates.
 #include "ta/der/x509.h"
 
+#include "ta/base/trace.h"
 #include "ta/der/oids.h"
 
 namespace keymaster {

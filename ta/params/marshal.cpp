@@ -15,20 +15,15 @@ bool is_hidden(keymaster_tag_t tag) {
 // stands; it is replaced before anyone can see it.
 TEE_Result read_entry(input_cursor* in, keymaster_key_param_t* entry) {
   keymaster_key_param_t record{};
-  if (!in->read_into(object_bytes(record))) {
-    trace_error("Too short input");
-    return TEE_ERROR_GENERIC;
-  }
+  if (!in->read_into(object_bytes(record))) return fail(TEE_ERROR_GENERIC, "Too short input");
   if (has_blob(record.tag)) {
     byte_view bytes;
     heap_buffer data;
-    if (!in->read_bytes(record.data_length, &bytes)) {
-      trace_error("Too short input");
-      return TEE_ERROR_GENERIC;
-    }
+    if (!in->read_bytes(record.data_length, &bytes))
+      return fail(TEE_ERROR_GENERIC, "Too short input");
     if (!data.copy_of(bytes)) {
-      trace_error("Out of memory, require %dB", static_cast<int>(record.data_length));
-      return TEE_ERROR_OUT_OF_MEMORY;
+      return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory, require %dB",
+                  static_cast<int>(record.data_length));
     }
     record.long_integer = 0;
     record.data = data.release();
@@ -43,19 +38,12 @@ TEE_Result write_entry(output_cursor* out, const keymaster_key_param_t& param) {
   keymaster_key_param_t record = param;
   const bool blob = has_blob(param.tag);
   if (blob) record.long_integer = 0;
-  if (!out->write_bytes(object_bytes(std::as_const(record)))) {
-    trace_error("Too short buffer");
-    return TEE_ERROR_GENERIC;
-  }
+  if (!out->write_bytes(object_bytes(std::as_const(record))))
+    return fail(TEE_ERROR_GENERIC, "Too short buffer");
   if (!blob) return TEE_SUCCESS;
-  if (param.data == nullptr) {
-    trace_error("Invalid keymaster_key_param_set_t");
-    return TEE_ERROR_BAD_PARAMETERS;
-  }
-  if (!out->write_bytes(param.blob())) {
-    trace_error("Too short buffer");
-    return TEE_ERROR_GENERIC;
-  }
+  if (param.data == nullptr)
+    return fail(TEE_ERROR_BAD_PARAMETERS, "Invalid keymaster_key_param_set_t");
+  if (!out->write_bytes(param.blob())) return fail(TEE_ERROR_GENERIC, "Too short buffer");
   return TEE_SUCCESS;
 }
 
@@ -65,13 +53,10 @@ TEE_Result write_set(const keymaster_key_param_set_t& set, bool include_all, byt
     if (include_all || !is_hidden(param.tag)) count++;
   }
   output_cursor out(buffer);
-  if (!out.write_u32(count)) {
-    trace_error("Too short buffer");
-    return TEE_ERROR_GENERIC;
-  }
+  if (!out.write_u32(count)) return fail(TEE_ERROR_GENERIC, "Too short buffer");
   for (const keymaster_key_param_t& param : set) {
     if (!include_all && is_hidden(param.tag)) continue;
-    if (TEE_Result res = write_entry(&out, param)) return res;
+    TRY(write_entry(&out, param));
   }
   return TEE_SUCCESS;
 }
@@ -85,15 +70,15 @@ TEE_Result unmarshal(byte_view input, keymaster_key_param_set_t* set) {
   set->length = 0;
   input_cursor in(input);
   uint32_t count = 0;
-  if (!in.read_u32(&count)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
+  if (!in.read_u32(&count)) return fail(TEE_ERROR_GENERIC, "Too short input");
   if (count == 0) return TEE_SUCCESS;  // most commands carry no parameters
-  if (count > UINT32_MAX / ENTRY_SIZE) return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
+  if (count > UINT32_MAX / ENTRY_SIZE) return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   // Never room for more records than the input can hold: a count is four bytes, an array is not.
   const size_t capacity = count < in.left() / ENTRY_SIZE ? count : in.left() / ENTRY_SIZE;
 
   heap_buffer array;
   if (!array.allocate(capacity * ENTRY_SIZE)) {
-    return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
+    return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   }
   auto* records = reinterpret_cast<keymaster_key_param_t*>(array.data());
   for (uint32_t i = 0; i < count; i++) {
@@ -129,13 +114,13 @@ TEE_Result marshal(const keymaster_key_param_set_t& set, bool include_all, uint8
   heap_buffer own;
   if (given == nullptr) {
     if (!own.allocate(need)) {
-      return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory, need %dB", static_cast<int>(need));
+      return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory, need %dB", static_cast<int>(need));
     }
   } else if (capacity < need) {
-    return TEE_FAIL(TEE_ERROR_SHORT_BUFFER, "Too short marshalling buffer");
+    return fail(TEE_ERROR_SHORT_BUFFER, "Too short marshalling buffer");
   }
   const byte_span to = given == nullptr ? own.span() : byte_span{given, need};
-  if (TEE_Result res = write_set(set, include_all, to)) return res;
+  TRY(write_set(set, include_all, to));
   *buffer = given == nullptr ? own.release() : given;
   *size = need;
   return TEE_SUCCESS;

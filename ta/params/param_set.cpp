@@ -103,8 +103,8 @@ void free_param_set(keymaster_key_param_set_t* set) {
   set->params = nullptr;
 }
 
-void settle_failure(TEE_Result res, keymaster_error_t* km_error) {
-  if (res == TEE_SUCCESS && *km_error == KM_ERROR_OK) *km_error = KM_ERROR_UNKNOWN_ERROR;
+outcome settle_failure(outcome how) {
+  return failed(how) ? how : KM_ERROR_UNKNOWN_ERROR;
 }
 
 }  // namespace keymaster

@@ -8,7 +8,7 @@
 
 #include "ta/base/bytes.h"
 #include "ta/base/heap.h"
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/params/tags.h"
 
 namespace keymaster {
@@ -82,6 +82,6 @@ void free_param_set(keymaster_key_param_set_t* set);
 
 // settle_failure: the rule at the end of every failed path: a failure whose both results are 0
 // leaves as KM_ERROR_UNKNOWN_ERROR, so that no failure is ever reported as success.
-void settle_failure(TEE_Result res, keymaster_error_t* km_error);
+outcome settle_failure(outcome how);
 
 }  // namespace keymaster

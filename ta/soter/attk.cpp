@@ -4,10 +4,10 @@
 #include "tee_extensions.h"
 
 #include <algorithm>
-#include <string_view>
 
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/soter/base64.h"
+#include "ta/soter/utf8.h"
 
 namespace keymaster {
 namespace {
@@ -18,12 +18,7 @@ constexpr uint32_t ATTK_BITS = 2048;
 constexpr size_t MAX_DER = 4096;
 
 constexpr std::string_view PEM_BEGIN = "-----BEGIN PUBLIC KEY-----\n";
-constexpr std::string_view PEM_END = "\n-----END PUBLIC KEY-----";
-constexpr uint8_t PEM_TERMINATOR[] = {0};
-
-byte_view text_bytes(std::string_view text) {
-  return {reinterpret_cast<const uint8_t*>(text.data()), text.size()};
-}
+constexpr char PEM_END[] = "\n-----END PUBLIC KEY-----";  // its zero is part of the text
 
 // The public key in DER. No key that fits the room for its PEM text has a longer one.
 TEE_Result export_der(TEE_ObjectHandle key, uint32_t key_bits, size_t capacity, heap_buffer* der) {
@@ -31,23 +26,17 @@ TEE_Result export_der(TEE_ObjectHandle key, uint32_t key_bits, size_t capacity, 
   TEE_OperationHandle handle{};
   if (TEE_Result res =
           TEE_AllocateOperation(&handle, TEE_ALG_RSA_NOPAD, TEE_MODE_EXPORT, key_bits)) {
-    trace_error("TEE_AllocateOperation failed: %08x\n", res);
-    return res;
+    return fail(res, "TEE_AllocateOperation failed: %08x\n", res);
   }
   operation.reset(handle);
   if (TEE_Result res = TEE_SetOperationKey(operation.get(), key)) {
-    trace_error("TEE_SetOperationKey failed: %08x\n", res);
-    return res;
+    return fail(res, "TEE_SetOperationKey failed: %08x\n", res);
   }
-  if (!der->allocate(capacity)) {
-    trace_error("Out of memory");
-    return TEE_ERROR_OUT_OF_MEMORY;
-  }
+  if (!der->allocate(capacity)) return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   size_t length = capacity;
   if (TEE_Result res =
           TEE_AsymmetricExport(operation.get(), TEE_EXPORT_FORMAT_SPKI, der->data(), &length)) {
-    trace_error("TEE_AsymmetricExport failed: %08x\n", res);
-    return res;
+    return fail(res, "TEE_AsymmetricExport failed: %08x\n", res);
   }
   der->truncate(length);
   return TEE_SUCCESS;
@@ -61,7 +50,7 @@ tee_object convert_key_to_object(const soter_key_pair_t& key_pair, uint32_t* key
   tee_object object;
   if (TEE_Result res =
           TEE_AllocateTransientObject(TEE_TYPE_RSA_KEYPAIR, ATTK_BITS, object.receive())) {
-    TRACE_ERROR("TEE_AllocateTransientObject failed: %08x\n", res);
+    trace(TEE_TRACE_ERROR, "TEE_AllocateTransientObject failed: %08x\n", res);
     return {};
   }
   const TEE_Attribute attributes[] = {
@@ -76,7 +65,7 @@ tee_object convert_key_to_object(const soter_key_pair_t& key_pair, uint32_t* key
   };
   const uint32_t count = key_pair.p.size() == 0 ? 3 : 8;
   if (TEE_Result res = TEE_PopulateTransientObject(object.get(), attributes, count)) {
-    TRACE_ERROR("TEE_PopulateTransientObject failed: %08x\n", res);
+    trace(TEE_TRACE_ERROR, "TEE_PopulateTransientObject failed: %08x\n", res);
     return {};
   }
   return object;
@@ -87,17 +76,13 @@ TEE_Result export_rsa_public_key(TEE_ObjectHandle key, uint32_t key_bits, byte_s
   const trace_scope scope;
   *length = 0;
   heap_buffer der;
-  if (TEE_Result res = export_der(key, key_bits, std::min(buffer.size(), MAX_DER), &der)) {
-    return res;
-  }
+  TRY(export_der(key, key_bits, std::min(buffer.size(), MAX_DER), &der));
   heap_buffer base64;
   if (!base64_encode(der.view(), &base64)) return TEE_ERROR_OUT_OF_MEMORY;
-  if (buffer.size() < PEM_BEGIN.size() + base64.size() + PEM_END.size() + sizeof(PEM_TERMINATOR)) {
-    return TEE_ERROR_SHORT_BUFFER;
-  }
   output_cursor out(buffer);
-  if (!out.write_bytes(text_bytes(PEM_BEGIN)) || !out.write_bytes(base64.view()) ||
-      !out.write_bytes(text_bytes(PEM_END)) || !out.write_bytes(PEM_TERMINATOR)) {
+  if (buffer.size() < PEM_BEGIN.size() + base64.size() + sizeof(PEM_END) ||
+      !out.write_bytes(text_bytes(PEM_BEGIN)) || !out.write_bytes(base64.view()) ||
+      !out.write_bytes(text_bytes({PEM_END, sizeof(PEM_END)}))) {
     return TEE_ERROR_SHORT_BUFFER;
   }
   *length = out.written();

@@ -11,16 +11,10 @@ constexpr char ALPHABET[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxy
 constexpr size_t GROUP = 3;        // bytes that four characters stand for
 constexpr size_t LINE_BYTES = 48;  // of which 64 characters stand for
 
-// False when the text does not fit a 32-bit length.
-bool text_size(size_t data_size, size_t* size) {
-  if (data_size == 0) {
-    *size = 0;
-    return true;
-  }
-  const uint64_t groups = uint64_t{data_size - 1} / GROUP + 1;
-  const uint64_t breaks = uint64_t{data_size - 1} / LINE_BYTES;
-  *size = static_cast<size_t>(4 * groups + breaks);
-  return 4 * groups + breaks <= UINT32_MAX;
+uint64_t text_size(uint64_t data_size) {
+  const uint64_t groups = (data_size + GROUP - 1) / GROUP;
+  const uint64_t breaks = data_size == 0 ? 0 : (data_size - 1) / LINE_BYTES;
+  return 4 * groups + breaks;
 }
 
 // Writes the four characters of one to three bytes.
@@ -40,9 +34,9 @@ bool write_group(output_cursor* out, byte_view bytes) {
 
 bool base64_encode(byte_view data, heap_buffer* text) {
   text->reset();
-  size_t size = 0;
+  const uint64_t size = text_size(data.size());
   heap_buffer made;
-  if (!text_size(data.size(), &size) || !made.allocate(size)) return false;
+  if (size > UINT32_MAX || !made.allocate(static_cast<size_t>(size))) return false;
   output_cursor out(made.span());
   constexpr uint8_t BREAK[] = {'\n'};
   for (size_t at = 0; at < data.size(); at += GROUP) {

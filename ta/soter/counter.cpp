@@ -1,7 +1,7 @@
 // The counter of SOTER signatures.
 #include "ta/soter/counter.h"
 
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/base/tee_handles.h"
 
 namespace keymaster {
@@ -41,11 +41,10 @@ TEE_Result read_counter(const tee_object& object, uint64_t* counter) {
   // One byte more than expected, so that an object that is too long is seen.
   uint8_t data[sizeof(*counter) + 1];
   tee_size count = 0;
-  if (TEE_Result res = TEE_ReadObjectData(object.get(), data, sizeof(data), &count)) return res;
+  TRY(TEE_ReadObjectData(object.get(), data, sizeof(data), &count));
   if (count != sizeof(*counter)) {
-    trace_error("counter object is not %d bytes, %d bytes\n", static_cast<int>(sizeof(*counter)),
-                static_cast<int>(count));
-    return TEE_ERROR_BAD_STATE;
+    return fail(TEE_ERROR_BAD_STATE, "counter object is not %d bytes, %d bytes\n",
+                static_cast<int>(sizeof(*counter)), static_cast<int>(count));
   }
   copy_bytes(object_bytes(*counter), byte_view(data).first(sizeof(*counter)));
   return TEE_SUCCESS;
@@ -54,12 +53,10 @@ TEE_Result read_counter(const tee_object& object, uint64_t* counter) {
 // One write, which the platform does whole or not at all.
 TEE_Result write_counter(const tee_object& object, uint64_t counter) {
   if (TEE_Result res = TEE_SeekObjectData(object.get(), 0, TEE_DATA_SEEK_SET)) {
-    trace_error("seek pos to the beginning error\n");
-    return res;
+    return fail(res, "seek pos to the beginning error\n");
   }
   if (TEE_Result res = TEE_WriteObjectData(object.get(), &counter, sizeof(counter))) {
-    trace_error("write object error\n");
-    return res;
+    return fail(res, "write object error\n");
   }
   return TEE_SUCCESS;
 }
@@ -71,11 +68,10 @@ TEE_Result increase_and_get_counter(uint64_t* counter) {
   *counter = 0;
   tee_object object;
   uint64_t value = 0;
-  if (TEE_Result res = open_or_create_counter(&object)) return res;
-  if (TEE_Result res = read_counter(object, &value)) return res;
-  value++;
-  if (TEE_Result res = write_counter(object, value)) return res;
-  *counter = value;
+  TRY(open_or_create_counter(&object));
+  TRY(read_counter(object, &value));
+  TRY(write_counter(object, value + 1));
+  *counter = value + 1;
   return TEE_SUCCESS;
 }
 

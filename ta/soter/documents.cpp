@@ -4,6 +4,7 @@
 #include <algorithm>
 
 #include "ta/alg/rsa/rsa.h"
+#include "ta/base/outcome.h"
 #include "ta/soter/attk.h"
 #include "ta/soter/counter.h"
 #include "ta/soter/finger_id.h"
@@ -16,28 +17,28 @@ namespace {
 
 // Whether setting a member went well.
 bool is_set(int error, const char* member) {
-  if (error != 0) trace_error("set %s error %d\n", member, error);
+  if (error != 0) trace(TEE_TRACE_ERROR, "set %s error %d\n", member, error);
   return error == 0;
 }
 
 bool make_root(json_value* root) {
   if (root->make_object()) return true;
-  trace_error("json error root_value %p root_object %p\n", static_cast<const void*>(root),
-              static_cast<const void*>(root->object()));
+  trace(TEE_TRACE_ERROR, "json error root_value %p root_object %p\n",
+        static_cast<const void*>(root), static_cast<const void*>(root->object()));
   return false;
 }
 
 bool serialize(const json_value& root, heap_buffer* document) {
   if (json_serialize(root, document)) return true;
-  trace_error("json serialization error\n");
+  trace(TEE_TRACE_ERROR, "json serialization error\n");
   return false;
 }
 
 bool is_text(byte_view raw) {
   const auto length = static_cast<size_t>(std::ranges::find(raw, 0) - raw.begin());
   if (length == raw.size() && is_valid_utf8(raw)) return true;
-  trace_error("Not a valid utf8 string, strlen(raw) %d length %d", static_cast<int>(length),
-              static_cast<int>(raw.size()));
+  trace(TEE_TRACE_ERROR, "Not a valid utf8 string, strlen(raw) %d length %d",
+        static_cast<int>(length), static_cast<int>(raw.size()));
   return false;
 }
 
@@ -45,7 +46,7 @@ bool is_text(byte_view raw) {
 bool set_finger(json_list* members) {
   uint32_t fid = 0;
   if (TEE_Result res = get_fid(&fid)) {
-    trace_error("get finger id error %x, continue without fid\n", res);
+    trace(TEE_TRACE_ERROR, "get finger id error %x, continue without fid\n", res);
     return true;
   }
   return is_set(json_set_number(members, "fid", fid), "finger id");
@@ -54,8 +55,7 @@ bool set_finger(json_list* members) {
 TEE_Result set_counter(json_list* members) {
   uint64_t counter = 0;
   if (TEE_Result res = increase_and_get_counter(&counter)) {
-    trace_error("increase counter error %x\n", res);
-    return res;
+    return fail(res, "increase counter error %x\n", res);
   }
   const int error = json_set_number(members, "counter", static_cast<double>(counter));
   return is_set(error, "counter") ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
@@ -91,19 +91,14 @@ size_t pem_capacity(uint32_t key_bits) {
 TEE_Result set_public_key(json_list* members, byte_view key_material) {
   uint32_t key_bits = 0;
   const tee_object key = resolve_key_from_data(key_material, &key_bits);
-  if (!key) {
-    trace_error("resolve key from data stream error\n");
-    return TEE_ERROR_BAD_FORMAT;
-  }
+  if (!key) return fail(TEE_ERROR_BAD_FORMAT, "resolve key from data stream error\n");
   heap_buffer pem;
   if (!pem.allocate(pem_capacity(key_bits))) {
-    trace_error("Out of memory");
-    return TEE_ERROR_OUT_OF_MEMORY;
+    return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   }
   size_t length = 0;
   if (TEE_Result res = export_rsa_public_key(key.get(), key_bits, pem.span(), &length)) {
-    trace_error("export public key error\n");
-    return res;
+    return fail(res, "export public key error\n");
   }
   const int error = json_set_string(members, "pub_key", pem.view().first(length));
   return is_set(error, "publickey") ? TEE_SUCCESS : TEE_ERROR_BAD_STATE;
@@ -115,7 +110,7 @@ bool produce_soter_sign_json(uint64_t uid, byte_view raw, heap_buffer* document)
   const trace_scope scope;
   document->reset();
   if (soter_check_init() != TEE_SUCCESS) {
-    TRACE_ERROR("soter is not ready\n");
+    trace(TEE_TRACE_ERROR, "soter is not ready\n");
     return false;
   }
   json_value root;
@@ -127,7 +122,7 @@ bool produce_soter_sign_json(uint64_t uid, byte_view raw, heap_buffer* document)
       !set_device(members) || !serialize(root, document)) {
     return false;
   }
-  TRACE_DEBUG("%s success", trace_scope::current());
+  trace(TEE_TRACE_DEBUG, "%s success", trace_scope::current());
   return true;
 }
 
@@ -139,16 +134,15 @@ TEE_Result produce_soter_export_json(const keymaster_key_param_set_t& key_params
   json_list* members = root.object();
   if (contains_tag(key_params, KM_TAG_SOTER_COUNTER)) {
     trace(TEE_TRACE_DEBUG, "This key need increase the counter");
-    if (TEE_Result res = set_counter(members)) return res;
+    TRY(set_counter(members));
   }
   if (const auto* uid = get_unique(key_params, KM_TAG_SOTER_UID)) {
     trace(TEE_TRACE_DEBUG, "soter key has uid\n");
     if (int error = json_set_number(members, "uid", uid->integer)) {
-      trace_error("set number error %x\n", static_cast<unsigned>(error));
-      return TEE_ERROR_OUT_OF_MEMORY;
+      return fail(TEE_ERROR_OUT_OF_MEMORY, "set number error %x\n", static_cast<unsigned>(error));
     }
   }
-  if (TEE_Result res = set_public_key(members, key_material)) return res;
+  TRY(set_public_key(members, key_material));
   return serialize(root, document) ? TEE_SUCCESS : TEE_ERROR_BAD_STATE;
 }
 

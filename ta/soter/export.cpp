@@ -2,6 +2,7 @@
 #include "ta/soter/export.h"
 
 #include "ta/alg/rsa/rsa.h"
+#include "ta/base/outcome.h"
 #include "ta/soter/attk.h"
 #include "ta/soter/documents.h"
 #include "ta/soter/provisioning.h"
@@ -16,15 +17,13 @@ tee_object retrieve_key_from_pobj(byte_view blob, uint32_t* key_bits) {
   const trace_scope scope;
   heap_buffer material;
   keymaster_key_param_set_t characteristics;
-  keymaster_error_t km_error = KM_ERROR_OK;
-  const TEE_Result res = open_key(blob, &material, &characteristics, &km_error);
-  if (failed(res, km_error)) {
-    TRACE_ERROR("Open key failed");
+  if (failed(open_key(blob, &material, &characteristics))) {
+    trace(TEE_TRACE_ERROR, "Open key failed");
     return {};
   }
   const auto* algorithm = get_unique(characteristics, KM_TAG_ALGORITHM);
   if (algorithm == nullptr || algorithm->enumerated != KM_ALGORITHM_RSA) {
-    TRACE_ERROR("Sign key is not an RSA key");
+    trace(TEE_TRACE_ERROR, "Sign key is not an RSA key");
     return {};
   }
   return resolve_key_from_data(material.view(), key_bits);
@@ -49,20 +48,14 @@ TEE_Result choose_sign_key(const keymaster_key_param_set_t& key_params, tee_obje
                            uint32_t* key_bits) {
   if (contains_tag(key_params, KM_TAG_SOTER_ATTK_SIGNS)) {
     trace(TEE_TRACE_DEBUG, "soter use attkey sign\n");
-    if (TEE_Result res = soter_check_init()) {
-      trace_error("soter is not ready\n");
-      return res;
-    }
+    if (TEE_Result res = soter_check_init()) return fail(res, "soter is not ready\n");
     *key = convert_key_to_object(soter_key_pair(), key_bits);
     return TEE_SUCCESS;
   }
   if (!contains_tag(key_params, KM_TAG_SOTER_KEY_SIGNS)) return TEE_ERROR_BAD_PARAMETERS;
   trace(TEE_TRACE_DEBUG, "soter use normal key sign\n");
   const byte_view blob = sign_key_blob(key_params);
-  if (blob.empty()) {
-    trace_error("no sign key with key blob\n");
-    return TEE_ERROR_ITEM_NOT_FOUND;
-  }
+  if (blob.empty()) return fail(TEE_ERROR_ITEM_NOT_FOUND, "no sign key with key blob\n");
   *key = retrieve_key_from_pobj(blob, key_bits);
   return TEE_SUCCESS;
 }
@@ -74,16 +67,14 @@ TEE_Result soter_enhance_export_key(const keymaster_key_param_set_t& key_params,
   const trace_scope scope;
   *length = 0;
   heap_buffer document;
-  if (TEE_Result res = produce_soter_export_json(key_params, key_material, &document)) {
-    return res;
-  }
+  TRY(produce_soter_export_json(key_params, key_material, &document));
   tee_object key;
   uint32_t key_bits = 0;
-  if (TEE_Result res = choose_sign_key(key_params, &key, &key_bits)) return res;
-  if (!key) return TEE_FAIL(TEE_ERROR_BAD_STATE, "Sign key is null\n");
+  TRY(choose_sign_key(key_params, &key, &key_bits));
+  if (!key) return fail(TEE_ERROR_BAD_STATE, "Sign key is null\n");
   heap_buffer signature;
   if (TEE_Result res = digest_and_sign(key.get(), key_bits, document.view(), &signature)) {
-    return TEE_FAIL(res, "sign data error 0x%x\n", res);
+    return fail(res, "sign data error 0x%x\n", res);
   }
   const uint64_t size = signed_document_size(document.view(), signature.view());
   if (output.size() < size || !write_signed_document(document.view(), signature.view(), output)) {

@@ -2,13 +2,12 @@
 #include "ta/soter/finger_id.h"
 
 #include "product/uuids.h"
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 
 namespace keymaster {
 namespace {
 
 constexpr TEE_UUID FINGERPRINT_TA = FINGERPRINT_TA_UUID;
-constexpr size_t NOTIFICATION_SIZE = 16;
 constexpr uint32_t NOTIFICATION_VERSION = 0;
 constexpr uint64_t FRESH_MS = 3000;
 
@@ -35,7 +34,7 @@ TEE_Result is_from_fp_ta() {
   const trace_scope scope;
   TEE_Identity client;
   if (TEE_Result res = get_client_property(&client)) {
-    return TEE_FAIL(res, "get client property error, 0x%x\n", res);
+    return fail(res, "get client property error, 0x%x\n", res);
   }
   const bool is_fingerprint_ta =
       client.login == TEE_LOGIN_TRUSTED_APP &&
@@ -44,20 +43,17 @@ TEE_Result is_from_fp_ta() {
 }
 
 TEE_Result take_notification(byte_view notification) {
-  if (notification.size() != NOTIFICATION_SIZE) {
-    trace_error("finger print ta input argument error");
-    return TEE_ERROR_BAD_PARAMETERS;
-  }
   input_cursor in(notification);
   uint32_t version = 0;
   finger_state match{true, 0, 0};
-  if (!in.read_u32(&version) || !in.read_u32(&match.fid) || !in.read_u64(&match.notify_ms)) {
-    return TEE_ERROR_BAD_PARAMETERS;
+  if (!in.read_u32(&version) || !in.read_u32(&match.fid) || !in.read_u64(&match.notify_ms) ||
+      in.left() != 0) {
+    return fail(TEE_ERROR_BAD_PARAMETERS, "finger print ta input argument error");
   }
   if (version != NOTIFICATION_VERSION) {
-    trace_error("finger print ta input argument version mismatch expected %u actual %u\n",
+    return fail(TEE_ERROR_BAD_FORMAT,
+                "finger print ta input argument version mismatch expected %u actual %u\n",
                 NOTIFICATION_VERSION, version);
-    return TEE_ERROR_BAD_FORMAT;
   }
   last_match = match;
   return TEE_SUCCESS;

@@ -4,7 +4,6 @@
 #include "tee_internal_api.h"
 
 #include "ta/base/bytes.h"
-#include "ta/base/results.h"
 
 namespace keymaster {
 

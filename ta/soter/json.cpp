@@ -3,12 +3,10 @@
 
 #include <algorithm>
 
+#include "ta/soter/utf8.h"
+
 namespace keymaster {
 namespace {
-
-byte_view bytes_of(std::string_view text) {
-  return {reinterpret_cast<const uint8_t*>(text.data()), text.size()};
-}
 
 byte_view up_to_zero(byte_view text) {
   return text.first(static_cast<size_t>(std::ranges::find(text, 0) - text.begin()));
@@ -77,7 +75,7 @@ int json_append(json_list* array, json_value value) {
 
 int json_set(json_list* object, std::string_view name, json_value value) {
   if (object == nullptr) return -1;
-  const byte_view text = up_to_zero(bytes_of(name));
+  const byte_view text = up_to_zero(text_bytes(name));
   if (json_item* item = find_member(*object, text)) {
     item->value = std::move(value);
     return 0;

@@ -1,14 +1,18 @@
 // The text of JSON values. One walk serves both to measure and to write.
 #include <algorithm>
 #include <cstdio>
-#include <cstring>
 
 #include "ta/soter/json.h"
+#include "ta/soter/utf8.h"
 
 namespace keymaster {
 namespace {
 
 constexpr size_t NUMBER_SIZE = 30;  // characters with the terminating zero
+
+// What is escaped in strings, and the letter that follows the backslash in its place.
+constexpr std::string_view ESCAPED = "\"\\/\b\f\n\r\t";
+constexpr std::string_view LETTERS = "\"\\/bfnrt";
 
 // json_writer: counts the bytes of a text and, given room, writes them.
 class json_writer {
@@ -23,9 +27,7 @@ class json_writer {
     }
     length_ += bytes.size();
   }
-  void put(std::string_view text) {
-    put(byte_view(reinterpret_cast<const uint8_t*>(text.data()), text.size()));
-  }
+  void put(std::string_view text) { put(text_bytes(text)); }
   uint64_t length() const { return length_; }
 
  private:
@@ -33,38 +35,16 @@ class json_writer {
   uint64_t length_ = 0;
 };
 
-// What stands for a byte in a string; empty when it stands for itself.
-std::string_view escape(uint8_t byte) {
-  switch (byte) {
-    case '"':
-      return "\\\"";
-    case '\\':
-      return "\\\\";
-    case '/':
-      return "\\/";
-    case '\b':
-      return "\\b";
-    case '\f':
-      return "\\f";
-    case '\n':
-      return "\\n";
-    case '\r':
-      return "\\r";
-    case '\t':
-      return "\\t";
-    default:
-      return {};
-  }
-}
-
 void put_string(json_writer* out, byte_view text) {
-  const auto is_escaped = [](uint8_t byte) { return !escape(byte).empty(); };
   out->put("\"");
   for (;;) {
-    const auto plain = static_cast<size_t>(std::ranges::find_if(text, is_escaped) - text.begin());
+    const auto escaped = std::ranges::find_first_of(text, ESCAPED);
+    const auto plain = static_cast<size_t>(escaped - text.begin());
     out->put(text.first(plain));
     if (plain == text.size()) break;
-    out->put(escape(text[plain]));
+    const auto row = static_cast<size_t>(std::ranges::find(ESCAPED, *escaped) - ESCAPED.begin());
+    out->put("\\");
+    out->put({&LETTERS[row], 1});
     text = text.subspan(plain + 1);
   }
   out->put("\"");
@@ -84,7 +64,7 @@ void put_number(json_writer* out, double number) {
   } else {
     snprintf(text, sizeof(text), "%f", number);
   }
-  out->put(std::string_view(text, strlen(text)));
+  out->put(text);
 }
 
 void put_value(json_writer* out, const json_value& value);

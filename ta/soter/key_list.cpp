@@ -1,7 +1,7 @@
 // A list of byte strings under 16-bit keys.
 #include "ta/soter/key_list.h"
 
-#include "ta/base/results.h"
+#include "ta/base/trace.h"
 
 namespace keymaster {
 
@@ -18,7 +18,7 @@ bool key_list::add(uint16_t key, heap_buffer&& value) {
   if (find(key) != nullptr) return false;
   auto* added = heap_new<item>();
   if (added == nullptr) {
-    TRACE_ERROR("Out of memory, need %dB", static_cast<int>(sizeof(item)));
+    trace(TEE_TRACE_ERROR, "Out of memory, need %dB", static_cast<int>(sizeof(item)));
     return false;
   }
   added->key = key;

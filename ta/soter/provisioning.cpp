@@ -1,8 +1,9 @@
 // SOTER's provisioned data: fetching, parsing, keeping.
 #include "ta/soter/provisioning.h"
 
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/soter/tlv_box.h"
+#include "ta/vault/items.h"
 #include "ta/vault/vault.h"
 
 namespace keymaster {
@@ -13,24 +14,9 @@ constexpr size_t PROPERTY_CAPACITY = 512;
 constexpr size_t CPU_ID_CAPACITY = 64;
 constexpr size_t TEE_TEXT_CAPACITY = 64;
 
-// Items of the key box.
-constexpr uint16_t TAG_N = 17;
-constexpr uint16_t TAG_E = 18;
-constexpr uint16_t TAG_D = 19;
-constexpr uint16_t TAG_P = 20;
-constexpr uint16_t TAG_Q = 21;
-constexpr uint16_t TAG_DP = 22;
-constexpr uint16_t TAG_DQ = 23;
-constexpr uint16_t TAG_QINV = 24;
-
 // Requests to the vault: two 16-bit little-endian words.
 constexpr uint8_t REQUEST_PROPERTY_SET[] = {0x34, 0x18, 0x00, 0x00};  // 6196, 0
 constexpr uint8_t REQUEST_CPU_ID[] = {0x34, 0x17, 0x3A, 0x17};
-
-// Items of the property box.
-constexpr uint16_t TAG_FP_NAME = 6197;
-constexpr uint16_t TAG_FP_VERSION = 6198;
-constexpr uint16_t TAG_FP_UUID = 6199;
 
 struct soter_data_t {
   soter_key_pair_t key_pair;
@@ -46,18 +32,17 @@ TEE_Result init_vlb_with_tag(heap_buffer* field, const tlv_box& box, uint16_t ta
   const trace_scope scope;
   byte_view value;
   if (tlv_box_get_bytes_ptr(box, tag, &value) != 0) {
-    return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "Get length error for %x\n", tag);
+    return fail(TEE_ERROR_BAD_PARAMETERS, "Get length error for %x\n", tag);
   }
   if (!field->allocate(value.size())) {
-    return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Fail to allocate memory for %x\n", tag);
+    return fail(TEE_ERROR_OUT_OF_MEMORY, "Fail to allocate memory for %x\n", tag);
   }
   size_t length = 0;
   const int rc = tlv_box_get_bytes(box, tag, field->span(), &length);
   if (rc == 0 && length == value.size()) return TEE_SUCCESS;
-  field->reset();
-  return TEE_FAIL(
-      TEE_ERROR_SHORT_BUFFER, "Fail to init attribute for %x, rc=%x, length(%d) capacity(%d)\n",
-      tag, static_cast<unsigned>(rc), static_cast<int>(length), static_cast<int>(value.size()));
+  return fail(TEE_ERROR_SHORT_BUFFER,
+              "Fail to init attribute for %x, rc=%x, length(%d) capacity(%d)\n", tag,
+              static_cast<unsigned>(rc), static_cast<int>(length), static_cast<int>(value.size()));
 }
 
 TEE_Result parse_buf_fill_key(soter_key_pair_t* key, byte_view serialized) {
@@ -67,18 +52,14 @@ TEE_Result parse_buf_fill_key(soter_key_pair_t* key, byte_view serialized) {
   const struct {
     uint16_t tag;
     heap_buffer* field;
-  } rows[] = {{TAG_N, &key->n}, {TAG_E, &key->e},   {TAG_D, &key->d},   {TAG_P, &key->p},
-              {TAG_Q, &key->q}, {TAG_DP, &key->dp}, {TAG_DQ, &key->dq}, {TAG_QINV, &key->qinv}};
+  } rows[] = {{KEY_N, &key->n}, {KEY_E, &key->e},   {KEY_D, &key->d},   {KEY_P, &key->p},
+              {KEY_Q, &key->q}, {KEY_DP, &key->dp}, {KEY_DQ, &key->dq}, {KEY_QINV, &key->qinv}};
   for (const auto& [tag, field] : rows) {
-    byte_view value;
-    if (tag == TAG_P && tlv_box_get_bytes_ptr(*box, tag, &value) != 0) {
-      TRACE_INFO("This rsa key pair only have n, e, d\n");
+    if (tag == KEY_P && box->items.get(KEY_P) == nullptr) {
+      trace(TEE_TRACE_INFO, "This rsa key pair only have n, e, d\n");
       break;
     }
-    if (TEE_Result res = init_vlb_with_tag(field, *box, tag)) {
-      *key = {};
-      return res;
-    }
+    TRY(init_vlb_with_tag(field, *box, tag));
   }
   return TEE_SUCCESS;
 }
@@ -87,12 +68,10 @@ TEE_Result load_key(soter_key_pair_t* key) {
   const trace_scope scope;
   heap_buffer serialized;
   if (!serialized.allocate(KEY_BOX_CAPACITY)) {
-    return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "No memory for serialization\n");
+    return fail(TEE_ERROR_OUT_OF_MEMORY, "No memory for serialization\n");
   }
   size_t used = 0;
-  if (TEE_Result res = retrieve_key_from_vault(serialized.data(), serialized.size(), &used)) {
-    return res;
-  }
+  TRY(retrieve_key_from_vault(serialized.data(), serialized.size(), &used));
   return parse_buf_fill_key(key, serialized.view().first(used));
 }
 
@@ -103,10 +82,7 @@ TEE_Result retrieve_soter_property(heap_ptr<tlv_box>* box) {
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   size_t length = serialized.size();
-  if (TEE_Result res =
-          retrieve_property_from_vault(REQUEST_PROPERTY_SET, serialized.data(), &length)) {
-    return res;
-  }
+  TRY(retrieve_property_from_vault(REQUEST_PROPERTY_SET, serialized.data(), &length));
   *box = tlv_box_parse(serialized.view().first(length));
   if (*box) return TEE_SUCCESS;
   trace(TEE_TRACE_DEBUG, "parse property tlv box error");
@@ -117,18 +93,18 @@ TEE_Result init_prop_with_tag(heap_buffer* field, const tlv_box& box, uint16_t t
   const trace_scope scope;
   byte_view value;
   if (tlv_box_get_bytes_ptr(box, tag, &value) != 0) {
-    TRACE_DEBUG("tlv_box_get_bytes_ptr error for tag 0x%x\n", tag);
+    trace(TEE_TRACE_DEBUG, "tlv_box_get_bytes_ptr error for tag 0x%x\n", tag);
     return TEE_ERROR_GENERIC;
   }
   if (field->copy_of(value)) return TEE_SUCCESS;
-  TRACE_DEBUG("No memory for prop->buf, tag 0x%x length %u\n", tag,
-              static_cast<unsigned>(value.size()));
+  trace(TEE_TRACE_DEBUG, "No memory for prop->buf, tag 0x%x length %u\n", tag,
+        static_cast<unsigned>(value.size()));
   return TEE_ERROR_OUT_OF_MEMORY;
 }
 
 TEE_Result init_fp_uuid(soter_prop_set_t* props, const tlv_box& box) {
   byte_view uuid;
-  if (tlv_box_get_bytes_ptr(box, TAG_FP_UUID, &uuid) != 0) {
+  if (tlv_box_get_bytes_ptr(box, FP_UUID, &uuid) != 0) {
     trace(TEE_TRACE_DEBUG, "get fp uuid bytes ptr error");
     return TEE_ERROR_GENERIC;
   }
@@ -141,20 +117,18 @@ TEE_Result init_fp_uuid(soter_prop_set_t* props, const tlv_box& box) {
   return TEE_SUCCESS;
 }
 
-TEE_Result init_soter_cpuid(soter_prop_set_t* props) {
+TEE_Result init_soter_cpuid(heap_buffer* cpu_id) {
   const trace_scope scope;
-  if (!props->cpu_id.allocate(CPU_ID_CAPACITY)) {
-    TRACE_DEBUG("No memory for cpu_id");
+  if (!cpu_id->allocate(CPU_ID_CAPACITY)) {
+    trace(TEE_TRACE_DEBUG, "No memory for cpu_id");
     return TEE_ERROR_OUT_OF_MEMORY;
   }
   size_t length = CPU_ID_CAPACITY;
-  if (TEE_Result res =
-          retrieve_property_from_vault(REQUEST_CPU_ID, props->cpu_id.data(), &length)) {
-    TRACE_DEBUG("retrieve soter cpu id error 0x%x\n", res);
-    props->cpu_id.reset();
+  if (TEE_Result res = retrieve_property_from_vault(REQUEST_CPU_ID, cpu_id->data(), &length)) {
+    trace(TEE_TRACE_DEBUG, "retrieve soter cpu id error 0x%x\n", res);
     return res;
   }
-  props->cpu_id.truncate(length);
+  cpu_id->truncate(length);
   return TEE_SUCCESS;
 }
 
@@ -170,7 +144,7 @@ TEE_Result get_tee_property(heap_buffer* field, const char* property, const char
           TEE_GetPropertyAsString(TEE_PROPSET_TEE_IMPLEMENTATION, property, text, &size)) {
     {
       const trace_scope scope;
-      TRACE_DEBUG("get client id property error, 0x%x\n", res);
+      trace(TEE_TRACE_DEBUG, "get client id property error, 0x%x\n", res);
     }
     trace(TEE_TRACE_DEBUG, "get_tee_property os manufacturer error 0x%x\n", res);
     return res;
@@ -181,18 +155,15 @@ TEE_Result get_tee_property(heap_buffer* field, const char* property, const char
 
 TEE_Result load_properties(soter_prop_set_t* props) {
   heap_ptr<tlv_box> box;
-  if (TEE_Result res = retrieve_soter_property(&box)) return res;
-  if (TEE_Result res = init_prop_with_tag(&props->fp_name, *box, TAG_FP_NAME)) return res;
-  if (TEE_Result res = init_prop_with_tag(&props->fp_version, *box, TAG_FP_VERSION)) return res;
-  if (TEE_Result res = init_fp_uuid(props, *box)) return res;
-  if (TEE_Result res = init_soter_cpuid(props)) {
+  TRY(retrieve_soter_property(&box));
+  TRY(init_prop_with_tag(&props->fp_name, *box, FP_NAME));
+  TRY(init_prop_with_tag(&props->fp_version, *box, FP_VERSION));
+  TRY(init_fp_uuid(props, *box));
+  if (TEE_Result res = init_soter_cpuid(&props->cpu_id)) {
     trace(TEE_TRACE_DEBUG, "init soter cpuid error 0x%x\n", res);
     return res;
   }
-  if (TEE_Result res =
-          get_tee_property(&props->tee_name, "gpd.tee.trustedos.manufacturer", "tee_name")) {
-    return res;
-  }
+  TRY(get_tee_property(&props->tee_name, "gpd.tee.trustedos.manufacturer", "tee_name"));
   return get_tee_property(&props->tee_version, "gpd.tee.trustedos.implementation.version",
                           "tee_version");
 }
@@ -203,7 +174,8 @@ TEE_Result init_soter_key(soter_key_pair_t* key) {
   const trace_scope scope;
   *key = {};
   const TEE_Result res = load_key(key);
-  TRACE_DEBUG("Init Soter key pair %s\n", res == TEE_SUCCESS ? "success" : "fail");
+  trace(TEE_TRACE_DEBUG, "Init Soter key pair %s\n", res == TEE_SUCCESS ? "success" : "fail");
+  if (res != TEE_SUCCESS) *key = {};
   return res;
 }
 
@@ -212,9 +184,9 @@ TEE_Result init_soter_prop_set(soter_prop_set_t* props) {
   *props = {};
   const TEE_Result res = load_properties(props);
   if (res == TEE_SUCCESS) {
-    TRACE_DEBUG("Init soter data success\n");
+    trace(TEE_TRACE_DEBUG, "Init soter data success\n");
   } else {
-    TRACE_DEBUG("Init soter data fails, 0x%x\n", res);
+    trace(TEE_TRACE_DEBUG, "Init soter data fails, 0x%x\n", res);
     *props = {};
   }
   return res;
@@ -223,9 +195,9 @@ TEE_Result init_soter_prop_set(soter_prop_set_t* props) {
 TEE_Result soter_init() {
   const trace_scope scope;
   heap_ptr<soter_data_t> data(heap_new<soter_data_t>());
-  if (!data) return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
-  if (TEE_Result res = init_soter_key(&data->key_pair)) return res;
-  if (TEE_Result res = init_soter_prop_set(&data->prop_set)) return res;
+  if (!data) return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
+  TRY(init_soter_key(&data->key_pair));
+  TRY(init_soter_prop_set(&data->prop_set));
   soter_deinit();
   loaded = data.release();
   return TEE_SUCCESS;

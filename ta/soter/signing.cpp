@@ -3,11 +3,11 @@
 #include "ta/soter/signing.h"
 
 #include "tee_extensions.h"
-#include "tee_internal_api.h"
 
 #include <algorithm>
 
 #include "ta/alg/rsa/soter_hooks.h"
+#include "ta/base/outcome.h"
 #include "ta/soter/documents.h"
 #include "ta/soter/provisioning.h"
 
@@ -22,8 +22,7 @@ constexpr size_t USUAL_SIGNATURE = 256;  // of a 2048-bit key
 TEE_Result refuse_undigested(const rsa_sign_operation_t& operation, byte_view document) {
   const TEE_Result res =
       document.size() > operation.key_size() ? TEE_ERROR_OUT_OF_MEMORY : TEE_ERROR_BAD_STATE;
-  trace_error("AsymmetricSignDigest failed with 0x%08x\n", res);
-  return res;
+  return fail(res, "AsymmetricSignDigest failed with 0x%08x\n", res);
 }
 
 }  // namespace
@@ -42,20 +41,13 @@ TEE_Result soter_do_sign_finish(rsa_sign_operation_t* operation, byte_view docum
   const trace_scope scope;
   message_t& message = operation->message;
   if (!message.is_hashed()) return refuse_undigested(*operation, document);
-  if (TEE_Result res =
-          message.hash.digest_final(document, message.buffer.span(), &message.length)) {
-    return res;
-  }
+  TRY(message.hash.digest_final(document, message.buffer.span(), &message.length));
   heap_buffer made;
-  if (!made.allocate(operation->key_size())) {
-    return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
-  }
+  if (!made.allocate(operation->key_size())) return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   // The longest salt, whatever the digest: unlike other keys' signatures, intended.
   const TEE_Attribute salt = value_attribute(TEE_ATTR_RSA_PSS_SALT_LENGTH, TEE_PSS_SALT_MAX_LENGTH);
   const size_t count = operation->padding == KM_PAD_RSA_PSS ? 1 : 0;
-  if (TEE_Result res = sign_digest(operation->main, {&salt, count}, message.data(), &made)) {
-    return res;
-  }
+  TRY(sign_digest(operation->main, {&salt, count}, message.data(), &made));
   *signature = std::move(made);
   return TEE_SUCCESS;
 }
@@ -63,7 +55,7 @@ TEE_Result soter_do_sign_finish(rsa_sign_operation_t* operation, byte_view docum
 TEE_Result do_digest_with_sha(byte_view data, byte_span digest) {
   const trace_scope scope;
   tee_operation sha;
-  if (TEE_Result res = sha.allocate(TEE_ALG_SHA256, TEE_MODE_DIGEST, 0)) return res;
+  TRY(sha.allocate(TEE_ALG_SHA256, TEE_MODE_DIGEST, 0));
   size_t length = 0;
   return sha.digest_final(data, digest, &length);
 }
@@ -72,15 +64,13 @@ TEE_Result do_sign_with_rsa(TEE_ObjectHandle key, uint32_t key_bits, byte_view d
                             heap_buffer* signature) {
   const trace_scope scope;
   tee_operation rsa;
-  if (TEE_Result res = rsa.allocate(TEE_ALG_RSASSA_PKCS1_V1_5_SHA256, TEE_MODE_SIGN, key_bits)) {
-    return res;
-  }
-  if (TEE_Result res = rsa.set_key(key)) return res;
+  TRY(rsa.allocate(TEE_ALG_RSASSA_PKCS1_V1_5_SHA256, TEE_MODE_SIGN, key_bits));
+  TRY(rsa.set_key(key));
   heap_buffer made;
   if (!made.allocate(std::max(USUAL_SIGNATURE, size_t{key_bits} / 8))) {
-    return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
+    return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   }
-  if (TEE_Result res = sign_digest(rsa, {}, digest, &made)) return res;
+  TRY(sign_digest(rsa, {}, digest, &made));
   *signature = std::move(made);
   return TEE_SUCCESS;
 }
@@ -88,7 +78,7 @@ TEE_Result do_sign_with_rsa(TEE_ObjectHandle key, uint32_t key_bits, byte_view d
 TEE_Result digest_and_sign(TEE_ObjectHandle key, uint32_t key_bits, byte_view data,
                            heap_buffer* signature) {
   uint8_t digest[SHA256_SIZE];
-  if (TEE_Result res = do_digest_with_sha(data, digest)) return res;
+  TRY(do_digest_with_sha(data, digest));
   return do_sign_with_rsa(key, key_bits, digest, signature);
 }
 
@@ -102,20 +92,20 @@ TEE_Result soter_enhance_sign_finish(rsa_sign_operation_t* operation,
   const trace_scope scope;
   uint64_t uid = 0;
   if (const auto* given = get_unique(key_params, KM_TAG_SOTER_UID)) {
-    TRACE_DEBUG("soter key has uid\n");
+    trace(TEE_TRACE_DEBUG, "soter key has uid\n");
     uid = given->integer;
   }
   heap_buffer document;
   if (!produce_soter_sign_json(uid, message, &document)) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "produce json string error");
+    return fail(TEE_ERROR_GENERIC, "produce json string error");
   }
   heap_buffer signature;
-  if (TEE_Result res = soter_do_sign_finish(operation, document.view(), &signature)) return res;
+  TRY(soter_do_sign_finish(operation, document.view(), &signature));
   const uint64_t size = signed_document_size(document.view(), signature.view());
   heap_buffer record;
   if (size > UINT32_MAX || !record.allocate(static_cast<size_t>(size)) ||
       !write_signed_document(document.view(), signature.view(), record.span())) {
-    return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory for output");
+    return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory for output");
   }
   *output = std::move(record);
   return TEE_SUCCESS;

@@ -3,7 +3,7 @@
 
 #include <cstring>
 
-#include "ta/base/results.h"
+#include "ta/base/trace.h"
 
 namespace keymaster {
 namespace {
@@ -11,7 +11,7 @@ namespace {
 constexpr size_t ITEM_HEADER = 4;
 
 void trace_out_of_memory(size_t size) {
-  trace_error("Out of memory, need %dB", static_cast<int>(size));
+  trace(TEE_TRACE_ERROR, "Out of memory, need %dB", static_cast<int>(size));
 }
 
 }  // namespace

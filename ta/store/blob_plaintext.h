@@ -3,7 +3,7 @@
 #pragma once
 
 #include "ta/base/heap.h"
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/params/param_set.h"
 
 namespace keymaster {
@@ -11,8 +11,7 @@ namespace keymaster {
 // parse_plaintext: takes a plaintext apart: *plaintext is cut to the key material, what follows the
 // characteristics is ignored. Keymaster errors: `unreadable_set` for characteristics that do not
 // unmarshal. TEE_ERROR_GENERIC: a length passes the end. On failure *plaintext is as it was.
-[[nodiscard]] TEE_Result parse_plaintext(heap_buffer* plaintext, keymaster_error_t unreadable_set,
-                                         keymaster_key_param_set_t* characteristics,
-                                         keymaster_error_t* km_error);
+outcome parse_plaintext(heap_buffer* plaintext, keymaster_error_t unreadable_set,
+                        keymaster_key_param_set_t* characteristics);
 
 }  // namespace keymaster

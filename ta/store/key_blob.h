@@ -23,17 +23,13 @@ namespace keymaster {
 // unmarshal; -41 out of memory; -1000 the platform gave back fewer bytes. TEE codes: the platform's
 // (TEE_ERROR_MAC_INVALID for anything altered), TEE_ERROR_GENERIC for inner lengths that do not
 // fit, KEY_STORE_ERROR_KSK_MISSING.
-[[nodiscard]] TEE_Result open_key(byte_view blob, heap_buffer* key,
-                                  keymaster_key_param_set_t* characteristics,
-                                  keymaster_error_t* km_error);
+outcome open_key(byte_view blob, heap_buffer* key, keymaster_key_param_set_t* characteristics);
 
 // open_v1_key: the same for a blob of the earlier Keymaster TA, which that TA opens: a session with
 // it, command 27. On failure the outputs are empty. Keymaster errors: -33 characteristics that do
 // not unmarshal; -41 out of memory. TEE codes: those of the session (TEE_ERROR_ITEM_NOT_FOUND where
 // there is no such TA) and of the earlier TA, unchanged; TEE_ERROR_GENERIC for an answer that is
 // longer than the blob or whose inner lengths do not fit.
-[[nodiscard]] TEE_Result open_v1_key(byte_view blob, heap_buffer* key,
-                                     keymaster_key_param_set_t* characteristics,
-                                     keymaster_error_t* km_error);
+outcome open_v1_key(byte_view blob, heap_buffer* key, keymaster_key_param_set_t* characteristics);
 
 }  // namespace keymaster

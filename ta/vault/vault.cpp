@@ -3,7 +3,7 @@
 
 #include "product/uuids.h"
 #include "ta/base/bytes.h"
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 #include "ta/base/tee_session.h"
 
 namespace keymaster {
@@ -36,8 +36,7 @@ constexpr vault_command RETRIEVE_PROPERTY = {12, REQUEST_AND_BYTES, "TA property
 TEE_Result call_vault(const vault_command& command, TEE_Param* params, size_t* length) {
   tee_session session;
   if (TEE_Result res = session.open(VAULT, TEE_TIMEOUT_INFINITE)) {
-    trace_error("Open vault session fails, 0x%x\n", res);
-    return res;
+    return fail(res, "Open vault session fails, 0x%x\n", res);
   }
   TEE_Result res = session.invoke(command.id, command.types, params);
   const size_t reported =
@@ -54,18 +53,14 @@ TEE_Result call_vault(const vault_command& command, TEE_Param* params, size_t* l
 
 TEE_Result retrieve_bytes(const vault_command& command, uint8_t* buffer, size_t size,
                           size_t* used_length) {
-  if (buffer == nullptr) {
-    trace_error("Buf is null\n");
-    return TEE_ERROR_SHORT_BUFFER;
-  }
+  if (buffer == nullptr) return fail(TEE_ERROR_SHORT_BUFFER, "Buf is null\n");
   if (used_length == nullptr) {
-    trace_error("used_length pointer is null\n");
-    return TEE_ERROR_BAD_PARAMETERS;
+    return fail(TEE_ERROR_BAD_PARAMETERS, "used_length pointer is null\n");
   }
   TEE_Param params[4] = {};
   params[0].memref.buffer = buffer;
   params[0].memref.size = static_cast<tee_size>(size);
-  if (TEE_Result res = call_vault(command, params, &size)) return res;
+  TRY(call_vault(command, params, &size));
   *used_length = size;
   return TEE_SUCCESS;
 }
@@ -86,11 +81,11 @@ TEE_Result retrieve_property_from_vault(const uint8_t* request, uint8_t* output,
                                         size_t* output_length) {
   const trace_scope scope;
   if (request == nullptr || output == nullptr) {
-    return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "request %p output %p\n",
-                    static_cast<const void*>(request), static_cast<const void*>(output));
+    return fail(TEE_ERROR_BAD_PARAMETERS, "request %p output %p\n",
+                static_cast<const void*>(request), static_cast<const void*>(output));
   }
   if (output_length == nullptr) {
-    return TEE_FAIL(TEE_ERROR_BAD_PARAMETERS, "output_length pointer is null\n");
+    return fail(TEE_ERROR_BAD_PARAMETERS, "output_length pointer is null\n");
   }
   TEE_Param params[4] = {};
   params[0].memref.buffer = const_cast<uint8_t*>(request);  // an input slot: only read

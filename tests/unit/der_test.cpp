@@ -176,9 +176,8 @@ TEST_F(KeyDescriptions, EncodeAsWrittenByHand) {
 
 TEST_F(KeyDescriptions, FitOrAreRefused) {
   KeyDescription* description = KeyDescription_alloc();
-  keymaster_error_t error = KM_ERROR_OK;
-  ASSERT_EQ(
-      fill_auth_list_by_param_set(sample_characteristics(), &description->tee_enforced, &error), 0);
+  ASSERT_EQ(fill_auth_list_by_param_set(sample_characteristics(), &description->tee_enforced),
+            KM_ERROR_OK);
   uint8_t whole[256];
   const int32_t need = KeyDescription_write(description, whole, sizeof(whole));
   ASSERT_GT(need, 0);

@@ -7,8 +7,6 @@
 namespace keymaster {
 namespace {
 
-constexpr trace_site AT = {"begin", 120};
-
 using Trace = platform::fixture;
 
 TEST_F(Trace, NamesLevelThreadFunctionAndLine) {
@@ -22,20 +20,47 @@ TEST_F(Trace, NamesLevelThreadFunctionAndLine) {
       {0, 1, "x", "UKN [0x1] KEYMASTER:begin:120: x\n"},
   };
   platform::trace_threshold = TEE_TRACE_FLOW;
+  const trace_scope scope("begin");
   for (const auto& [level, thread, message, line] : cases) {
     platform::trace_lines.clear();
     platform::trace_thread = thread;
-    trace(level, AT, "%s", message);
+    trace({level, 120}, "%s", message);
     EXPECT_EQ(platform::trace_lines, std::vector<std::string>{line});
   }
 }
 
+TEST_F(Trace, GoesOutUnderTheInnermostOpenName) {
+  trace_scope::reset();
+  const auto helper = [](const char* message) { return fail(TEE_ERROR_GENERIC, "%s", message); };
+  const auto inner = [&] {
+    const trace_scope scope("inner");
+    return helper("b");
+  };
+  {
+    const trace_scope scope;
+    EXPECT_EQ(helper("a"), TEE_ERROR_GENERIC);
+    EXPECT_EQ(inner(), TEE_ERROR_GENERIC);
+    EXPECT_EQ(refuse(KM_ERROR_INVALID_TAG, "c"), KM_ERROR_INVALID_TAG);
+    trace(TEE_TRACE_ERROR, "d");
+  }
+  const int line = __LINE__ - 2;
+  EXPECT_EQ(helper("e"), TEE_ERROR_GENERIC);
+  std::string names;
+  for (const std::string& text : platform::trace_lines) {
+    const size_t name = text.find("KEYMASTER:") + 10;
+    names += text.substr(name, text.find(':', name) - name) + " ";
+  }
+  EXPECT_EQ(names, "TestBody inner TestBody TestBody  ");
+  EXPECT_NE(platform::trace_lines[3].find("TestBody:" + std::to_string(line)), std::string::npos);
+}
+
 TEST_F(Trace, CutsLinesAt256BytesAndKeepsTheirNewline) {
+  const trace_scope scope("begin");
   const size_t prefix = std::string("ERR [0x2a] KEYMASTER:begin:120: ").size();
   for (const size_t length : {255 - prefix, 256 - prefix, size_t{300}, size_t{5000}}) {
     platform::trace_lines.clear();
     const std::string message(length, 'x');
-    trace_error(AT, "%s", message.c_str());
+    trace({TEE_TRACE_ERROR, 120}, "%s", message.c_str());
     ASSERT_EQ(platform::trace_lines.size(), 1u);
     const std::string& line = platform::trace_lines[0];
     EXPECT_EQ(line.size(), 256u) << length;
@@ -43,7 +68,8 @@ TEST_F(Trace, CutsLinesAt256BytesAndKeepsTheirNewline) {
   }
   platform::trace_lines.clear();
   const std::string name(400, 'f');
-  trace_error({name.c_str(), 1}, "message");
+  const trace_scope long_name(name.c_str());
+  trace(TEE_TRACE_ERROR, "message");
   EXPECT_EQ(platform::trace_lines[0].size(), 256u);
   EXPECT_EQ(platform::trace_lines[0].back(), '\n');
 }

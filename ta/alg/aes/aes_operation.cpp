@@ -3,6 +3,8 @@
 
 #include "tee_internal_api.h"
 
+#include <algorithm>
+
 namespace keymaster {
 namespace {
 
@@ -17,10 +19,8 @@ constexpr aes_mode_t MODES[] = {
 constexpr size_t MAX_NONCE_SIZE = 16;
 
 const aes_mode_t* mode_of(uint32_t block_mode) {
-  for (const aes_mode_t& mode : MODES) {
-    if (mode.block_mode == block_mode) return &mode;
-  }
-  return nullptr;
+  const auto* mode = std::ranges::find(MODES, block_mode, &aes_mode_t::block_mode);
+  return mode == std::end(MODES) ? nullptr : mode;
 }
 
 bool aes_padding(const keymaster_key_param_set_t& params, uint32_t* value) {
@@ -35,43 +35,31 @@ bool aes_block_mode(const keymaster_key_param_set_t& params, uint32_t* value) {
   return true;
 }
 
-TEE_Result load_key(aes_encrypt_operation_t* operation, byte_view key_material) {
-  const TEE_Result res = aes_resolve_key_data(key_material, &operation->key, &operation->key_bits);
-  if (res != TEE_SUCCESS) trace_error("Resolve key data failed");
-  return res;
-}
-
 // Only an upper bound: the key's minimum is a matter of authorisation, and the platform knows which
 // lengths it offers.
 keymaster_error_t read_mac_length(aes_encrypt_operation_t* operation,
-                                  const keymaster_key_param_set_t& begin_params) {
-  const keymaster_key_param_t* mac_length = get_unique(begin_params, KM_TAG_MAC_LENGTH);
+                                  const keymaster_key_param_set_t& params) {
+  const keymaster_key_param_t* mac_length = get_unique(params, KM_TAG_MAC_LENGTH);
   if (mac_length == nullptr) {
-    trace_error("No or too many KM_TAG_MAC_LENGTH");
-    return KM_ERROR_INVALID_ARGUMENT;
+    return refuse(KM_ERROR_INVALID_ARGUMENT, "No or too many KM_TAG_MAC_LENGTH");
   }
   operation->mac_bits = mac_length->integer;
-  if (operation->mac_bits > MAX_MAC_BITS || operation->mac_bits % 8 != 0) {
-    trace_error("Unsupported mac length %d", static_cast<int>(operation->mac_bits));
-    return KM_ERROR_UNSUPPORTED_MAC_LENGTH;
-  }
-  return KM_ERROR_OK;
+  if (operation->mac_bits <= MAX_MAC_BITS && operation->mac_bits % 8 == 0) return KM_ERROR_OK;
+  return refuse(KM_ERROR_UNSUPPORTED_MAC_LENGTH, "Unsupported mac length %d",
+                static_cast<int>(operation->mac_bits));
 }
 
 // What the begin parameters ask for, apart from the nonce.
 keymaster_error_t read_request(aes_encrypt_operation_t* operation,
-                               const keymaster_key_param_set_t& begin_params) {
+                               const keymaster_key_param_set_t& params) {
   uint32_t block_mode = 0;
-  if (!aes_block_mode(begin_params, &block_mode)) {
-    trace_error("No or too many KM_TAG_BLOCK_MODE");
-    return KM_ERROR_INVALID_ARGUMENT;
+  if (!aes_block_mode(params, &block_mode)) {
+    return refuse(KM_ERROR_INVALID_ARGUMENT, "No or too many KM_TAG_BLOCK_MODE");
   }
-  aes_padding(begin_params, &operation->padding);
+  aes_padding(params, &operation->padding);
   operation->mode = mode_of(block_mode);
   if (operation->mode == nullptr) return KM_ERROR_UNSUPPORTED_BLOCK_MODE;
-  if (operation->is_gcm()) {
-    if (auto error = read_mac_length(operation, begin_params)) return error;
-  }
+  if (operation->is_gcm()) TRY(read_mac_length(operation, params));
   const bool padding_fits = operation->padding == KM_PAD_NONE ||
                             (operation->padding == KM_PAD_PKCS7 && operation->mode->whole_blocks);
   return padding_fits ? KM_ERROR_OK : KM_ERROR_INCOMPATIBLE_PADDING_MODE;
@@ -80,10 +68,9 @@ keymaster_error_t read_request(aes_encrypt_operation_t* operation,
 // The nonce of a new stream: the request's, or as many random bytes in `room` as the mode needs.
 // Decryption draws one as well, which is intended: whether a nonce is needed is for clients to
 // know.
-keymaster_error_t settle_nonce(const aes_mode_t& mode,
-                               const keymaster_key_param_set_t& begin_params, byte_span room,
-                               byte_view* nonce) {
-  const keymaster_key_param_t* given = get_unique(begin_params, KM_TAG_NONCE);
+keymaster_error_t settle_nonce(const aes_mode_t& mode, const keymaster_key_param_set_t& params,
+                               byte_span room, byte_view* nonce) {
+  const keymaster_key_param_t* given = get_unique(params, KM_TAG_NONCE);
   if (given == nullptr) {
     const byte_span drawn = room.first(mode.nonce_size);
     if (!drawn.empty()) TEE_GenerateRandom(drawn.data(), static_cast<tee_size>(drawn.size()));
@@ -95,26 +82,20 @@ keymaster_error_t settle_nonce(const aes_mode_t& mode,
   return nonce->size() == mode.nonce_size ? KM_ERROR_OK : KM_ERROR_INVALID_ARGUMENT;
 }
 
-TEE_Result init_platform(aes_encrypt_operation_t* operation, byte_view nonce) {
-  if (operation->is_gcm()) return operation->main.ae_init(nonce, operation->mac_bits);
-  const auto size = static_cast<tee_size>(nonce.size());
-  TEE_CipherInit(operation->main.get(), size == 0 ? nullptr : nonce.data(), size);
-  return TEE_SUCCESS;
-}
-
-TEE_Result start_stream(aes_encrypt_operation_t* operation,
-                        const keymaster_key_param_set_t& begin_params,
-                        keymaster_key_param_set_t* out_params, keymaster_error_t* km_error) {
+outcome start_stream(aes_encrypt_operation_t* operation, const begin_request& request) {
   uint8_t room[MAX_NONCE_SIZE];
   byte_view nonce;
-  *km_error = settle_nonce(*operation->mode, begin_params, room, &nonce);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
-  if (TEE_Result res = init_platform(operation, nonce)) return res;
-  if (!nonce.empty() && !add_blob(out_params, KM_TAG_NONCE, nonce)) {
-    trace_error("Out of memory");
-    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
+  TRY(settle_nonce(*operation->mode, request.params, room, &nonce));
+  if (operation->is_gcm()) {
+    TRY(operation->main.ae_init(nonce, operation->mac_bits));
+  } else {
+    TEE_CipherInit(operation->main.get(), nonce.empty() ? nullptr : nonce.data(),
+                   static_cast<tee_size>(nonce.size()));
   }
-  return TEE_SUCCESS;
+  if (!nonce.empty() && !add_blob(request.out_params, KM_TAG_NONCE, nonce)) {
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
+  }
+  return DONE;
 }
 
 constexpr operation_methods_t AES_ENCRYPT_METHODS = {
@@ -132,30 +113,22 @@ constexpr operation_methods_t AES_DECRYPT_METHODS = {
 };
 
 const operation_methods_t* aes_get_operation_methods(uint32_t purpose) {
-  switch (purpose) {
-    case KM_PURPOSE_ENCRYPT:
-      return &AES_ENCRYPT_METHODS;
-    case KM_PURPOSE_DECRYPT:
-      return &AES_DECRYPT_METHODS;
-    default:
-      return nullptr;
-  }
+  if (purpose == KM_PURPOSE_ENCRYPT) return &AES_ENCRYPT_METHODS;
+  return purpose == KM_PURPOSE_DECRYPT ? &AES_DECRYPT_METHODS : nullptr;
 }
 
 }  // namespace
 
-TEE_Result aes_prepare(aes_encrypt_operation_t* operation, uint32_t tee_mode,
-                       byte_view key_material, const keymaster_key_param_set_t& begin_params,
-                       keymaster_key_param_set_t* out_params, keymaster_error_t* km_error) {
-  if (TEE_Result res = load_key(operation, key_material)) return res;
-  *km_error = read_request(operation, begin_params);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
+outcome aes_prepare(aes_encrypt_operation_t* operation, uint32_t tee_mode,
+                    const begin_request& request) {
   tee_operation& main = operation->main;
-  if (TEE_Result res = main.allocate(operation->mode->algorithm, tee_mode, operation->key_bits)) {
-    return res;
-  }
-  if (TEE_Result res = main.set_key(operation->key.get())) return res;
-  return start_stream(operation, begin_params, out_params, km_error);
+  const TEE_Result loaded =
+      aes_resolve_key_data(request.key_material, &operation->key, &operation->key_bits);
+  if (loaded != TEE_SUCCESS) return fail(loaded, "Resolve key data failed");
+  TRY(read_request(operation, request.params));
+  TRY(main.allocate(operation->mode->algorithm, tee_mode, operation->key_bits));
+  TRY(main.set_key(operation->key.get()));
+  return start_stream(operation, request);
 }
 
 keymaster_error_t aes_take_associated_data(aes_encrypt_operation_t* operation,
@@ -179,28 +152,20 @@ TEE_Result aes_feed(aes_encrypt_operation_t* operation, byte_view input, byte_sp
     return res;
   }
   auto size = static_cast<tee_size>(room.size());
-  const TEE_Result res = TEE_CipherUpdate(operation->main.get(), input.data(),
-                                          static_cast<tee_size>(input.size()), room.data(), &size);
-  if (res != TEE_SUCCESS) {
-    trace_error("CipherUpdate failed with 0x%08x\n", res);
-    return res;
-  }
+  TRY(checked(TEE_CipherUpdate(operation->main.get(), input.data(),
+                               static_cast<tee_size>(input.size()), room.data(), &size),
+              "CipherUpdate"));
   *produced += size;
   return TEE_SUCCESS;
 }
 
-TEE_Result aes_end_cipher(const aes_encrypt_operation_t& operation, keymaster_error_t* km_error) {
+outcome aes_end_cipher(const aes_encrypt_operation_t& operation) {
   tee_size made = 0;
-  const TEE_Result res = TEE_CipherDoFinal(operation.main.get(), nullptr, 0, nullptr, &made);
-  if (res != TEE_SUCCESS) {
-    trace_error("CipherDoFinal failed with 0x%08x\n", res);
-    return res;
-  }
-  if (made != 0) {
-    trace_error("CipherDoFinal make output %dB, expected %dB", static_cast<int>(made), 0);
-    *km_error = KM_ERROR_UNKNOWN_ERROR;
-  }
-  return TEE_SUCCESS;
+  TRY(checked(TEE_CipherDoFinal(operation.main.get(), nullptr, 0, nullptr, &made),
+              "CipherDoFinal"));
+  if (made == 0) return DONE;
+  return refuse(KM_ERROR_UNKNOWN_ERROR, "CipherDoFinal make output %dB, expected %dB",
+                static_cast<int>(made), 0);
 }
 
 const algorithm_t AES_ALGORITHM = {

@@ -47,12 +47,9 @@ struct aes_decrypt_operation_t : aes_encrypt_operation_t {
 };
 
 // aes_prepare: everything of create that can fail after the record is there; `tee_mode` is
-// TEE_MODE_ENCRYPT or TEE_MODE_DECRYPT. Codes as create_aes_encrypt. Messages go out under `at`.
-[[nodiscard]] TEE_Result aes_prepare(aes_encrypt_operation_t* operation, uint32_t tee_mode,
-                                     byte_view key_material,
-                                     const keymaster_key_param_set_t& begin_params,
-                                     keymaster_key_param_set_t* out_params,
-                                     keymaster_error_t* km_error);
+// TEE_MODE_ENCRYPT or TEE_MODE_DECRYPT. Codes as create_aes_encrypt.
+outcome aes_prepare(aes_encrypt_operation_t* operation, uint32_t tee_mode,
+                    const begin_request& request);
 
 // aes_take_associated_data: hands the KM_TAG_ASSOCIATED_DATA of an update to the platform.
 // KM_ERROR_INVALID_TAG outside GCM, after the first data, or for more than one.
@@ -66,7 +63,6 @@ struct aes_decrypt_operation_t : aes_encrypt_operation_t {
 
 // aes_end_cipher: ends a stream of any mode but GCM. All data is out by then: -1000 if the platform
 // makes more.
-[[nodiscard]] TEE_Result aes_end_cipher(const aes_encrypt_operation_t& operation,
-                                        keymaster_error_t* km_error);
+outcome aes_end_cipher(const aes_encrypt_operation_t& operation);
 
 }  // namespace keymaster

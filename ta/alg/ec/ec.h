@@ -8,6 +8,8 @@
 
 namespace keymaster {
 
+struct ASN1_OID;
+
 extern const algorithm_t EC_ALGORITHM;
 
 // ec_curve_t: what belongs to one curve.
@@ -15,11 +17,11 @@ struct ec_curve_t {
   uint32_t key_bits;
   uint32_t tee_curve;      // TEE_ECC_CURVE_*
   uint32_t tee_algorithm;  // TEE_ALG_ECDSA_*
-  uint32_t km_curve;       // KM_EC_CURVE_*, or NO_EC_CURVE when no key of this size can be made
+  uint32_t km_curve;       // KM_EC_CURVE_*
+  const ASN1_OID* name;    // null when no key of this size can be made
 
   size_t size() const { return (size_t{key_bits} + 7) / 8; }  // of a coordinate, in bytes
 };
-constexpr uint32_t NO_EC_CURVE = 0xFFFFFFFF;
 
 // find_ec_curve: the curve of this key size, or null.
 const ec_curve_t* find_ec_curve(uint32_t key_bits);
@@ -30,35 +32,20 @@ const ec_curve_t* find_ec_curve(uint32_t key_bits);
 // a size other than 224, 256, 384 or 521 bits. TEE_ERROR_GENERIC: the data is too short; what
 // follows the private value is ignored. Import takes the numbers as they are: a key that is none is
 // refused when it is used.
-TEE_Result ec_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material,
-                           keymaster_error_t* km_error);
-TEE_Result ec_import_key(keymaster_key_param_set_t* description, byte_view key_data,
-                         heap_buffer* key_material, keymaster_error_t* km_error);
+outcome ec_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material);
+outcome ec_import_key(keymaster_key_param_set_t* description, byte_view key_data,
+                      heap_buffer* key_material);
 
 // ec_export_key: writes the public part of the record. TEE_ERROR_GENERIC: record or output are too
 // short.
-TEE_Result ec_export_key(byte_view key_material, byte_span output, size_t* produced,
-                         keymaster_error_t* km_error);
+outcome ec_export_key(byte_view key_material, byte_span output, size_t* produced);
 
 // ec_set_key_info: fills the subject public key of a certificate. TEE_ERROR_GENERIC: the record is
 // too short. -41: out of memory. -1000: no named curve of its size.
-TEE_Result ec_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key,
-                           keymaster_error_t* km_error);
+outcome ec_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key);
 
-// ec_resolve_key_data: loads key material into the platform; *key_bits receives its size.
+// ec_resolve_key_data: loads key material into the platform; *curve receives the key's.
 // TEE_ERROR_GENERIC: the record is too short. -6: no curve of its size.
-[[nodiscard]] TEE_Result ec_resolve_key_data(byte_view key_material, tee_object* key,
-                                             uint32_t* key_bits, keymaster_error_t* km_error);
-
-// create_ec_sign, create_ec_verify: begin an operation with KM_TAG_DIGEST of `begin_params`. -38:
-// absent or repeated. -13: MD5. -12: no such digest. -1000: the platform refuses the key.
-operation_t* create_ec_sign(byte_view key_material,
-                            const keymaster_key_param_set_t& key_characteristics,
-                            const keymaster_key_param_set_t& begin_params,
-                            keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
-operation_t* create_ec_verify(byte_view key_material,
-                              const keymaster_key_param_set_t& key_characteristics,
-                              const keymaster_key_param_set_t& begin_params,
-                              keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
+outcome ec_resolve_key_data(byte_view key_material, tee_object* key, const ec_curve_t** curve);
 
 }  // namespace keymaster

@@ -7,17 +7,18 @@
 #include "ta/alg/key_record.h"
 #include "ta/alg/key_size.h"
 #include "ta/alg/provenance.h"
+#include "ta/der/oids.h"
 
 namespace keymaster {
 namespace {
 
 // A curve of 192 bits can be worked on, though no key of that size can be made: intended.
 constexpr ec_curve_t CURVES[] = {
-    {192, TEE_ECC_CURVE_NIST_P192, TEE_ALG_ECDSA_P192, NO_EC_CURVE},
-    {224, TEE_ECC_CURVE_NIST_P224, TEE_ALG_ECDSA_P224, KM_EC_CURVE_P_224},
-    {256, TEE_ECC_CURVE_NIST_P256, TEE_ALG_ECDSA_P256, KM_EC_CURVE_P_256},
-    {384, TEE_ECC_CURVE_NIST_P384, TEE_ALG_ECDSA_P384, KM_EC_CURVE_P_384},
-    {521, TEE_ECC_CURVE_NIST_P521, TEE_ALG_ECDSA_P521, KM_EC_CURVE_P_521},
+    {192, TEE_ECC_CURVE_NIST_P192, TEE_ALG_ECDSA_P192, 0, nullptr},
+    {224, TEE_ECC_CURVE_NIST_P224, TEE_ALG_ECDSA_P224, KM_EC_CURVE_P_224, &OID_P_224},
+    {256, TEE_ECC_CURVE_NIST_P256, TEE_ALG_ECDSA_P256, KM_EC_CURVE_P_256, &OID_P_256},
+    {384, TEE_ECC_CURVE_NIST_P384, TEE_ALG_ECDSA_P384, KM_EC_CURVE_P_384, &OID_P_384},
+    {521, TEE_ECC_CURVE_NIST_P521, TEE_ALG_ECDSA_P521, KM_EC_CURVE_P_521, &OID_P_521},
 };
 
 // The numbers of a record, in order.
@@ -26,43 +27,17 @@ constexpr uint32_t NUMBERS[] = {TEE_ATTR_ECC_PUBLIC_VALUE_X, TEE_ATTR_ECC_PUBLIC
 constexpr size_t NUMBER_COUNT = std::size(NUMBERS);
 constexpr size_t PUBLIC_NUMBER_COUNT = 2;
 
-// The curve for a new key of this size.
-keymaster_error_t choose_curve(uint32_t key_bits, const ec_curve_t** curve) {
+// The curve for a new key of this size, and the tags that the TA itself adds. They come after the
+// check of the key size, unlike in the other algorithms: intended.
+keymaster_error_t complete(keymaster_key_param_set_t* description, uint32_t key_bits,
+                           uint32_t origin, const ec_curve_t** curve) {
   *curve = find_ec_curve(key_bits);
-  if (*curve != nullptr && (*curve)->km_curve != NO_EC_CURVE) return KM_ERROR_OK;
-  trace_error("Invalid EC key size %d", static_cast<int>(key_bits));
-  return KM_ERROR_UNSUPPORTED_KEY_SIZE;
-}
-
-// The tags that the TA itself adds. They come after the check of the key size, unlike in the other
-// algorithms: intended.
-keymaster_error_t add_own_tags(keymaster_key_param_set_t* description, uint32_t origin,
-                               const ec_curve_t& curve) {
-  if (auto error = add_provenance(description, origin, creation_time::ADDED)) return error;
-  if (contains_tag(*description, KM_TAG_EC_CURVE)) {
-    trace_error("Shouldn't specify KM_TAG_EC_CURVE");
-    return KM_ERROR_INVALID_ARGUMENT;
+  if (*curve == nullptr || (*curve)->name == nullptr) {
+    return refuse(KM_ERROR_UNSUPPORTED_KEY_SIZE, "Invalid EC key size %d",
+                  static_cast<int>(key_bits));
   }
-  if (!add_integer(description, KM_TAG_EC_CURVE, curve.km_curve)) {
-    trace_error("Out of memory");
-    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  }
-  return KM_ERROR_OK;
-}
-
-keymaster_error_t check_generate(keymaster_key_param_set_t* description, const ec_curve_t** curve) {
-  uint32_t key_bits = 0;
-  if (auto error = required_key_bits(*description, &key_bits)) return error;
-  if (auto error = choose_curve(key_bits, curve)) return error;
-  return add_own_tags(description, KM_ORIGIN_GENERATED, **curve);
-}
-
-keymaster_error_t check_import(keymaster_key_param_set_t* description, uint32_t guessed_bits) {
-  uint32_t key_bits = 0;
-  const ec_curve_t* curve = nullptr;
-  if (auto error = settle_key_bits(description, guessed_bits, &key_bits)) return error;
-  if (auto error = choose_curve(key_bits, &curve)) return error;
-  return add_own_tags(description, KM_ORIGIN_IMPORTED, *curve);
+  TRY(add_provenance(description, origin));
+  return add_own_tag(description, KM_TAG_EC_CURVE, "KM_TAG_EC_CURVE", (*curve)->km_curve);
 }
 
 // Reads a record's size field and as many of its numbers as asked for.
@@ -77,64 +52,61 @@ const ec_curve_t* find_ec_curve(uint32_t key_bits) {
   return curve == std::end(CURVES) ? nullptr : curve;
 }
 
-TEE_Result ec_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material,
-                           keymaster_error_t* km_error) {
+outcome ec_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material) {
   const trace_scope scope;
+  uint32_t key_bits = 0;
   const ec_curve_t* curve = nullptr;
-  *km_error = check_generate(description, &curve);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
-  return generate_key_record(TEE_TYPE_ECDSA_KEYPAIR, curve->key_bits,
-                             value_attribute(TEE_ATTR_ECC_CURVE, curve->tee_curve), NUMBERS,
-                             curve->size() + 1, key_material, km_error);
+  TRY(required_key_bits(*description, &key_bits));
+  TRY(complete(description, key_bits, KM_ORIGIN_GENERATED, &curve));
+  return generate_key_record({TEE_TYPE_ECDSA_KEYPAIR, key_bits, NUMBERS, curve->size() + 1},
+                             value_attribute(TEE_ATTR_ECC_CURVE, curve->tee_curve), key_material);
 }
 
-TEE_Result ec_import_key(keymaster_key_param_set_t* description, byte_view key_data,
-                         heap_buffer* key_material, keymaster_error_t* km_error) {
+outcome ec_import_key(keymaster_key_param_set_t* description, byte_view key_data,
+                      heap_buffer* key_material) {
   const trace_scope scope;
   input_cursor in(key_data);
   uint32_t key_bits = 0;
+  const ec_curve_t* curve = nullptr;
   byte_view numbers[NUMBER_COUNT];
-  if (!read_record(&in, &key_bits, numbers)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
-  *km_error = check_import(description, key_bits);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
-  heap_buffer record;
-  if (!record.copy_of(key_data.first(key_data.size() - in.left()))) {
-    return KM_FAIL(km_error, KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
+  if (!read_record(&in, &key_bits, numbers)) return fail(TEE_ERROR_GENERIC, "Too short input");
+  TRY(settle_key_bits(description, key_bits, &key_bits));
+  TRY(complete(description, key_bits, KM_ORIGIN_IMPORTED, &curve));
+  if (!key_material->copy_of(key_data.first(key_data.size() - in.left()))) {
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
-  *key_material = std::move(record);
-  return TEE_SUCCESS;
+  return DONE;
 }
 
-TEE_Result ec_export_key(byte_view key_material, byte_span output, size_t* produced,
-                         keymaster_error_t*) {
+outcome ec_export_key(byte_view key_material, byte_span output, size_t* produced) {
   const trace_scope scope;
   *produced = 0;
   input_cursor in(key_material);
   uint32_t key_bits = 0;
   byte_view point[PUBLIC_NUMBER_COUNT];
-  if (!read_record(&in, &key_bits, point)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
+  if (!read_record(&in, &key_bits, point)) return fail(TEE_ERROR_GENERIC, "Too short input");
   output_cursor out(output);
   if (!out.write_u32(key_bits) || !out.write_field(point[0]) || !out.write_field(point[1])) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Too short buffer");
+    return fail(TEE_ERROR_GENERIC, "Too short buffer");
   }
   *produced = out.written();
-  return TEE_SUCCESS;
+  return DONE;
 }
 
-TEE_Result ec_resolve_key_data(byte_view key_material, tee_object* key, uint32_t* key_bits,
-                               keymaster_error_t* km_error) {
+outcome ec_resolve_key_data(byte_view key_material, tee_object* key, const ec_curve_t** curve) {
   const trace_scope scope;
+  uint32_t key_bits = 0;
   TEE_Attribute attributes[NUMBER_COUNT + 1];
-  if (!read_attributes(key_material, NUMBERS, key_bits, attributes)) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
+  if (!read_attributes(key_material, NUMBERS, &key_bits, attributes)) {
+    return fail(TEE_ERROR_GENERIC, "Too short input");
   }
-  const ec_curve_t* curve = find_ec_curve(*key_bits);
-  if (curve == nullptr) {
-    return KM_FAIL(km_error, KM_ERROR_UNSUPPORTED_KEY_SIZE, "Unsupported key size %d",
-                   static_cast<int>(*key_bits));
+  *curve = find_ec_curve(key_bits);
+  if (*curve == nullptr) {
+    return refuse(KM_ERROR_UNSUPPORTED_KEY_SIZE, "Unsupported key size %d",
+                  static_cast<int>(key_bits));
   }
-  attributes[NUMBER_COUNT] = value_attribute(TEE_ATTR_ECC_CURVE, curve->tee_curve);
-  return load_key(TEE_TYPE_ECDSA_KEYPAIR, *key_bits, attributes, key);
+  attributes[NUMBER_COUNT] = value_attribute(TEE_ATTR_ECC_CURVE, (*curve)->tee_curve);
+  return load_key(TEE_TYPE_ECDSA_KEYPAIR, key_bits, attributes, key);
 }
 
 }  // namespace keymaster

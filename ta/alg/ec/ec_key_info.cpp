@@ -2,28 +2,12 @@
 #include "ta/alg/big_endian.h"
 #include "ta/alg/ec/ec.h"
 #include "ta/alg/key_record.h"
-#include "ta/der/oids.h"
 #include "ta/der/x509.h"
 
 namespace keymaster {
 namespace {
 
 constexpr uint8_t UNCOMPRESSED = 0x04;
-
-const ASN1_OID* curve_oid(uint32_t key_bits) {
-  switch (key_bits) {
-    case 224:
-      return &OID_P_224;
-    case 256:
-      return &OID_P_256;
-    case 384:
-      return &OID_P_384;
-    case 521:
-      return &OID_P_521;
-    default:
-      return nullptr;
-  }
-}
 
 // Right-aligns a number in `room`, which is zero. False when it does not fit.
 bool put_coordinate(byte_view number, byte_span room) {
@@ -35,33 +19,32 @@ bool put_coordinate(byte_view number, byte_span room) {
 
 }  // namespace
 
-TEE_Result ec_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key,
-                           keymaster_error_t* km_error) {
+outcome ec_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key) {
   const trace_scope scope;
   input_cursor in(key_material);
   uint32_t key_bits = 0;
   byte_view coordinates[2];
   if (!in.read_u32(&key_bits) || !read_numbers(&in, coordinates)) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
+    return fail(TEE_ERROR_GENERIC, "Too short input");
   }
-  const ASN1_OID* curve = curve_oid(key_bits);
-  if (curve == nullptr) return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "Unknown curve");
-  const size_t size = (size_t{key_bits} + 7) / 8;
+  const ec_curve_t* curve = find_ec_curve(key_bits);
+  if (curve == nullptr || curve->name == nullptr) {
+    return refuse(KM_ERROR_UNKNOWN_ERROR, "Unknown curve");
+  }
+  const size_t size = curve->size();
   heap_buffer point;
   if (!point.allocate(1 + 2 * size)) {
-    return KM_FAIL(km_error, KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
   point.span()[0] = UNCOMPRESSED;
   if (!put_coordinate(coordinates[0], point.span().subspan(1, size)) ||
       !put_coordinate(coordinates[1], point.span().subspan(1 + size, size))) {
-    return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "Coordinate longer than its curve");
+    return refuse(KM_ERROR_UNKNOWN_ERROR, "Coordinate longer than its curve");
   }
-  X509_ALGOR_set_ec(&subject_public_key->algorithm, curve);
-  if (ASN1_BIT_STRING_set(&subject_public_key->key, point.size() * uint64_t{8}, point.view()) !=
-      0) {
-    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  }
-  return TEE_SUCCESS;
+  X509_ALGOR_set_ec(&subject_public_key->algorithm, curve->name);
+  const int32_t set =
+      ASN1_BIT_STRING_set(&subject_public_key->key, point.size() * uint64_t{8}, point.view());
+  return set == 0 ? KM_ERROR_OK : KM_ERROR_MEMORY_ALLOCATION_FAILED;
 }
 
 }  // namespace keymaster

@@ -30,69 +30,42 @@ struct ec_verify_operation_t : ec_operation_t {
   static constexpr char TYPE_NAME[] = "ec_verify_operation_t";
 };
 
-TEE_Result load(ec_operation_t* operation, byte_view key_material, keymaster_error_t* km_error) {
-  uint32_t key_bits = 0;
-  const TEE_Result res = ec_resolve_key_data(key_material, &operation->key, &key_bits, km_error);
-  if (failed(res, *km_error)) {
-    trace_error("Resolve key data failed");
-    return res;
-  }
-  operation->curve = find_ec_curve(key_bits);
-  return TEE_SUCCESS;
-}
-
-keymaster_error_t read_digest(const keymaster_key_param_set_t& begin_params, uint32_t* digest) {
-  if (!requested_digest(begin_params, digest)) {
-    trace_error("No or too many KM_TAG_DIGEST");
-    return KM_ERROR_INVALID_ARGUMENT;
+keymaster_error_t read_digest(const keymaster_key_param_set_t& params, uint32_t* digest) {
+  if (!requested_digest(params, digest)) {
+    return refuse(KM_ERROR_INVALID_ARGUMENT, "No or too many KM_TAG_DIGEST");
   }
   if (*digest == KM_DIGEST_MD5) return KM_ERROR_INCOMPATIBLE_DIGEST;
   return *digest > KM_DIGEST_SHA_2_512 ? KM_ERROR_UNSUPPORTED_DIGEST : KM_ERROR_OK;
 }
 
-// The room for a digest, or for as many bytes of data as the curve takes.
-TEE_Result prepare_message(ec_operation_t* operation, const keymaster_key_param_set_t& begin_params,
-                           keymaster_error_t* km_error) {
+// Everything of create that can fail after the record is there. The message has room for a digest,
+// or for as many bytes of data as the curve takes.
+outcome prepare(ec_operation_t* operation, uint32_t tee_mode, const begin_request& request) {
   message_t& message = operation->message;
-  *km_error = read_digest(begin_params, &message.digest);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
-  const bool hashes = message.digest != KM_DIGEST_NONE;
-  if (hashes) {
-    if (TEE_Result res = message.start_hash()) return res;
+  const outcome loaded =
+      ec_resolve_key_data(request.key_material, &operation->key, &operation->curve);
+  if (failed(loaded)) {
+    trace(TEE_TRACE_ERROR, "Resolve key data failed");
+    return loaded;
   }
-  if (!message.buffer.allocate(hashes ? MAX_DIGEST_SIZE : operation->curve->size())) {
-    trace_error("Out of memory");
-    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  }
-  return TEE_SUCCESS;
-}
-
-// Everything of create that can fail after the record is there.
-TEE_Result prepare(ec_operation_t* operation, uint32_t tee_mode, byte_view key_material,
-                   const keymaster_key_param_set_t& begin_params, keymaster_error_t* km_error) {
-  TEE_Result res = load(operation, key_material, km_error);
-  if (failed(res, *km_error)) return res;
-  res = prepare_message(operation, begin_params, km_error);
-  if (failed(res, *km_error)) return res;
   const ec_curve_t& curve = *operation->curve;
-  res = operation->main.allocate(curve.tee_algorithm, tee_mode, curve.key_bits);
-  if (res != TEE_SUCCESS) return res;
+  TRY(read_digest(request.params, &message.digest));
+  const bool hashes = message.digest != KM_DIGEST_NONE;
+  if (hashes) TRY(message.start_hash());
+  if (!message.buffer.allocate(hashes ? MAX_DIGEST_SIZE : curve.size())) {
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
+  }
+  TRY(operation->main.allocate(curve.tee_algorithm, tee_mode, curve.key_bits));
   return operation->main.set_key(operation->key.get());
 }
 
-// Data that is not hashed is cut to the curve's bytes, intended: *consumed tells what was taken.
-TEE_Result ec_update(operation_t* operation, const keymaster_key_param_set_t&, byte_view input,
-                     size_t* consumed, byte_span, size_t* produced, keymaster_error_t*) {
+// Data that is not hashed is cut to the curve's bytes, intended: `consumed` tells what was taken.
+outcome ec_update(operation_t* operation, update_step* step) {
   message_t& message = static_cast<ec_operation_t*>(operation)->message;
-  *produced = 0;
-  if (message.is_hashed()) {
-    TEE_DigestUpdate(message.hash.get(), input.data(), static_cast<tee_size>(input.size()));
-  } else {
-    input = input.first(std::min(input.size(), message.room()));
-    message.append(input);
-  }
-  *consumed = input.size();
-  return TEE_SUCCESS;
+  const size_t room = message.is_hashed() ? step->input.size() : message.room();
+  step->consumed = std::min(step->input.size(), room);
+  message.append(step->input.first(step->consumed));
+  return DONE;
 }
 
 void shift_right(byte_span number, unsigned bits) {
@@ -107,9 +80,7 @@ void shift_right(byte_span number, unsigned bits) {
 TEE_Result represent(ec_operation_t* operation) {
   message_t& message = operation->message;
   const ec_curve_t& curve = *operation->curve;
-  if (message.is_hashed()) {
-    if (TEE_Result res = message.finish_hash()) return res;
-  }
+  if (message.is_hashed()) TRY(message.finish_hash());
   message.length = std::min(message.length, curve.size());
   if (message.length * 8 > curve.key_bits) {
     shift_right(message.buffer.span().first(message.length), 8 - curve.key_bits % 8);
@@ -128,51 +99,61 @@ void ec_verify_free(operation_t* operation) {
 }
 
 // The data of finish is intentionally not part of what is signed: all data comes through update.
-TEE_Result ec_sign_finish(operation_t* operation, const keymaster_key_param_set_t&, byte_view,
-                          heap_buffer* output, keymaster_key_param_set_t*,
-                          keymaster_error_t* km_error) {
+outcome ec_sign_finish(operation_t* operation, finish_step* step) {
   const trace_scope scope;
   auto* record = static_cast<ec_sign_operation_t*>(operation);
-  if (TEE_Result res = represent(record)) return res;
+  TRY(represent(record));
   heap_buffer raw;
   if (!raw.allocate(2 * record->curve->size())) {
-    return KM_FAIL(km_error, KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
-  if (TEE_Result res = sign_digest(record->main, {}, record->message.data(), &raw)) return res;
+  TRY(sign_digest(record->main, {}, record->message.data(), &raw));
   const byte_view r = raw.view().first(raw.size() / 2);
   const byte_view s = raw.view().subspan(r.size());
-  if (der_encode_ec_signature(r, s, output) != TEE_SUCCESS) {
-    return KM_FAIL(km_error, KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
+  if (der_encode_ec_signature(r, s, &step->output) != TEE_SUCCESS) {
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
-  return TEE_SUCCESS;
+  return DONE;
 }
 
 // Decodes the client's signature, from a copy since decoding reads it more than once, into r || s.
 keymaster_error_t decode(byte_view signature, heap_buffer* raw, const ec_curve_t& curve) {
   heap_buffer der;
   if (!der.copy_of(signature) || !raw->allocate(2 * curve.size())) {
-    trace_error("Out of memory");
-    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
   const byte_span r = raw->span().first(curve.size());
   const byte_span s = raw->span().subspan(curve.size());
   if (TEE_Result res = der_decode_ec_signature(der.view(), r, s)) {
-    trace_error("Decode signature failed, 0x%08x", res);
-    return KM_ERROR_VERIFICATION_FAILED;
+    return refuse(KM_ERROR_VERIFICATION_FAILED, "Decode signature failed, 0x%08x", res);
   }
   return KM_ERROR_OK;
 }
 
-TEE_Result ec_verify_finish(operation_t* operation, const keymaster_key_param_set_t&,
-                            byte_view signature, heap_buffer*, keymaster_key_param_set_t*,
-                            keymaster_error_t* km_error) {
+outcome ec_verify_finish(operation_t* operation, finish_step* step) {
   const trace_scope scope;
   auto* record = static_cast<ec_verify_operation_t*>(operation);
-  if (TEE_Result res = represent(record)) return res;
+  TRY(represent(record));
   heap_buffer raw;
-  *km_error = decode(signature, &raw, *record->curve);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
-  return verify_digest(record->main, {}, record->message.data(), raw.view(), km_error);
+  TRY(decode(step->input, &raw, *record->curve));
+  return verify_digest(record->main, {}, record->message.data(), raw.view());
+}
+
+// create_ec_sign, create_ec_verify: begin an operation with KM_TAG_DIGEST of the request's
+// parameters. -38: absent or repeated. -13: MD5. -12: no such digest. -1000: the platform refuses
+// the key.
+keymaster_error_t create_ec_sign(const begin_request& request, operation_t** operation) {
+  const trace_scope scope;
+  return create_operation_object<ec_sign_operation_t>(
+      {ec_sign_free, ec_update, ec_sign_finish}, operation,
+      [&](ec_operation_t* record) { return prepare(record, TEE_MODE_SIGN, request); });
+}
+
+keymaster_error_t create_ec_verify(const begin_request& request, operation_t** operation) {
+  const trace_scope scope;
+  return create_operation_object<ec_verify_operation_t>(
+      {ec_verify_free, ec_update, ec_verify_finish}, operation,
+      [&](ec_operation_t* record) { return prepare(record, TEE_MODE_VERIFY, request); });
 }
 
 constexpr operation_methods_t EC_SIGN_METHODS = {
@@ -190,38 +171,11 @@ constexpr operation_methods_t EC_VERIFY_METHODS = {
 };
 
 const operation_methods_t* ec_get_operation_methods(uint32_t purpose) {
-  switch (purpose) {
-    case KM_PURPOSE_SIGN:
-      return &EC_SIGN_METHODS;
-    case KM_PURPOSE_VERIFY:
-      return &EC_VERIFY_METHODS;
-    default:
-      return nullptr;
-  }
+  if (purpose == KM_PURPOSE_SIGN) return &EC_SIGN_METHODS;
+  return purpose == KM_PURPOSE_VERIFY ? &EC_VERIFY_METHODS : nullptr;
 }
 
 }  // namespace
-
-operation_t* create_ec_sign(byte_view key_material, const keymaster_key_param_set_t&,
-                            const keymaster_key_param_set_t& begin_params,
-                            keymaster_key_param_set_t*, keymaster_error_t* km_error) {
-  const trace_scope scope;
-  return create_operation_object<ec_sign_operation_t>(
-      {ec_sign_free, ec_update, ec_sign_finish}, km_error, [&](ec_sign_operation_t* operation) {
-        return prepare(operation, TEE_MODE_SIGN, key_material, begin_params, km_error);
-      });
-}
-
-operation_t* create_ec_verify(byte_view key_material, const keymaster_key_param_set_t&,
-                              const keymaster_key_param_set_t& begin_params,
-                              keymaster_key_param_set_t*, keymaster_error_t* km_error) {
-  const trace_scope scope;
-  return create_operation_object<ec_verify_operation_t>(
-      {ec_verify_free, ec_update, ec_verify_finish}, km_error,
-      [&](ec_verify_operation_t* operation) {
-        return prepare(operation, TEE_MODE_VERIFY, key_material, begin_params, km_error);
-      });
-}
 
 const algorithm_t EC_ALGORITHM = {
     .algorithm = KM_ALGORITHM_EC,

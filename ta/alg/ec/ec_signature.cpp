@@ -4,7 +4,7 @@
 #include <algorithm>
 
 #include "ta/alg/big_endian.h"
-#include "ta/base/results.h"
+#include "ta/base/outcome.h"
 
 namespace keymaster {
 namespace {
@@ -71,55 +71,41 @@ bool decode_length(input_cursor* in, uint32_t* length) {
   return true;
 }
 
-bool read_header(input_cursor* in, uint8_t tag, uint32_t* length) {
+TEE_Result read_header(input_cursor* in, uint8_t tag, uint32_t* length) {
   uint8_t found = 0;
   const bool is_there = read_byte(in, &found);
   if (!is_there || found != tag) {
-    trace_error("Wrong tag, expect 0x%02x, got 0x%02x", tag, found);
-    return false;
+    return fail(TEE_ERROR_GENERIC, "Wrong tag, expect 0x%02x, got 0x%02x", tag, found);
   }
-  if (!decode_length(in, length)) {
-    trace_error("Decode length failed");
-    return false;
-  }
-  return true;
+  return decode_length(in, length) ? TEE_SUCCESS : fail(TEE_ERROR_GENERIC, "Decode length failed");
 }
 
 // Reads one INTEGER into `number`, right-aligned; `name` is R or S.
-bool read_integer(input_cursor* in, byte_span number, char name) {
+TEE_Result read_integer(input_cursor* in, byte_span number, char name) {
   uint32_t length = 0;
-  if (!read_header(in, TAG_INTEGER, &length)) return false;
-  const size_t available = in->left();
+  TRY(read_header(in, TAG_INTEGER, &length));
   byte_view content;
   if (!in->read_bytes(length, &content)) {
-    trace_error("Wrong length of integer, %dB available, got %dB", static_cast<int>(available),
-                static_cast<int>(length));
-    return false;
+    return fail(TEE_ERROR_GENERIC, "Wrong length of integer, %dB available, got %dB",
+                static_cast<int>(in->left()), static_cast<int>(length));
   }
   if (!content.empty() && content.front() == 0) content = content.subspan(1);
   if (content.size() > number.size()) {
-    trace_error("Wrong length of %c, expect max %dB, got %dB", name,
+    return fail(TEE_ERROR_GENERIC, "Wrong length of %c, expect max %dB, got %dB", name,
                 static_cast<int>(number.size()), static_cast<int>(content.size()));
-    return false;
   }
   copy_bytes(number, content);
   right_align(number, content.size());
-  return true;
+  return TEE_SUCCESS;
 }
 
 // Only the encoder's own form is accepted: no trailing bytes, no longer forms than need be.
 TEE_Result check_canonical(byte_view der, byte_view r, byte_view s) {
   heap_buffer encoded;
-  if (TEE_Result res = der_encode_ec_signature(r, s, &encoded)) return res;
-  if (encoded.size() != der.size()) {
-    trace_error("Encoding size mismatch");
-    return TEE_ERROR_GENERIC;
-  }
-  if (!std::ranges::equal(encoded.view(), der)) {
-    trace_error("Encoding mismatch");
-    return TEE_ERROR_GENERIC;
-  }
-  return TEE_SUCCESS;
+  TRY(der_encode_ec_signature(r, s, &encoded));
+  if (encoded.size() != der.size()) return fail(TEE_ERROR_GENERIC, "Encoding size mismatch");
+  const bool is_same = std::ranges::equal(encoded.view(), der);
+  return is_same ? TEE_SUCCESS : fail(TEE_ERROR_GENERIC, "Encoding mismatch");
 }
 
 }  // namespace
@@ -143,13 +129,13 @@ TEE_Result der_encode_ec_signature(byte_view r, byte_view s, heap_buffer* signat
   const uint32_t content = encoded_size(first.content()) + encoded_size(second.content());
   heap_buffer encoded;
   if (!encoded.allocate(encoded_size(content))) {
-    return TEE_FAIL(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
+    return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   }
   output_cursor out(encoded.span());
   const bool written = write_byte(&out, TAG_SEQUENCE) && encode_length(&out, content) &&
                        first.write(&out) && second.write(&out);
   if (!written || out.left() != 0) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Unfilled buffer, size calculation error");
+    return fail(TEE_ERROR_GENERIC, "Unfilled buffer, size calculation error");
   }
   *signature = std::move(encoded);
   return TEE_SUCCESS;
@@ -157,16 +143,17 @@ TEE_Result der_encode_ec_signature(byte_view r, byte_view s, heap_buffer* signat
 
 TEE_Result der_decode_ec_signature(byte_view der, byte_span r, byte_span s) {
   const trace_scope scope;
-  if (der.size() < 2) return TEE_FAIL(TEE_ERROR_GENERIC, "Wrong der length\n");
+  if (der.size() < 2) return fail(TEE_ERROR_GENERIC, "Wrong der length");
   input_cursor in(der);
   uint32_t content = 0;
-  if (!read_header(&in, TAG_SEQUENCE, &content)) return TEE_ERROR_GENERIC;
+  TRY(read_header(&in, TAG_SEQUENCE, &content));
   if (content != in.left()) {
     const uint64_t expected = uint64_t{der.size() - in.left()} + content;
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Wrong length of sequence, expect %dB, got %dB",
-                    static_cast<int>(expected), static_cast<int>(der.size()));
+    return fail(TEE_ERROR_GENERIC, "Wrong length of sequence, expect %dB, got %dB",
+                static_cast<int>(expected), static_cast<int>(der.size()));
   }
-  if (!read_integer(&in, r, 'R') || !read_integer(&in, s, 'S')) return TEE_ERROR_GENERIC;
+  TRY(read_integer(&in, r, 'R'));
+  TRY(read_integer(&in, s, 'S'));
   return check_canonical(der, r, s);
 }
 

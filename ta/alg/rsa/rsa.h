@@ -16,20 +16,16 @@ extern const algorithm_t RSA_ALGORITHM;
 // public exponent given are not those of the data. TEE_ERROR_GENERIC: the data is too short; what
 // follows the eighth number is ignored. Import takes the numbers as they are: a key that is none is
 // refused when it is used.
-TEE_Result rsa_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material,
-                            keymaster_error_t* km_error);
-TEE_Result rsa_import_key(keymaster_key_param_set_t* description, byte_view key_data,
-                          heap_buffer* key_material, keymaster_error_t* km_error);
+outcome rsa_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material);
+outcome rsa_import_key(keymaster_key_param_set_t* description, byte_view key_data,
+                       heap_buffer* key_material);
 
-// rsa_export_key: writes the DER SubjectPublicKeyInfo (RFC 5280). Always TEE_SUCCESS: every failure
-// is -1000.
-TEE_Result rsa_export_key(byte_view key_material, byte_span output, size_t* produced,
-                          keymaster_error_t* km_error);
+// rsa_export_key: writes the DER SubjectPublicKeyInfo (RFC 5280). Every failure is -1000.
+outcome rsa_export_key(byte_view key_material, byte_span output, size_t* produced);
 
 // rsa_set_key_info: fills the subject public key of a certificate. TEE_ERROR_GENERIC: the record is
 // too short. -41: out of memory.
-TEE_Result rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key,
-                            keymaster_error_t* km_error);
+outcome rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key);
 
 // rsa_resolve_key_data: loads key material into the platform; *key_bits receives its size.
 // TEE_ERROR_GENERIC: the record is too short.
@@ -40,25 +36,13 @@ TEE_Result rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_
 tee_object resolve_key_from_data(byte_view key_material, uint32_t* key_bits);
 
 // create_rsa_sign ... create_rsa_decrypt: begin an operation with KM_TAG_PADDING and KM_TAG_DIGEST
-// of `begin_params`; encryption and decryption go without the digest unless the padding is OAEP.
-// -38: absent or repeated. -12: no such digest. -10: a padding that the purpose does not offer.
-// -13: the padding does not go with the digest, or PSS does not fit the key. -1000: the platform
-// refuses the key, or a SOTER key's resources are not ready.
-operation_t* create_rsa_sign(byte_view key_material,
-                             const keymaster_key_param_set_t& key_characteristics,
-                             const keymaster_key_param_set_t& begin_params,
-                             keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
-operation_t* create_rsa_verify(byte_view key_material,
-                               const keymaster_key_param_set_t& key_characteristics,
-                               const keymaster_key_param_set_t& begin_params,
-                               keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
-operation_t* create_rsa_encrypt(byte_view key_material,
-                                const keymaster_key_param_set_t& key_characteristics,
-                                const keymaster_key_param_set_t& begin_params,
-                                keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
-operation_t* create_rsa_decrypt(byte_view key_material,
-                                const keymaster_key_param_set_t& key_characteristics,
-                                const keymaster_key_param_set_t& begin_params,
-                                keymaster_key_param_set_t* out_params, keymaster_error_t* km_error);
+// of the request's parameters; encryption and decryption go without the digest unless the padding
+// is OAEP. -38: absent or repeated. -12: no such digest. -10: a padding that the purpose does not
+// offer. -13: the padding does not go with the digest, or PSS does not fit the key. -1000: the
+// platform refuses the key, or a SOTER key's resources are not ready.
+keymaster_error_t create_rsa_sign(const begin_request& request, operation_t** operation);
+keymaster_error_t create_rsa_verify(const begin_request& request, operation_t** operation);
+keymaster_error_t create_rsa_encrypt(const begin_request& request, operation_t** operation);
+keymaster_error_t create_rsa_decrypt(const begin_request& request, operation_t** operation);
 
 }  // namespace keymaster

@@ -27,22 +27,19 @@ constexpr size_t PUBLIC_EXPONENT = 1;
 
 keymaster_error_t check_key_size(uint32_t key_bits) {
   if (key_bits % 8 == 0 && key_bits <= MAX_KEY_BITS) return KM_ERROR_OK;
-  trace_error("Invalid RSA key size %d", static_cast<int>(key_bits));
-  return KM_ERROR_UNSUPPORTED_KEY_SIZE;
+  return refuse(KM_ERROR_UNSUPPORTED_KEY_SIZE, "Invalid RSA key size %d",
+                static_cast<int>(key_bits));
 }
 
 keymaster_error_t check_generate(keymaster_key_param_set_t* description, uint64_t* exponent,
                                  uint32_t* key_bits) {
-  if (auto error = add_provenance(description, KM_ORIGIN_GENERATED, creation_time::ADDED)) {
-    return error;
-  }
+  TRY(add_provenance(description, KM_ORIGIN_GENERATED));
   const auto* given = get_unique(*description, KM_TAG_RSA_PUBLIC_EXPONENT);
   if (given == nullptr) {
-    trace_error("No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified");
-    return KM_ERROR_INVALID_ARGUMENT;
+    return refuse(KM_ERROR_INVALID_ARGUMENT, "No or too many KM_TAG_RSA_PUBLIC_EXPONENT specified");
   }
   *exponent = given->long_integer;
-  if (auto error = required_key_bits(*description, key_bits)) return error;
+  TRY(required_key_bits(*description, key_bits));
   return check_key_size(*key_bits);
 }
 
@@ -59,14 +56,10 @@ keymaster_error_t settle_exponent(keymaster_key_param_set_t* description, byte_v
   const byte_view significant = without_leading_zeros(field);
   const bool fits = given != nullptr ? ends_with(given->long_integer, field)
                                      : significant.size() <= EXPONENT_SIZE;
-  if (!fits) {
-    trace_error("Public exponent mismatch");
-    return KM_ERROR_IMPORT_PARAMETER_MISMATCH;
-  }
+  if (!fits) return refuse(KM_ERROR_IMPORT_PARAMETER_MISMATCH, "Public exponent mismatch");
   if (given == nullptr &&
       !add_long(description, KM_TAG_RSA_PUBLIC_EXPONENT, load_u64_big_endian(significant))) {
-    trace_error("Out of memory");
-    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
   return KM_ERROR_OK;
 }
@@ -74,13 +67,10 @@ keymaster_error_t settle_exponent(keymaster_key_param_set_t* description, byte_v
 // Import neither adds the creation time nor refuses it: intended, the description may carry it.
 keymaster_error_t check_import(keymaster_key_param_set_t* description,
                                std::span<const byte_view> numbers, uint32_t* key_bits) {
-  if (auto error = add_provenance(description, KM_ORIGIN_IMPORTED, creation_time::NOT_ADDED)) {
-    return error;
-  }
+  TRY(add_provenance(description, KM_ORIGIN_IMPORTED, creation_time::NOT_ADDED));
   // The field's length as it stands: a modulus with a leading zero guesses 8 bits more, intended.
-  const uint64_t guessed_bits = uint64_t{numbers[MODULUS].size()} * 8;
-  if (auto error = settle_key_bits(description, guessed_bits, key_bits)) return error;
-  if (auto error = check_key_size(*key_bits)) return error;
+  TRY(settle_key_bits(description, uint64_t{numbers[MODULUS].size()} * 8, key_bits));
+  TRY(check_key_size(*key_bits));
   return settle_exponent(description, numbers[PUBLIC_EXPONENT]);
 }
 
@@ -90,74 +80,56 @@ TEE_Result export_public_key(const tee_object& key, byte_span output, size_t* pr
   TEE_Result res = TEE_AllocateOperation(&handle, TEE_ALG_RSA_NOPAD, TEE_MODE_EXPORT, 0);
   tee_operation operation;
   operation.reset(handle);
-  if (res != TEE_SUCCESS) {
-    trace_error("TEE_AllocateOperation failed: %08x\n", res);
-    return res;
-  }
+  if (res != TEE_SUCCESS) return fail(res, "TEE_AllocateOperation failed: %08x", res);
   res = TEE_SetOperationKey(operation.get(), key.get());
-  if (res != TEE_SUCCESS) {
-    trace_error("TEE_SetOperationKey failed: %08x\n", res);
-    return res;
-  }
+  if (res != TEE_SUCCESS) return fail(res, "TEE_SetOperationKey failed: %08x", res);
   auto size = static_cast<tee_size>(output.size());
   res = TEE_AsymmetricExport(operation.get(), TEE_EXPORT_FORMAT_SPKI, output.data(), &size);
-  if (res != TEE_SUCCESS) {
-    trace_error("TEE_AsymmetricExport failed: %08x\n", res);
-    return res;
-  }
+  if (res != TEE_SUCCESS) return fail(res, "TEE_AsymmetricExport failed: %08x", res);
   *produced = size;
   return TEE_SUCCESS;
 }
 
 }  // namespace
 
-TEE_Result rsa_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material,
-                            keymaster_error_t* km_error) {
+outcome rsa_generate_key(keymaster_key_param_set_t* description, heap_buffer* key_material) {
   const trace_scope scope;
   uint64_t exponent = 0;
   uint32_t key_bits = 0;
-  *km_error = check_generate(description, &exponent, &key_bits);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
+  TRY(check_generate(description, &exponent, &key_bits));
   uint8_t bytes[EXPONENT_SIZE];
   store_u64_big_endian(bytes, exponent);
-  return generate_key_record(TEE_TYPE_RSA_KEYPAIR, key_bits,
-                             ref_attribute(TEE_ATTR_RSA_PUBLIC_EXPONENT, bytes), NUMBERS,
-                             key_bits / 8, key_material, km_error);
+  return generate_key_record({TEE_TYPE_RSA_KEYPAIR, key_bits, NUMBERS, key_bits / 8},
+                             ref_attribute(TEE_ATTR_RSA_PUBLIC_EXPONENT, bytes), key_material);
 }
 
-TEE_Result rsa_import_key(keymaster_key_param_set_t* description, byte_view key_data,
-                          heap_buffer* key_material, keymaster_error_t* km_error) {
+outcome rsa_import_key(keymaster_key_param_set_t* description, byte_view key_data,
+                       heap_buffer* key_material) {
   const trace_scope scope;
   input_cursor in(key_data);
   byte_view numbers[std::size(NUMBERS)];
-  if (!read_numbers(&in, numbers)) return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
+  if (!read_numbers(&in, numbers)) return fail(TEE_ERROR_GENERIC, "Too short input");
   uint32_t key_bits = 0;
-  *km_error = check_import(description, numbers, &key_bits);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
+  TRY(check_import(description, numbers, &key_bits));
   const byte_view consumed = key_data.first(key_data.size() - in.left());
   heap_buffer record;
   if (!record.allocate(sizeof(uint32_t) + consumed.size())) {
-    return KM_FAIL(km_error, KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
   store_u32(record.span(), key_bits);
   copy_bytes(record.span().subspan(sizeof(uint32_t)), consumed);
   *key_material = std::move(record);
-  return TEE_SUCCESS;
+  return DONE;
 }
 
-TEE_Result rsa_export_key(byte_view key_material, byte_span output, size_t* produced,
-                          keymaster_error_t* km_error) {
+outcome rsa_export_key(byte_view key_material, byte_span output, size_t* produced) {
   const trace_scope scope;
   *produced = 0;
   uint32_t key_bits = 0;
   const tee_object key = resolve_key_from_data(key_material, &key_bits);
-  if (!key) {
-    return KM_FAIL(km_error, KM_ERROR_UNKNOWN_ERROR, "resolve key from data stream error\n");
-  }
-  if (export_public_key(key, output, produced) != TEE_SUCCESS) {
-    *km_error = KM_ERROR_UNKNOWN_ERROR;
-  }
-  return TEE_SUCCESS;
+  if (!key) return refuse(KM_ERROR_UNKNOWN_ERROR, "resolve key from data stream error");
+  const TEE_Result exported = export_public_key(key, output, produced);
+  return exported == TEE_SUCCESS ? KM_ERROR_OK : KM_ERROR_UNKNOWN_ERROR;
 }
 
 TEE_Result rsa_resolve_key_data(byte_view key_material, tee_object* key, uint32_t* key_bits) {
@@ -171,7 +143,7 @@ tee_object resolve_key_from_data(byte_view key_material, uint32_t* key_bits) {
   const trace_scope scope;
   tee_object key;
   if (rsa_resolve_key_data(key_material, &key, key_bits) != TEE_SUCCESS) {
-    TRACE_ERROR("Resolve key data failed");
+    trace(TEE_TRACE_ERROR, "Resolve key data failed");
   }
   return key;
 }

@@ -22,24 +22,20 @@ keymaster_error_t encode_key(byte_view modulus, byte_view exponent, heap_buffer*
 
 }  // namespace
 
-TEE_Result rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key,
-                            keymaster_error_t* km_error) {
+outcome rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key) {
   const trace_scope scope;
   input_cursor in(key_material);
   uint32_t key_bits = 0;
   byte_view numbers[2];
   if (!in.read_u32(&key_bits) || !read_numbers(&in, numbers)) {
-    return TEE_FAIL(TEE_ERROR_GENERIC, "Too short input");
+    return fail(TEE_ERROR_GENERIC, "Too short input");
   }
   heap_buffer encoding;
-  *km_error = encode_key(numbers[0], numbers[1], &encoding);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
+  TRY(encode_key(numbers[0], numbers[1], &encoding));
   X509_ALGOR_set_rsa(&subject_public_key->algorithm, &OID_RSA_ENCRYPTION);
-  if (ASN1_BIT_STRING_set(&subject_public_key->key, encoding.size() * uint64_t{8},
-                          encoding.view()) != 0) {
-    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  }
-  return TEE_SUCCESS;
+  const int32_t set =
+      ASN1_BIT_STRING_set(&subject_public_key->key, encoding.size() * uint64_t{8}, encoding.view());
+  return set == 0 ? KM_ERROR_OK : KM_ERROR_MEMORY_ALLOCATION_FAILED;
 }
 
 }  // namespace keymaster

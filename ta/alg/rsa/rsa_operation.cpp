@@ -38,25 +38,21 @@ constexpr rsa_choice_t ENCRYPTION_CHOICES[] = {
 
 keymaster_error_t load(rsa_operation_t* operation, byte_view key_material) {
   if (rsa_resolve_key_data(key_material, &operation->key, &operation->key_bits) != TEE_SUCCESS) {
-    trace_error("Resolve key data failed");
-    return KM_ERROR_UNKNOWN_ERROR;
+    return refuse(KM_ERROR_UNKNOWN_ERROR, "Resolve key data failed");
   }
   if (!operation->message.buffer.allocate(operation->key_bits / 8)) {
-    trace_error("Out of memory");
-    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
   return KM_ERROR_OK;
 }
 
 keymaster_error_t read_request(rsa_operation_t* operation, bool is_signature,
-                               const keymaster_key_param_set_t& begin_params) {
-  if (!requested_padding(begin_params, &operation->padding)) {
-    trace_error("No or too many KM_TAG_PADDING");
-    return KM_ERROR_INVALID_ARGUMENT;
+                               const keymaster_key_param_set_t& params) {
+  if (!requested_padding(params, &operation->padding)) {
+    return refuse(KM_ERROR_INVALID_ARGUMENT, "No or too many KM_TAG_PADDING");
   }
-  if (!requested_digest(begin_params, &operation->message.digest) && is_signature) {
-    trace_error("No or too many KM_TAG_DIGEST");
-    return KM_ERROR_INVALID_ARGUMENT;
+  if (!requested_digest(params, &operation->message.digest) && is_signature) {
+    return refuse(KM_ERROR_INVALID_ARGUMENT, "No or too many KM_TAG_DIGEST");
   }
   return KM_ERROR_OK;
 }
@@ -75,20 +71,9 @@ keymaster_error_t check_pss_fits(const rsa_operation_t& operation) {
   if (operation.padding != KM_PAD_RSA_PSS) return KM_ERROR_OK;
   const size_t needed = find_digest(operation.message.digest)->size + PSS_OVERHEAD;
   if (needed <= operation.key_size()) return KM_ERROR_OK;
-  trace_error("Too short key to fit digest, flag and salt, key_size %d, need %d",
-              static_cast<int>(operation.key_bits), static_cast<int>(needed * 8));
-  return KM_ERROR_INCOMPATIBLE_DIGEST;
-}
-
-// Everything of create that needs no operation of the platform.
-keymaster_error_t settle_request(rsa_operation_t* operation, const rsa_purpose_t& purpose,
-                                 byte_view key_material,
-                                 const keymaster_key_param_set_t& begin_params,
-                                 uint32_t* algorithm) {
-  if (auto error = load(operation, key_material)) return error;
-  if (auto error = read_request(operation, purpose.is_signature, begin_params)) return error;
-  if (auto error = choose(*operation, purpose.choices, algorithm)) return error;
-  return check_pss_fits(*operation);
+  return refuse(KM_ERROR_INCOMPATIBLE_DIGEST,
+                "Too short key to fit digest, flag and salt, key_size %d, need %d",
+                static_cast<int>(operation.key_bits), static_cast<int>(needed * 8));
 }
 
 // The digest that signing and verification will use, for its authorisation.
@@ -156,48 +141,31 @@ const rsa_purpose_t RSA_VERIFY = {SIGNATURE_CHOICES, true, TEE_MODE_VERIFY, TEE_
 const rsa_purpose_t RSA_ENCRYPT = {ENCRYPTION_CHOICES, false, TEE_MODE_ENCRYPT, TEE_MODE_ENCRYPT};
 const rsa_purpose_t RSA_DECRYPT = {ENCRYPTION_CHOICES, false, TEE_MODE_DECRYPT, TEE_MODE_DECRYPT};
 
-TEE_Result rsa_prepare(rsa_operation_t* operation, const rsa_purpose_t& purpose,
-                       byte_view key_material, const keymaster_key_param_set_t& begin_params,
-                       keymaster_error_t* km_error) {
+outcome rsa_prepare(rsa_operation_t* operation, const rsa_purpose_t& purpose,
+                    const begin_request& request) {
   uint32_t algorithm = 0;
-  *km_error = settle_request(operation, purpose, key_material, begin_params, &algorithm);
-  if (*km_error != KM_ERROR_OK) return TEE_SUCCESS;
+  TRY(load(operation, request.key_material));
+  TRY(read_request(operation, purpose.is_signature, request.params));
+  TRY(choose(*operation, purpose.choices, &algorithm));
+  TRY(check_pss_fits(*operation));
   const bool undigested = operation->message.digest == KM_DIGEST_NONE;
-  if (purpose.is_signature && !undigested) {
-    if (TEE_Result res = operation->message.start_hash()) return res;
-  }
+  if (purpose.is_signature && !undigested) TRY(operation->message.start_hash());
   const uint32_t mode = undigested ? purpose.undigested_mode : purpose.mode;
-  if (TEE_Result res = operation->main.allocate(algorithm, mode, operation->key_bits)) {
-    return res;
-  }
+  TRY(operation->main.allocate(algorithm, mode, operation->key_bits));
   return operation->main.set_key(operation->key.get());
 }
 
-TEE_Result rsa_keep(rsa_operation_t* operation, byte_view input, size_t reserved,
-                    const char* purpose, size_t* consumed, keymaster_error_t* km_error) {
-  const uint64_t total = uint64_t{operation->message.length} + input.size();
-  if (total + reserved > operation->key_size()) {
-    trace_error("Input too long to %s, key_size %d, input %dB", purpose,
-                static_cast<int>(operation->key_bits), static_cast<int>(total));
-    *consumed = 0;
-    *km_error = KM_ERROR_INVALID_INPUT_LENGTH;
-    return TEE_SUCCESS;
+keymaster_error_t rsa_take(operation_t* operation, update_step* step, const char* purpose) {
+  auto* record = static_cast<rsa_operation_t*>(operation);
+  const uint64_t total = uint64_t{record->message.length} + step->input.size();
+  const size_t reserved = record->padding == KM_PAD_RSA_PKCS1_1_5_SIGN ? PKCS1_OVERHEAD : 0;
+  if (!record->message.is_hashed() && total + reserved > record->key_size()) {
+    return refuse(KM_ERROR_INVALID_INPUT_LENGTH, "Input too long to %s, key_size %d, input %dB",
+                  purpose, static_cast<int>(record->key_bits), static_cast<int>(total));
   }
-  operation->message.append(input);
-  *consumed = input.size();
-  return TEE_SUCCESS;
-}
-
-TEE_Result rsa_take_signed(rsa_operation_t* operation, byte_view input, const char* purpose,
-                           size_t* consumed, keymaster_error_t* km_error) {
-  if (!operation->message.is_hashed()) {
-    const size_t reserved = operation->padding == KM_PAD_RSA_PKCS1_1_5_SIGN ? PKCS1_OVERHEAD : 0;
-    return rsa_keep(operation, input, reserved, purpose, consumed, km_error);
-  }
-  TEE_DigestUpdate(operation->message.hash.get(), input.data(),
-                   static_cast<tee_size>(input.size()));
-  *consumed = input.size();
-  return TEE_SUCCESS;
+  record->message.append(step->input);
+  step->consumed = step->input.size();
+  return KM_ERROR_OK;
 }
 
 void rsa_build_pkcs1_block(rsa_operation_t* operation) {
@@ -212,28 +180,22 @@ void rsa_build_pkcs1_block(rsa_operation_t* operation) {
   message.length = block.size();
 }
 
-TEE_Result rsa_crypt(rsa_call call, const rsa_operation_t& operation, byte_view input,
-                     heap_buffer* result, size_t* produced, keymaster_error_t* km_error) {
+outcome rsa_crypt(rsa_call call, const rsa_operation_t& operation, byte_view input,
+                  heap_buffer* result, size_t* produced) {
   *produced = 0;
   if (!result->allocate(operation.key_size())) {
-    trace_error("Out of memory");
-    *km_error = KM_ERROR_MEMORY_ALLOCATION_FAILED;
-    return TEE_SUCCESS;
+    return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
   auto size = static_cast<tee_size>(result->size());
-  const TEE_Result res = call(operation.main.get(), nullptr, 0, input.data(),
-                              static_cast<tee_size>(input.size()), result->data(), &size);
-  if (res == TEE_SUCCESS) *produced = size;
-  return res;
+  TRY(call(operation.main.get(), nullptr, 0, input.data(), static_cast<tee_size>(input.size()),
+           result->data(), &size));
+  *produced = size;
+  return DONE;
 }
 
-TEE_Result rsa_settle_crypt(TEE_Result res, const char* failure, keymaster_error_t* km_error) {
-  if (res == TEE_ERROR_BAD_PARAMETERS) {
-    *km_error = KM_ERROR_INVALID_ARGUMENT;
-    return TEE_SUCCESS;
-  }
-  if (res != TEE_SUCCESS) trace_error("%s 0x%08x", failure, res);
-  return res;
+outcome rsa_settle_crypt(outcome how, const char* failure) {
+  if (how.tee == TEE_ERROR_BAD_PARAMETERS) return KM_ERROR_INVALID_ARGUMENT;
+  return how.tee == TEE_SUCCESS ? how : fail(how.tee, "%s 0x%08x", failure, how.tee);
 }
 
 const algorithm_t RSA_ALGORITHM = {

@@ -62,23 +62,15 @@ extern const rsa_purpose_t RSA_ENCRYPT;
 extern const rsa_purpose_t RSA_DECRYPT;
 
 // rsa_prepare: everything of create that can fail after the record is there. Codes as
-// create_rsa_sign. Messages go out under `at`.
-[[nodiscard]] TEE_Result rsa_prepare(rsa_operation_t* operation, const rsa_purpose_t& purpose,
-                                     byte_view key_material,
-                                     const keymaster_key_param_set_t& begin_params,
-                                     keymaster_error_t* km_error);
+// create_rsa_sign.
+outcome rsa_prepare(rsa_operation_t* operation, const rsa_purpose_t& purpose,
+                    const begin_request& request);
 
-// rsa_keep: appends `input` to the message, which may take `reserved` bytes less than the key's
-// size. *consumed receives the bytes taken: all, or none with KM_ERROR_INVALID_INPUT_LENGTH.
+// rsa_take: the update of every purpose: takes all of the input into the message. What is kept,
+// with its padding, may not outgrow the key: KM_ERROR_INVALID_INPUT_LENGTH, and none is taken.
 // `purpose` stands in the message, as in "Input too long to sign".
-[[nodiscard]] TEE_Result rsa_keep(rsa_operation_t* operation, byte_view input, size_t reserved,
-                                  const char* purpose, size_t* consumed,
-                                  keymaster_error_t* km_error);
-
-// rsa_take_signed: the update of signing and verification: hashes `input`, or keeps it.
-[[nodiscard]] TEE_Result rsa_take_signed(rsa_operation_t* operation, byte_view input,
-                                         const char* purpose, size_t* consumed,
-                                         keymaster_error_t* km_error);
+[[nodiscard]] keymaster_error_t rsa_take(operation_t* operation, update_step* step,
+                                         const char* purpose);
 
 // rsa_build_pkcs1_block: turns the kept message into the EMSA-PKCS1-v1_5 block (RFC 8017, 9.2) in
 // which it stands for the whole DigestInfo.
@@ -88,14 +80,12 @@ void rsa_build_pkcs1_block(rsa_operation_t* operation);
 // the key's size, and *produced tells how much of it the platform has filled. -41: out of memory.
 // The platform's code is not traced.
 using rsa_call = decltype(TEE_AsymmetricEncrypt);
-[[nodiscard]] TEE_Result rsa_crypt(rsa_call call, const rsa_operation_t& operation, byte_view input,
-                                   heap_buffer* result, size_t* produced,
-                                   keymaster_error_t* km_error);
+outcome rsa_crypt(rsa_call call, const rsa_operation_t& operation, byte_view input,
+                  heap_buffer* result, size_t* produced);
 
 // rsa_settle_crypt: what the outcome of rsa_crypt means where its input is the client's:
-// KM_ERROR_INVALID_ARGUMENT when the platform refuses it; any other code is traced behind `failure`
-// and passed on.
-[[nodiscard]] TEE_Result rsa_settle_crypt(TEE_Result res, const char* failure,
-                                          keymaster_error_t* km_error);
+// KM_ERROR_INVALID_ARGUMENT when the platform refuses it; any other code of the platform is traced
+// behind `failure` and passed on.
+outcome rsa_settle_crypt(outcome how, const char* failure);
 
 }  // namespace keymaster
