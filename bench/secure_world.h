@@ -7,7 +7,7 @@
 #include <optional>
 #include <string>
 
-#include "client/session.h"
+#include "keymaster/client/session.h"
 
 namespace keymaster::bench {
 

@@ -1,5 +1,5 @@
 // The authenticator's one command.
-#include "client/authenticator.h"
+#include "keymaster/client/authenticator.h"
 
 namespace keymaster::client {
 

@@ -1,5 +1,5 @@
 // Hexadecimal text and the fields of command buffers.
-#include "client/bytes.h"
+#include "keymaster/client/bytes.h"
 
 #include <limits>
 #include <utility>

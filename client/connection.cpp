@@ -1,5 +1,5 @@
 // Owners over the TEE Client API.
-#include "client/connection.h"
+#include "keymaster/client/connection.h"
 
 #include <utility>
 

@@ -1,5 +1,5 @@
 // The tables of names, and the text forms of values.
-#include "client/names.h"
+#include "keymaster/client/names.h"
 
 #include <algorithm>
 #include <array>

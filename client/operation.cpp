@@ -1,5 +1,5 @@
 // Feeding and ending operations.
-#include "client/operation.h"
+#include "keymaster/client/operation.h"
 
 namespace keymaster::client {
 

@@ -1,5 +1,5 @@
 // Building, reading and marshalling of parameter sets.
-#include "client/param_set.h"
+#include "keymaster/client/param_set.h"
 
 #include <algorithm>
 #include <iterator>

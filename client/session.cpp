@@ -1,5 +1,5 @@
 // The commands of the Keymaster trusted application.
-#include "client/session.h"
+#include "keymaster/client/session.h"
 
 #include <algorithm>
 #include <utility>

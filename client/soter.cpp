@@ -1,5 +1,5 @@
 // The SOTER commands, and the layout of what SOTER keys put out.
-#include "client/soter.h"
+#include "keymaster/client/soter.h"
 
 namespace keymaster::client {
 

@@ -1,5 +1,5 @@
 // Names of results, and what a person can do about each.
-#include "client/status.h"
+#include "keymaster/client/status.h"
 
 #include <algorithm>
 #include <array>

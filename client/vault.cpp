@@ -1,26 +1,16 @@
 // The vault's record, and the TLV boxes in it: items of u16 tag, u16 length and value,
 // little-endian.
-#include "client/vault.h"
+#include "keymaster/client/vault.h"
 
 #include <stdexcept>
+
+#include "ta/vault/items.h"
 
 namespace keymaster::client {
 
 namespace {
 
 constexpr uint32_t PROVISION = 100;
-
-constexpr uint16_t TAG_N = 17;
-constexpr uint16_t TAG_E = 18;
-constexpr uint16_t TAG_D = 19;
-constexpr uint16_t TAG_P = 20;
-constexpr uint16_t TAG_Q = 21;
-constexpr uint16_t TAG_DP = 22;
-constexpr uint16_t TAG_DQ = 23;
-constexpr uint16_t TAG_QINV = 24;
-constexpr uint16_t TAG_FINGERPRINT_NAME = 6197;
-constexpr uint16_t TAG_FINGERPRINT_VERSION = 6198;
-constexpr uint16_t TAG_FINGERPRINT_APPLICATION = 6199;
 
 void add_item(field_writer* box, uint16_t tag, byte_view value) {
   if (value.size() > UINT16_MAX) throw std::length_error("a TLV item of more than 65535 bytes");
@@ -30,15 +20,15 @@ void add_item(field_writer* box, uint16_t tag, byte_view value) {
 bytes key_box(const rsa_numbers& key) {
   if (key.n.empty()) return {};
   field_writer box;
-  add_item(&box, TAG_N, key.n);
-  add_item(&box, TAG_E, key.e);
-  add_item(&box, TAG_D, key.d);
+  add_item(&box, KEY_N, key.n);
+  add_item(&box, KEY_E, key.e);
+  add_item(&box, KEY_D, key.d);
   if (key.p.empty()) return box.take();
-  add_item(&box, TAG_P, key.p);
-  add_item(&box, TAG_Q, key.q);
-  add_item(&box, TAG_DP, key.dp);
-  add_item(&box, TAG_DQ, key.dq);
-  add_item(&box, TAG_QINV, key.qinv);
+  add_item(&box, KEY_P, key.p);
+  add_item(&box, KEY_Q, key.q);
+  add_item(&box, KEY_DP, key.dp);
+  add_item(&box, KEY_DQ, key.dq);
+  add_item(&box, KEY_QINV, key.qinv);
   return box.take();
 }
 
@@ -53,9 +43,9 @@ bytes uuid_in_memory(const TEEC_UUID& uuid) {
 
 bytes property_box(const factory_data& data) {
   field_writer box;
-  add_item(&box, TAG_FINGERPRINT_NAME, as_bytes(data.fingerprint_name));
-  add_item(&box, TAG_FINGERPRINT_VERSION, as_bytes(data.fingerprint_version));
-  add_item(&box, TAG_FINGERPRINT_APPLICATION, uuid_in_memory(data.fingerprint_application));
+  add_item(&box, FP_NAME, as_bytes(data.fingerprint_name));
+  add_item(&box, FP_VERSION, as_bytes(data.fingerprint_version));
+  add_item(&box, FP_UUID, uuid_in_memory(data.fingerprint_application));
   return box.take();
 }
 

@@ -6,20 +6,12 @@ include(CMakePackageConfigHelpers)
 
 install(DIRECTORY tee/include/ DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} FILES_MATCHING PATTERN "*.h")
 install(TARGETS teec EXPORT keymaster LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
+install(TARGETS keymaster_client EXPORT keymaster ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR})
 
-# The client's headers lie in include/keymaster/client; they name each other "client/...", and of
-# the TA's headers the one of numbers alone.
-if(TARGET keymaster_client)
-  install(TARGETS keymaster_client EXPORT keymaster ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR})
-  install(DIRECTORY client DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster
-          FILES_MATCHING PATTERN "*.h")
-  install(FILES product/uuids.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster/product)
-  install(FILES ta/params/tags.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster/ta/params)
-  target_include_directories(keymaster_client INTERFACE
-      $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>
-      $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/keymaster>)
-  set_target_properties(keymaster_client PROPERTIES EXPORT_NAME client)
-endif()
+# The numbers are links in the tree, to what the trusted application and the product own.
+install(DIRECTORY client/include/ DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}
+        FILES_MATCHING PATTERN "*.h" PATTERN tags.h EXCLUDE PATTERN uuids.h EXCLUDE)
+install(FILES ta/params/tags.h product/uuids.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/keymaster)
 
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/keymaster)
 install(EXPORT keymaster NAMESPACE keymaster:: FILE keymaster-targets.cmake
@@ -29,6 +21,8 @@ write_basic_package_version_file(${PROJECT_BINARY_DIR}/keymaster-config-version.
 install(FILES cmake/keymaster-config.cmake ${PROJECT_BINARY_DIR}/keymaster-config-version.cmake
         DESTINATION ${package_dir})
 
+# libdir may be several folders deep, as in lib/x86_64-linux-gnu.
+file(RELATIVE_PATH pc_prefix /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
 foreach(name teec keymaster-client)
   configure_file(cmake/${name}.pc.in ${PROJECT_BINARY_DIR}/${name}.pc @ONLY)
   install(FILES ${PROJECT_BINARY_DIR}/${name}.pc

@@ -60,7 +60,7 @@ __attribute__((format(printf, 2, 0))) void write_line(with_line<uint32_t> level,
 
 }  // namespace
 
-const char* trace_scope::current_ = "";
+const char* trace_scope::current_name = "";
 
 void trace(with_line<uint32_t> level, const char* format, ...) {
   va_list arguments;

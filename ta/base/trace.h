@@ -16,17 +16,17 @@ namespace keymaster {
 class trace_scope {
  public:
   explicit trace_scope(const char* function = __builtin_FUNCTION())
-      : outer_(std::exchange(current_, function)) {}
+      : outer_(std::exchange(current_name, function)) {}
   trace_scope(const trace_scope&) = delete;
   trace_scope& operator=(const trace_scope&) = delete;
-  ~trace_scope() { current_ = outer_; }
+  ~trace_scope() { current_name = outer_; }
 
-  static const char* current() { return current_; }
+  static const char* current() { return current_name; }
   // The state of a fresh instance, whatever an earlier one in this process left.
-  static void reset() { current_ = ""; }
+  static void reset() { current_name = ""; }
 
  private:
-  static const char* current_;
+  static const char* current_name;
   const char* outer_;
 };
 

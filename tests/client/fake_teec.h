@@ -7,7 +7,7 @@
 #include <functional>
 #include <vector>
 
-#include "client/bytes.h"
+#include "keymaster/client/bytes.h"
 
 namespace fake_teec {
 

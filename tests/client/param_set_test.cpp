@@ -1,10 +1,10 @@
 // Parameter sets in malformed bytes, and the tables of names.
-#include "client/param_set.h"
+#include "keymaster/client/param_set.h"
 
 #include <gtest/gtest.h>
 
-#include "client/names.h"
-#include "client/status.h"
+#include "keymaster/client/names.h"
+#include "keymaster/client/status.h"
 
 namespace keymaster::client {
 namespace {

@@ -1,11 +1,11 @@
 // What the client makes of good, failed and hostile answers and of the documents in them.
-#include "client/session.h"
+#include "keymaster/client/session.h"
 
 #include <gtest/gtest.h>
 
-#include "client/operation.h"
-#include "client/soter.h"
 #include "fake_teec.h"
+#include "keymaster/client/operation.h"
+#include "keymaster/client/soter.h"
 
 namespace keymaster::client {
 namespace {

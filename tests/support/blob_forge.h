@@ -2,8 +2,8 @@
 // seals can be looked into, and the TA can be given blobs that it would never make.
 #pragma once
 
-#include "client/bytes.h"
-#include "client/param_set.h"
+#include "keymaster/client/bytes.h"
+#include "keymaster/client/param_set.h"
 
 namespace keymaster::test {
 

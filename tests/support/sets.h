@@ -1,7 +1,7 @@
 // Purposes and parameter sets that several tests start from.
 #pragma once
 
-#include "client/param_set.h"
+#include "keymaster/client/param_set.h"
 
 namespace keymaster::test {
 

@@ -17,8 +17,8 @@
 #include <string>
 #include <vector>
 
-#include "client/authenticator.h"
-#include "client/session.h"
+#include "keymaster/client/authenticator.h"
+#include "keymaster/client/session.h"
 #include "product/uuids.h"
 #include "support/trace_capture.h"
 #include "tee/device/device.h"

@@ -3,8 +3,8 @@
 
 #include <stdlib.h>
 
-#include "client/soter.h"
-#include "client/vault.h"
+#include "keymaster/client/soter.h"
+#include "keymaster/client/vault.h"
 #include "support/sets.h"
 #include "ta/fake_sibling/fake_sibling.h"
 #include "ta/pkey.h"

@@ -6,8 +6,8 @@
 #include <openssl/x509v3.h>
 
 #include "attestation.h"
-#include "client/names.h"
 #include "files.h"
+#include "keymaster/client/names.h"
 #include "keymaster_device.h"
 #include "listing.h"
 #include "tool.h"

@@ -7,7 +7,7 @@
 #include <openssl/err.h>
 #include <openssl/pem.h>
 
-#include "client/bytes.h"
+#include "keymaster/client/bytes.h"
 
 namespace kmtool {
 

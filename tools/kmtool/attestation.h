@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-#include "client/param_set.h"
+#include "keymaster/client/param_set.h"
 
 namespace kmtool {
 

@@ -1,5 +1,5 @@
 // kmtool encrypt | decrypt
-#include "client/names.h"
+#include "keymaster/client/names.h"
 #include "operation_run.h"
 #include "output_file.h"
 

@@ -5,8 +5,8 @@
 #include <filesystem>
 #include <unistd.h>
 
-#include "client/operation.h"
 #include "files.h"
+#include "keymaster/client/operation.h"
 #include "listing.h"
 #include "tee/device/uuid.h"
 

@@ -5,9 +5,9 @@
 #include <memory>
 #include <sys/wait.h>
 
-#include "client/operation.h"
 #include "demo.h"
 #include "files.h"
+#include "keymaster/client/operation.h"
 #include "soter_document.h"
 
 namespace kmtool {

@@ -1,7 +1,7 @@
 // kmtool export
-#include "client/names.h"
 #include "files.h"
 #include "key_formats.h"
+#include "keymaster/client/names.h"
 #include "keymaster_device.h"
 #include "options.h"
 #include "tool.h"

@@ -7,7 +7,7 @@
 #include <string>
 #include <sys/types.h>
 
-#include "client/bytes.h"
+#include "keymaster/client/bytes.h"
 #include "output_file.h"
 
 namespace kmtool {

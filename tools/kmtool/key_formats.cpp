@@ -8,8 +8,8 @@
 #include <openssl/rsa.h>
 #include <openssl/x509.h>
 
+#include "keymaster/tags.h"
 #include "libcrypto.h"
-#include "ta/params/tags.h"
 
 namespace kmtool {
 

@@ -1,7 +1,7 @@
 // Asymmetric keys between the forms of other tools and the TA's raw forms.
 #pragma once
 
-#include "client/bytes.h"
+#include "keymaster/client/bytes.h"
 #include "tool.h"
 
 namespace kmtool {

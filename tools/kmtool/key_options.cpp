@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <utility>
 
-#include "client/names.h"
+#include "keymaster/client/names.h"
 #include "tool.h"
 
 namespace kmtool {

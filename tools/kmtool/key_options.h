@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "client/param_set.h"
+#include "keymaster/client/param_set.h"
 #include "options.h"
 #include "soter_key_options.h"
 

@@ -2,10 +2,10 @@
 #include <cstdlib>
 #include <filesystem>
 
-#include "client/names.h"
 #include "files.h"
 #include "key_formats.h"
 #include "key_options.h"
+#include "keymaster/client/names.h"
 #include "keymaster_device.h"
 #include "listing.h"
 #include "tool.h"

@@ -3,9 +3,9 @@
 
 #include <string>
 
-#include "client/authenticator.h"
-#include "client/session.h"
-#include "client/soter.h"
+#include "keymaster/client/authenticator.h"
+#include "keymaster/client/session.h"
+#include "keymaster/client/soter.h"
 #include "tee/device/device.h"
 #include "tool.h"
 

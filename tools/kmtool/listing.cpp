@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <vector>
 
-#include "client/names.h"
+#include "keymaster/client/names.h"
 
 namespace kmtool {
 

@@ -3,7 +3,7 @@
 
 #include <string>
 
-#include "client/param_set.h"
+#include "keymaster/client/param_set.h"
 #include "tool.h"
 
 namespace kmtool {

@@ -3,7 +3,7 @@
 
 #include <algorithm>
 
-#include "client/names.h"
+#include "keymaster/client/names.h"
 #include "progress.h"
 
 namespace kmtool {

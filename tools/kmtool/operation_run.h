@@ -6,8 +6,8 @@
 #include <optional>
 #include <string>
 
-#include "client/operation.h"
 #include "files.h"
+#include "keymaster/client/operation.h"
 #include "keymaster_device.h"
 #include "options.h"
 #include "tool.h"

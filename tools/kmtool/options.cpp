@@ -4,7 +4,7 @@
 #include <limits>
 #include <sstream>
 
-#include "client/names.h"
+#include "keymaster/client/names.h"
 
 namespace kmtool {
 

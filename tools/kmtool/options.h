@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "client/session.h"
+#include "keymaster/client/session.h"
 
 namespace kmtool {
 

@@ -5,7 +5,7 @@
 #include <memory>
 #include <string>
 
-#include "client/bytes.h"
+#include "keymaster/client/bytes.h"
 
 namespace kmtool {
 

@@ -1,5 +1,5 @@
 // kmtool sign | verify
-#include "client/names.h"
+#include "keymaster/client/names.h"
 #include "operation_run.h"
 #include "soter_document.h"
 

@@ -4,7 +4,7 @@
 #include <optional>
 #include <string>
 
-#include "client/soter.h"
+#include "keymaster/client/soter.h"
 #include "tool.h"
 
 namespace kmtool {

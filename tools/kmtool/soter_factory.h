@@ -3,7 +3,7 @@
 
 #include <string>
 
-#include "client/vault.h"
+#include "keymaster/client/vault.h"
 #include "tee/device/device.h"
 #include "tool.h"
 

@@ -4,7 +4,7 @@
 #include <optional>
 #include <string>
 
-#include "client/param_set.h"
+#include "keymaster/client/param_set.h"
 #include "options.h"
 
 namespace kmtool {

@@ -8,7 +8,7 @@
 #include <stdexcept>
 #include <string>
 
-#include "client/status.h"
+#include "keymaster/client/status.h"
 
 namespace kmtool {
 

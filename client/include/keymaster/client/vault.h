@@ -4,9 +4,9 @@
 
 #include <string>
 
-#include "client/connection.h"
-#include "client/soter.h"
-#include "product/uuids.h"
+#include "keymaster/client/connection.h"
+#include "keymaster/client/soter.h"
+#include "keymaster/uuids.h"
 
 namespace keymaster::client {
 

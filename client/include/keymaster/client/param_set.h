@@ -7,8 +7,8 @@
 #include <optional>
 #include <vector>
 
-#include "client/bytes.h"
-#include "ta/params/tags.h"
+#include "keymaster/client/bytes.h"
+#include "keymaster/tags.h"
 
 namespace keymaster::client {
 

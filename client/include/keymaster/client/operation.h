@@ -1,7 +1,7 @@
 // An operation from begin to its end.
 #pragma once
 
-#include "client/session.h"
+#include "keymaster/client/session.h"
 
 namespace keymaster::client {
 

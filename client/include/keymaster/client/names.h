@@ -6,7 +6,7 @@
 #include <string_view>
 #include <vector>
 
-#include "client/param_set.h"
+#include "keymaster/client/param_set.h"
 
 namespace keymaster::client {
 

@@ -5,9 +5,9 @@
 // origin TEEC_ORIGIN_API. Sessions of one device share all state: configuration and operations.
 #pragma once
 
-#include "client/connection.h"
-#include "client/param_set.h"
-#include "product/uuids.h"
+#include "keymaster/client/connection.h"
+#include "keymaster/client/param_set.h"
+#include "keymaster/uuids.h"
 
 namespace keymaster::client {
 
@@ -103,7 +103,7 @@ class session {
   attest_result attest_key(byte_view blob, const param_set& params);
 
   // begin: starts an operation for `purpose` (KM_PURPOSE_...). Its handle lives until finish,
-  // abort, or a failed update; class operation (client/operation.h) sees to that.
+  // abort, or a failed update; class operation sees to that.
   begin_result begin(uint32_t purpose, byte_view blob, const param_set& params);
 
   // update: feeds input, of which `consumed` bytes were taken. A failure ends the operation.

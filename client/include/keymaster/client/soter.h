@@ -5,9 +5,9 @@
 #include <optional>
 #include <string>
 
-#include "client/connection.h"
-#include "client/session.h"
-#include "product/uuids.h"
+#include "keymaster/client/connection.h"
+#include "keymaster/client/session.h"
+#include "keymaster/uuids.h"
 
 namespace keymaster::client {
 

@@ -1,9 +1,9 @@
 // Authentication tokens, which the device's authenticator issues for keys that are bound to a user.
 #pragma once
 
-#include "client/connection.h"
-#include "client/session.h"
-#include "product/uuids.h"
+#include "keymaster/client/connection.h"
+#include "keymaster/client/session.h"
+#include "keymaster/uuids.h"
 
 namespace keymaster::client {
 

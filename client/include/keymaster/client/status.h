@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "ta/params/tags.h"
+#include "keymaster/tags.h"
 
 namespace keymaster::client {
 

@@ -7,7 +7,7 @@
 #include <memory>
 #include <string>
 
-#include "client/status.h"
+#include "keymaster/client/status.h"
 
 namespace keymaster::client {
 

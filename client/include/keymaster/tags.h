@@ -1,0 +1,1 @@
+../../../ta/params/tags.h
