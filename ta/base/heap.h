@@ -95,6 +95,7 @@ class heap_ptr {
   // Hands the record to the caller, who frees it with heap_delete.
   [[nodiscard]] T* release() { return std::exchange(record_, nullptr); }
   T* operator->() const { return record_; }
+  // NOLINTNEXTLINE(clang-analyzer-core.uninitialized.UndefReturn): of an owner that has a record
   T& operator*() const { return *record_; }
   explicit operator bool() const { return record_ != nullptr; }
 

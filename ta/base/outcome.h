@@ -37,6 +37,19 @@ constexpr outcome DONE;
 [[nodiscard]] keymaster_error_t refuse(with_line<keymaster_error_t> code, const char* format, ...)
     __attribute__((format(printf, 2, 3), cold));
 
+#ifdef __clang_analyzer__
+// It enters no function with C's variable arguments: these tell it that a maker's value is the
+// code.
+template <class... T>
+TEE_Result fail(TEE_Result code, const char*, T...) {
+  return code;
+}
+template <class... T>
+keymaster_error_t refuse(keymaster_error_t code, const char*, T...) {
+  return code;
+}
+#endif
+
 // checked: the result of a platform call; a failure is traced as "<call> failed with 0x%08x".
 [[nodiscard]] TEE_Result checked(with_line<TEE_Result> res, const char* call);
 
