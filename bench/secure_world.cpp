@@ -43,9 +43,9 @@ bytes pattern(size_t length) {
 
 secure_world::secure_world() : folder_(temporary_folder()) {
   tee::device_settings settings;
-  settings.id = tee::new_uuid();
+  settings.identity = tee::new_uuid();
   settings.rpmb = false;
-  device_id_ = settings.id;
+  device_id_ = settings.identity;
   const std::string path = folder_ + "/device";
   tee::device::create(path, settings);
   const client::context context(path);

@@ -20,7 +20,7 @@ TEE_Result TEE_RPMB_MakeFileSystem(uint32_t* state) {
     if (!state) tee::panic(CALL, "state is null");
     *state = 0;
     if (TEE_Result fault = fault_point()) return fault;
-    if (!dev.make_rpmb()) return TEE_ERROR_NOT_SUPPORTED;
+    if (!dev.has_rpmb()) return TEE_ERROR_NOT_SUPPORTED;  // made with the device if it has one
     *state = 1;
     return TEE_SUCCESS;
   });

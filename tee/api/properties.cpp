@@ -32,14 +32,13 @@ constexpr implementation_property IMPLEMENTATION[] = {
      [](device&) { return std::optional<property_value>(CORE_API_VERSION); }},
     {"gpd.tee.description",
      [](device&) { return std::optional<property_value>("TEE on a general-purpose host"); }},
-    {"gpd.tee.deviceID",
-     [](device& dev) { return std::optional<property_value>(dev.settings().id); }},
+    {"gpd.tee.deviceID", [](device& dev) { return std::optional<property_value>(dev.identity()); }},
     {"gpd.tee.systemTime.protectionLevel",
      [](device&) { return std::optional<property_value>(PROTECTED_BY_REE); }},
     {"gpd.tee.trustedStorage.antiRollback.protectionLevel",
-     [](device& dev) {
-       return std::optional<property_value>(dev.has_rpmb() ? PROTECTED_BY_REE : 0);
-     }},
+     [](device&) { return std::optional<property_value>(PROTECTED_BY_REE); }},
+    {"keymaster.device.publicID",
+     [](device& dev) { return std::optional<property_value>(dev.settings().public_id); }},
     {"gpd.tee.trustedos.manufacturer",
      [](device& dev) { return std::optional<property_value>(dev.settings().manufacturer); }},
     {"gpd.tee.trustedos.implementation.version",

@@ -16,14 +16,11 @@ namespace tee {
 
 namespace {
 
+constexpr char BOOT_FILE[] = "boot.json";
 constexpr size_t BOOT_FILE_LIMIT = 4096;
 constexpr std::string_view SEED_KEY = "\"boot_seed\"";
 constexpr size_t SEED_DIGITS = 2 * device::BOOT_SEED_LENGTH;
 constexpr char BLANK = '0';
-
-std::string boot_path(const std::string& folder) {
-  return folder + "/boot.json";
-}
 
 std::string machine_boot_id() {
   auto text = read_file("/proc/sys/kernel/random/boot_id", 64);
@@ -75,7 +72,7 @@ void put_seed(const secret_bytes& seed, secret_bytes* text) {
 
 }  // namespace
 
-boot_record start_boot(const std::string& folder) {
+boot_record start_boot(const device_folder& folder) {
   boot_record boot{secret_bytes(device::BOOT_SEED_LENGTH), machine_clock_ms()};
   fill_random(boot.seed);
   json document = {{"boot_seed", std::string(SEED_DIGITS, BLANK)},
@@ -84,13 +81,13 @@ boot_record start_boot(const std::string& folder) {
   std::string blank = to_file_text(document);
   secret_bytes text(blank.begin(), blank.end());
   put_seed(boot.seed, &text);
-  write_file(boot_path(folder), text);
+  folder.write(BOOT_FILE, text);
   return boot;
 }
 
-boot_record current_boot(const std::string& folder) {
-  const std::string path = boot_path(folder);
-  auto text = read_file(path, BOOT_FILE_LIMIT);
+boot_record current_boot(const device_folder& folder) {
+  const std::string path = folder.path_of(BOOT_FILE);
+  auto text = folder.read(BOOT_FILE, BOOT_FILE_LIMIT);
   if (!text) throw device_error(device_error::kind::DAMAGED, path + " is missing");
   auto seed = take_seed(&*text);
   if (!seed) throw device_error(device_error::kind::DAMAGED, path + " holds no boot seed");

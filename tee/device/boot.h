@@ -2,8 +2,8 @@
 #pragma once
 
 #include <cstdint>
-#include <string>
 
+#include "tee/device/folder.h"
 #include "tee/device/secret_bytes.h"
 
 namespace tee {
@@ -13,12 +13,12 @@ struct boot_record {
   uint64_t boot_ms;   // on the machine's clock (machine_clock_ms)
 };
 
-// start_boot: begins a new boot of the device in `folder`: boot.json holds a new seed and the time.
+// start_boot: begins a new boot of the device: boot.json holds a new seed and the time.
 // Throws device_error.
-boot_record start_boot(const std::string& folder);
+boot_record start_boot(const device_folder& folder);
 
 // current_boot: the boot that boot.json tells of, or a new one when the machine was started anew
 // since. Throws device_error: DAMAGED when the file is missing or malformed.
-boot_record current_boot(const std::string& folder);
+boot_record current_boot(const device_folder& folder);
 
 }  // namespace tee

@@ -2,6 +2,7 @@
 #include "tee/device/database.h"
 
 #include <cerrno>
+#include <cstring>
 
 namespace tee {
 
@@ -22,12 +23,29 @@ bool is_full(int code, int error_number) {
          (error_number == ENOSPC || error_number == EDQUOT || error_number == EFBIG);
 }
 
+// The library's own view of files, but with paths left as they are: it would follow the links in
+// them once, and keep its journal where they led to then, even after the folder was moved.
+const char* plain_paths() {
+  static sqlite3_vfs vfs = [] {
+    sqlite3_vfs made = *sqlite3_vfs_find(nullptr);
+    made.zName = "plain-paths";
+    made.xFullPathname = [](sqlite3_vfs*, const char* path, int room, char* out) {
+      if (std::strlen(path) >= static_cast<size_t>(room)) return SQLITE_CANTOPEN;
+      std::strcpy(out, path);
+      return SQLITE_OK;
+    };
+    return made;
+  }();
+  static const int registered = sqlite3_vfs_register(&vfs, 0);
+  return registered == SQLITE_OK ? vfs.zName : nullptr;
+}
+
 }  // namespace
 
-database::database(const std::string& path, int flags) {
+database::database(const std::string& path) {
   sqlite3* handle = nullptr;
-  int code = sqlite3_open_v2(path.c_str(), &handle,
-                             flags | SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX, nullptr);
+  int code = sqlite3_open_v2(path.c_str(), &handle, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX,
+                             plain_paths());
   handle_.reset(handle);
   if (code != SQLITE_OK) fail();
   sqlite3_extended_result_codes(handle, 1);
@@ -36,15 +54,9 @@ database::database(const std::string& path, int flags) {
   sqlite3_db_config(handle, SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
   sqlite3_db_config(handle, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
   run(CONNECTION_SETTINGS);
-}
-
-database::database(const std::string& path) : database(path, 0) {}
-
-void database::create(const std::string& path, const char* schema) {
-  database made(path, SQLITE_OPEN_CREATE);
-  transaction change(&made);
-  made.run(schema);
-  change.commit();
+  if (sqlite3_db_readonly(handle, "main") != 0) {
+    throw storage_error(TEE_ERROR_STORAGE_NOT_AVAILABLE, "object store: it cannot be written");
+  }
 }
 
 bool database::in_place() const {
@@ -63,8 +75,10 @@ void database::fail() const {
   TEE_Result result = TEE_ERROR_STORAGE_NOT_AVAILABLE;
   if (is_full(code, sqlite3_system_errno(handle()))) result = TEE_ERROR_STORAGE_NO_SPACE;
   if (code == SQLITE_NOMEM) result = TEE_ERROR_OUT_OF_MEMORY;
-  throw storage_error(result, std::string("object store: ") + sqlite3_errmsg(handle()) + " (" +
-                                  std::to_string(code) + ")");
+  throw storage_error(
+      result,
+      std::string("object store: ") + sqlite3_errmsg(handle()) + " (" + std::to_string(code) + ")",
+      (code & 0xFF) == SQLITE_NOTADB || (code & 0xFF) == SQLITE_CORRUPT);
 }
 
 statement::statement(database* db, const char* sql) : db_(db) {

@@ -17,20 +17,20 @@ namespace tee {
 // Storage failed: result() is what the trusted application gets, what() is for people.
 class storage_error : public std::runtime_error {
  public:
-  storage_error(TEE_Result result, const std::string& what)
-      : std::runtime_error(what), result_(result) {}
+  storage_error(TEE_Result result, const std::string& what, bool damaged = false)
+      : std::runtime_error(what), result_(result), damaged_(damaged) {}
   TEE_Result result() const { return result_; }
+  bool damaged() const { return damaged_; }  // the file is no database, or a broken one
 
  private:
   TEE_Result result_;
+  bool damaged_;
 };
 
 class database {
  public:
-  // create: makes the database file `path`, which must not exist, and runs `schema`.
-  static void create(const std::string& path, const char* schema);
-
-  // Opens `path`, which create() made. STORAGE_NOT_AVAILABLE when it cannot.
+  // Opens the file `path`, which may be empty, to read and write. STORAGE_NOT_AVAILABLE when it
+  // cannot. Links in the path are followed anew whenever a file beside it is needed.
   explicit database(const std::string& path);
 
   // in_place: the file that was opened still stands at its path.
@@ -49,7 +49,6 @@ class database {
   struct closer {
     void operator()(sqlite3* handle) const { sqlite3_close(handle); }
   };
-  database(const std::string& path, int flags);
   std::unique_ptr<sqlite3, closer> handle_;
 };
 

@@ -6,32 +6,34 @@
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
-#include <sys/stat.h>
+#include <pwd.h>
 #include <system_error>
 #include <unistd.h>
 #include <utility>
 
 #include "tee/device/boot.h"
 #include "tee/device/clock.h"
-#include "tee/device/files.h"
-#include "tee/device/folder_lock.h"
+#include "tee/device/earlier_form.h"
+#include "tee/device/folder.h"
+#include "tee/device/identity.h"
 #include "tee/device/json_file.h"
 #include "tee/device/object_store.h"
-#include "tee/device/sealing.h"
 #include "tee/device/uuid.h"
 
 namespace tee {
 
 namespace {
 
+constexpr char SETTINGS_FILE[] = "device.json";
 constexpr size_t SETTINGS_FILE_LIMIT = 64 * 1024;
 constexpr size_t TEXT_LIMIT = 128;
 
-std::string settings_path(const std::string& folder) {
-  return folder + "/device.json";
-}
-std::string key_path(const std::string& folder) {
-  return folder + "/device.key";
+std::string home_of_user() {
+  std::array<char, 4096> room{};
+  passwd entry{};
+  passwd* found = nullptr;
+  getpwuid_r(geteuid(), &entry, room.data(), room.size(), &found);
+  return found != nullptr ? found->pw_dir : "";
 }
 
 bool is_plain_text(const std::string& text) {
@@ -40,19 +42,17 @@ bool is_plain_text(const std::string& text) {
          });
 }
 
-void store_settings(const std::string& folder, const device_settings& settings) {
+void store_settings(const device_folder& folder, const device_settings& settings) {
   if (!is_plain_text(settings.manufacturer) || !is_plain_text(settings.implementation_version)) {
     throw std::invalid_argument(
         "a device's texts are at most 128 bytes without control characters");
   }
-  json document = {{"id", to_text(settings.id)},
-                   {"manufacturer", settings.manufacturer},
+  json document = {{"manufacturer", settings.manufacturer},
                    {"implementation_version", settings.implementation_version},
-                   {"rpmb", settings.rpmb},
                    {"os_version", settings.os_version},
                    {"os_patchlevel", settings.os_patchlevel}};
   try {
-    write_file(settings_path(folder), as_bytes(to_file_text(document)));
+    folder.write(SETTINGS_FILE, as_bytes(to_file_text(document)));
   } catch (const json::exception&) {
     throw std::invalid_argument("a device's texts are UTF-8");
   }
@@ -65,17 +65,33 @@ std::string checked_text(const json& document, const char* name, const std::stri
                      path + ": " + name + " is too long or holds control characters");
 }
 
+// Whatever is fixed comes from the authenticated secrets.
+device_settings parse_settings(const device_folder& folder, const device_secrets& secrets) {
+  const std::string path = folder.path_of(SETTINGS_FILE);
+  auto text = folder.read(SETTINGS_FILE, SETTINGS_FILE_LIMIT);
+  if (!text) throw device_error(device_error::kind::DAMAGED, path + " is missing");
+  json document = parse_json({reinterpret_cast<const char*>(text->data()), text->size()}, path);
+  device_settings settings;
+  settings.rpmb = secrets.rpmb;
+  settings.public_id = public_id_of(identity_uuid(secrets));
+  settings.manufacturer = checked_text(document, "manufacturer", path);
+  settings.implementation_version = checked_text(document, "implementation_version", path);
+  settings.os_version =
+      static_cast<uint32_t>(json_number(document, "os_version", UINT32_MAX, path));
+  settings.os_patchlevel =
+      static_cast<uint32_t>(json_number(document, "os_patchlevel", UINT32_MAX, path));
+  return settings;
+}
+
 // What a new device holds, made in a folder of its own beside the place where it is to appear.
-void fill_folder(const std::string& folder, const device_settings& settings) {
-  secret_bytes key(DEVICE_KEY_LENGTH);
-  fill_random(key);
-  write_file(key_path(folder), key);
+void fill_folder(const device_folder& folder, const device_settings& settings) {
+  const bool nil = same_uuid(settings.identity, TEE_UUID{});
+  const device_secrets secrets = new_secrets(nil ? new_uuid() : settings.identity, settings.rpmb);
   store_settings(folder, settings);
   start_boot(folder);
-  object_store::create(folder);
-  const std::string database = folder + "/storage.db";
-  if (chmod(database.c_str(), 0600) != 0) throw file_error("protect", database);
-  sync_folder(folder);
+  object_store::create(folder, secrets.key);
+  store_identity(folder, secrets);
+  store_key(folder, secrets);
 }
 
 void move_into_place(const std::string& draft, const std::string& folder) {
@@ -94,103 +110,111 @@ std::string tidy(const std::string& path) {
   return tidied.has_filename() ? tidied : tidied.parent_path();
 }
 
+// The folder of a device that is there, and private.
+device_folder find_device(const std::string& path) {
+  device_folder folder(path);
+  if (!folder.has(SETTINGS_FILE) && !folder.has(KEY_FILE)) {
+    throw device_error(device_error::kind::NOT_FOUND, "there is no device at " + path);
+  }
+  folder.require_private();
+  return folder;
+}
+
+// The same, taken for this object and in the present form.
+device_folder take_device(const std::string& path) {
+  device_folder folder = find_device(path);
+  folder.lock();
+  folder.require_writable();
+  if (is_earlier_form(folder)) {
+    const device_secrets secrets = earlier_secrets(folder);
+    const device_settings settings = parse_settings(folder, secrets);
+    bring_over(folder, secrets, [&] { store_settings(folder, settings); });
+  }
+  return folder;
+}
+
 }  // namespace
 
 struct device::state {
-  explicit state(const std::string& folder)
-      : path(folder),
-        lock(folder),
-        settings(read_settings(folder)),
-        boot(current_boot(folder)),
-        objects(folder, read_key(folder), settings.rpmb) {}
-
-  static device_key read_key(const std::string& folder) {
-    auto key = read_file(key_path(folder), DEVICE_KEY_LENGTH);
-    if (key && key->size() == DEVICE_KEY_LENGTH) return *key;
-    throw device_error(device_error::kind::DAMAGED, key_path(folder) + " holds no device key");
+  explicit state(const std::string& path)
+      : folder(take_device(path)),
+        secrets(load_secrets(folder)),
+        settings(parse_settings(folder, secrets)),
+        objects(folder, secrets.key, secrets.rpmb),
+        boot(current_boot(folder)) {
+    remove_leftovers(folder);
   }
 
-  std::string path;
-  folder_lock lock;
+  device_folder folder;
+  device_secrets secrets;
   device_settings settings;
-  boot_record boot;
   object_store objects;
+  boot_record boot;
 };
 
 std::string device::default_path() {
+  // A program with raised rights does not use the device that its caller's environment names.
   auto variable = [](const char* name) {
-    const char* value = std::getenv(name);
+    const char* value = secure_getenv(name);
     return std::string(value != nullptr ? value : "");
   };
   if (std::string path = variable("KEYMASTER_DEVICE"); !path.empty()) return path;
   std::string base = variable("XDG_STATE_HOME");
-  if (base.empty()) base = variable("HOME") + "/.local/state";
+  std::string home = variable("HOME");
+  if (home.empty()) home = home_of_user();
+  if (base.empty()) base = home + "/.local/state";
   return base + "/keymaster/device";
 }
 
 void device::create(const std::string& path, const device_settings& settings) {
   const std::string folder = tidy(path);
-  std::error_code failed;
-  std::filesystem::path parent = std::filesystem::path(folder).parent_path();
-  if (!parent.empty()) std::filesystem::create_directories(parent, failed);
+  make_parents(folder);
   std::string draft = folder + ".new-XXXXXX";
   if (mkdtemp(draft.data()) == nullptr) throw file_error("create", folder);
   try {
-    fill_folder(draft, settings);
+    fill_folder(device_folder(draft), settings);
     move_into_place(draft, folder);
   } catch (...) {
+    std::error_code failed;
     std::filesystem::remove_all(draft, failed);
     throw;
   }
 }
 
-device_settings device::read_settings(const std::string& folder) {
-  const std::string path = settings_path(folder);
-  auto text = read_file(path, SETTINGS_FILE_LIMIT);
-  if (!text) throw device_error(device_error::kind::NOT_FOUND, "there is no device at " + folder);
-  json document = parse_json({reinterpret_cast<const char*>(text->data()), text->size()}, path);
-  device_settings settings;
-  if (!parse_uuid(json_text(document, "id", path), &settings.id)) {
-    throw device_error(device_error::kind::DAMAGED, path + ": id is not a UUID");
-  }
-  settings.manufacturer = checked_text(document, "manufacturer", path);
-  settings.implementation_version = checked_text(document, "implementation_version", path);
-  settings.rpmb = json_flag(document, "rpmb", path);
-  settings.os_version =
-      static_cast<uint32_t>(json_number(document, "os_version", UINT32_MAX, path));
-  settings.os_patchlevel =
-      static_cast<uint32_t>(json_number(document, "os_patchlevel", UINT32_MAX, path));
-  return settings;
+device_settings device::read_settings(const std::string& path) {
+  const device_folder folder = find_device(path);
+  return parse_settings(folder,
+                        is_earlier_form(folder) ? earlier_secrets(folder) : load_secrets(folder));
 }
 
-// Locking would leave a lock file in a folder that is no device, so the settings are looked at
-// first.
-
 void device::write_settings(const std::string& path, const device_settings& settings) {
-  read_settings(path);
-  folder_lock lock(path);
-  store_settings(path, settings);
+  store_settings(take_device(path), settings);
 }
 
 void device::reboot(const std::string& path) {
-  read_settings(path);
-  folder_lock lock(path);
-  start_boot(path);
+  start_boot(take_device(path));
 }
 
 std::unique_ptr<device> device::open(const std::string& path) {
-  read_settings(path);
-  return std::unique_ptr<device>(new device(std::make_unique<state>(path)));
+  try {
+    return std::unique_ptr<device>(new device(std::make_unique<state>(path)));
+  } catch (const storage_error& error) {
+    throw device_error(error.damaged() ? device_error::kind::DAMAGED : device_error::kind::IO,
+                       path + "/storage.db: " + error.what());
+  }
 }
 
 device::device(std::unique_ptr<state> open_state) : state_(std::move(open_state)) {}
 device::~device() = default;
 
 const std::string& device::path() const {
-  return state_->path;
+  return state_->folder.path();
 }
 const device_settings& device::settings() const {
   return state_->settings;
+}
+TEE_UUID device::identity() const {
+  return identity_uuid(state_->secrets);
 }
 
 std::span<const uint8_t, device::BOOT_SEED_LENGTH> device::boot_seed() const {
@@ -209,14 +233,11 @@ object_store& device::objects() {
 bool device::has_rpmb() const {
   return state_->settings.rpmb;
 }
-
-bool device::make_rpmb() noexcept {
-  try {
-    state_->objects.make_rpmb();
-    return true;
-  } catch (const std::exception&) {
-    return false;
-  }
+std::vector<damaged_object> device::check() {
+  return state_->objects.check();
+}
+void device::forget(const object_name& name) {
+  state_->objects.forget(name);
 }
 
 }  // namespace tee

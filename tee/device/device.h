@@ -11,6 +11,9 @@
 #include <span>
 #include <stdexcept>
 #include <string>
+#include <vector>
+
+#include "tee/device/object_name.h"
 
 namespace tee {
 
@@ -18,13 +21,22 @@ class object_store;
 
 // What a device is. Strings are UTF-8 of at most 128 bytes without control characters.
 struct device_settings {
-  TEE_UUID id{};  // what gpd.tee.deviceID gives; see new_uuid() in uuid.h
+  // Fixed by create: the identity, which gpd.tee.deviceID gives to trusted applications and nothing
+  // gives to anyone else (nil: a random one; never read back), and whether the device has
+  // replay-protected storage.
+  TEE_UUID identity{};
+  bool rpmb = true;
+
+  TEE_UUID public_id{};  // what stands for the device in public; made of the identity, not set
   std::string manufacturer = "Keymaster";
   std::string implementation_version = "0.1.0";
-  bool rpmb = true;            // whether it has replay-protected storage
   uint32_t os_version = 0;     // decimal MMmmss; the tool configures the TA with it
   uint32_t os_patchlevel = 0;  // decimal YYYYMM
 };
+
+// public_id_of: the public identifier of the device with that identity. Who knows it does not know
+// the identity.
+TEE_UUID public_id_of(const TEE_UUID& identity);
 
 // Why a device could not be created, opened or changed; what() is a line for people.
 class device_error : public std::runtime_error {
@@ -34,6 +46,7 @@ class device_error : public std::runtime_error {
     EXISTS,     // something is there already
     BUSY,       // another process has the device open; what() names its process id
     DAMAGED,    // a file of the device is missing, malformed or not authentic
+    EXPOSED,    // a file is another user's or open to others; what() says what to do
     IO          // the operating system refused
   };
   device_error(kind reason, const std::string& what) : std::runtime_error(what), reason_(reason) {}
@@ -53,16 +66,16 @@ class device {
   // ~/.local/state/keymaster/device.
   static std::string default_path();
 
-  // create: makes the folder `path` (mode 0700, missing parents too) with fresh keys and an empty
-  // store. The folder appears complete or not at all. EXISTS unless nothing or an empty folder is
-  // there.
+  // create: makes the folder `path` (mode 0700, missing parents too) with fresh keys, an empty
+  // store and its replay table. The folder appears complete or not at all. EXISTS unless nothing or
+  // an empty folder is there.
   static void create(const std::string& path, const device_settings& settings);
 
   // read_settings: the settings of the device at `path`, whether or not a process has it open.
   static device_settings read_settings(const std::string& path);
 
-  // write_settings: replaces the settings of the device at `path`. BUSY while it is open. Like
-  // create, throws std::invalid_argument for texts that break the rule above.
+  // write_settings: replaces the settings of the device at `path` but for what is fixed. BUSY while
+  // it is open. Like create, throws std::invalid_argument for texts that break the rule above.
   static void write_settings(const std::string& path, const device_settings& settings);
 
   // reboot: starts a new boot of the device at `path`: a new boot seed, and system time from 0.
@@ -70,7 +83,9 @@ class device {
   static void reboot(const std::string& path);
 
   // open: takes the device for this process until the result is destroyed. Starts a new boot when
-  // the machine was rebooted since the last one.
+  // the machine was rebooted since the last one, and brings a folder of the earlier form to the
+  // present one. DAMAGED when key, identity, database or replay table are missing or not this
+  // device's; IO when the folder cannot be written.
   static std::unique_ptr<device> open(const std::string& path);
 
   device(const device&) = delete;
@@ -79,6 +94,9 @@ class device {
 
   const std::string& path() const;
   const device_settings& settings() const;
+
+  // identity: what makes the keys of a device without replay-protected storage its own. Secret.
+  TEE_UUID identity() const;
 
   // boot_seed: 32 secret bytes that stay the same for one boot.
   std::span<const uint8_t, BOOT_SEED_LENGTH> boot_seed() const;
@@ -93,12 +111,13 @@ class device {
   // objects: the persistent objects of all trusted applications.
   object_store& objects();
 
-  // has_rpmb: whether the device has replay-protected storage at all.
+  // has_rpmb: whether the device has replay-protected storage.
   bool has_rpmb() const;
 
-  // make_rpmb: makes the file system of the replay-protected storage when it is not there yet;
-  // erases nothing. False when the device has no such storage or it cannot be made.
-  bool make_rpmb() noexcept;
+  // check: the objects that fail their check; they are refused and kept. forget: one of them goes
+  // away for good, and its name can be used again. Both throw std::runtime_error.
+  std::vector<damaged_object> check();
+  void forget(const object_name& name);
 
  private:
   struct state;

@@ -1,10 +1,8 @@
-// Files of the device folder: read whole, replaced as a whole.
+// Files: owned descriptors, read whole, errors with their reason.
 #include "tee/device/files.h"
 
 #include <algorithm>
 #include <cerrno>
-#include <cstdio>
-#include <filesystem>
 #include <sys/stat.h>
 #include <system_error>
 #include <unistd.h>
@@ -16,15 +14,6 @@ namespace tee {
 namespace {
 
 constexpr size_t FIRST_READ = 4096;
-
-void write_all(int fd, std::span<const uint8_t> bytes, const std::string& path) {
-  while (!bytes.empty()) {
-    ssize_t written = write(fd, bytes.data(), bytes.size());
-    if (written < 0 && errno == EINTR) continue;
-    if (written < 0) throw file_error("write", path);
-    bytes = bytes.subspan(static_cast<size_t>(written));
-  }
-}
 
 size_t read_some(int fd, std::span<uint8_t> room, const std::string& path) {
   for (;;) {
@@ -48,14 +37,7 @@ file_descriptor::~file_descriptor() {
   if (fd_ >= 0) close(fd_);
 }
 
-std::optional<secret_bytes> read_file(const std::string& path, size_t limit) {
-  file_descriptor file(os::open_file(path.c_str(), os::open_mode::READ));
-  if (!file && (errno == ENOENT || errno == ENOTDIR)) return std::nullopt;
-  struct stat status {};
-  if (!file || fstat(file.get(), &status) != 0) throw file_error("open", path);
-  if (!S_ISREG(status.st_mode)) {
-    throw device_error(device_error::kind::DAMAGED, path + " is not a regular file");
-  }
+secret_bytes read_all(const file_descriptor& file, size_t limit, const std::string& path) {
   // Grown as it fills, since the limit may lie far above the file's size.
   secret_bytes bytes;
   size_t filled = 0;
@@ -68,21 +50,25 @@ std::optional<secret_bytes> read_file(const std::string& path, size_t limit) {
   return bytes;
 }
 
-void write_file(const std::string& path, std::span<const uint8_t> bytes) {
-  const std::string draft = path + ".new";
-  {
-    file_descriptor file(os::open_file(draft.c_str(), os::open_mode::REPLACE));
-    if (!file) throw file_error("create", draft);
-    write_all(file.get(), bytes, draft);
-    if (fsync(file.get()) != 0) throw file_error("sync", draft);
+std::optional<secret_bytes> read_file(const std::string& path, size_t limit) {
+  file_descriptor file(os::open_file(path.c_str(), os::open_mode::READ));
+  if (!file && (errno == ENOENT || errno == ENOTDIR)) return std::nullopt;
+  struct stat status {};
+  if (!file || fstat(file.get(), &status) != 0) throw file_error("open", path);
+  if (!S_ISREG(status.st_mode)) {
+    throw device_error(device_error::kind::DAMAGED, path + " is not a regular file");
   }
-  if (std::rename(draft.c_str(), path.c_str()) != 0) throw file_error("replace", path);
-  sync_folder(std::filesystem::path(path).parent_path());
+  return read_all(file, limit, path);
 }
 
-void sync_folder(const std::string& path) {
-  file_descriptor folder(os::open_folder(path.empty() ? "." : path.c_str()));
-  if (!folder || fsync(folder.get()) != 0) throw file_error("sync", path);
+void write_all(const file_descriptor& file, std::span<const uint8_t> bytes,
+               const std::string& path) {
+  while (!bytes.empty()) {
+    ssize_t written = write(file.get(), bytes.data(), bytes.size());
+    if (written < 0 && errno == EINTR) continue;
+    if (written < 0) throw file_error("write", path);
+    bytes = bytes.subspan(static_cast<size_t>(written));
+  }
 }
 
 }  // namespace tee

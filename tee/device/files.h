@@ -1,9 +1,10 @@
-// Files of the device folder: read whole, replaced as a whole.
+// Files: owned descriptors, read whole, errors with their reason.
 #pragma once
 
 #include <optional>
 #include <span>
 #include <string>
+#include <string_view>
 #include <utility>
 
 #include "tee/device/device.h"
@@ -42,16 +43,16 @@ class file_descriptor {
   int fd_ = -1;
 };
 
-// read_file: the content of the regular file `path`; nothing when there is none. DAMAGED when it is
-// longer than `limit` bytes, else file_error.
+// read_all: what is left to read of `file`. DAMAGED when that is more than `limit` bytes, else
+// file_error; `path` is what errors name.
+secret_bytes read_all(const file_descriptor& file, size_t limit, const std::string& path);
+
+// read_file: the content of the regular file `path`; nothing when there is none. Fails as read_all.
 std::optional<secret_bytes> read_file(const std::string& path, size_t limit);
 
-// write_file: makes `path` hold exactly `bytes` (mode 0600), durably. After a failure or a power
-// cut at any point it holds its old content or the new one. One writer at a time.
-void write_file(const std::string& path, std::span<const uint8_t> bytes);
-
-// sync_folder: makes the names in a folder durable.
-void sync_folder(const std::string& path);
+// write_all: appends the bytes to what was written to `file`.
+void write_all(const file_descriptor& file, std::span<const uint8_t> bytes,
+               const std::string& path);
 
 // as_bytes: the characters of a text as bytes.
 inline std::span<const uint8_t> as_bytes(std::string_view text) {

@@ -4,19 +4,29 @@
 
 namespace os {
 
+// The folder that relative paths begin in, where a call takes a folder's descriptor.
+extern const int CURRENT_FOLDER;
+
 enum class open_mode {
   READ,      // an existing file; a pipe or terminal in its place does not block
-  REPLACE,   // a new or emptied file to write, mode 0600
-  READWRITE  // a new or existing file, mode 0600
+  READ_OWN,  // the same, and the path's last part is no symbolic link
+  REPLACE,   // a new or emptied file to write, mode 0600, no symbolic link
+  CREATE     // a new file to write, mode 0600
 };
 
-// open_file, open_folder: a descriptor that is closed on exec, or -1 with errno. Symbolic links are
-// followed for reading only.
-int open_file(const char* path, open_mode mode);
-int open_folder(const char* path);
+// open_file: `path` seen from the folder `at`; a descriptor that is closed on exec, or -1 with
+// errno.
+int open_file(const char* path, open_mode mode, int at = CURRENT_FOLDER);
 
-// lock_file: takes the file for this descriptor alone (flock) without waiting; 0, or -1 with errno,
-// EWOULDBLOCK when another descriptor has it.
+// open_folder: likewise, to look up names in it.
+int open_folder(const char* path, int at = CURRENT_FOLDER);
+
+// may_write: whether the effective user may make and replace files in the open folder; false with
+// errno.
+bool may_write(int folder);
+
+// lock_file: takes the file or folder for this descriptor alone (flock) without waiting; 0, or -1
+// with errno, EWOULDBLOCK when another descriptor has it.
 int lock_file(int fd);
 
 }  // namespace os

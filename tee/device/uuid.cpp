@@ -86,6 +86,10 @@ TEE_UUID new_uuid() {
   return with_version(bytes, 4);
 }
 
+TEE_UUID custom_uuid(const uuid_bytes& bytes) {
+  return with_version(bytes, 8);
+}
+
 TEE_UUID name_based_uuid(const TEE_UUID& name_space, std::string_view name) {
   uuid_bytes prefix = to_bytes(name_space);
   std::vector<uint8_t> input(prefix.begin(), prefix.end());

@@ -32,6 +32,9 @@ TEE_UUID new_uuid();
 // std::runtime_error when libcrypto fails.
 TEE_UUID name_based_uuid(const TEE_UUID& name_space, std::string_view name);
 
+// custom_uuid: the one whose 122 free bits are these (RFC 9562 version 8).
+TEE_UUID custom_uuid(const uuid_bytes& bytes);
+
 inline bool same_uuid(const TEE_UUID& a, const TEE_UUID& b) {
   return to_bytes(a) == to_bytes(b);
 }

@@ -20,6 +20,8 @@ TEE_Result result_of(const device_error& error) {
       return TEE_ERROR_BUSY;
     case device_error::kind::DAMAGED:
       return TEE_ERROR_BAD_FORMAT;
+    case device_error::kind::EXPOSED:
+      return TEE_ERROR_ACCESS_DENIED;
     case device_error::kind::EXISTS:
     case device_error::kind::IO:
       break;

@@ -29,14 +29,14 @@ TEST_F(KmtoolSoter, DevicesAreProvisionedOnce) {
   expect({"device", "provision"}, REFUSED, "provisioned before");
 
   tee::device_settings settings;
-  settings.id = tee::new_uuid();
+  settings.identity = tee::new_uuid();
   tee::device::create(path("bare"), settings);
   expect({"--device", "bare", "soter", "check-attk"}, REFUSED, "no ATTK (-1)");
   expect({"--device", "bare", "soter", "export-attk"}, REFUSED, "kmtool device provision");
   expect({"--device", "bare", "soter", "device-id"}, REFUSED, "(-1000)");
   expect_done({"--device", "bare", "device", "provision"});
   EXPECT_EQ(run_json({"--device", "bare", "soter", "device-id"})["device_id"],
-            tee::to_text(settings.id));
+            tee::to_text(tee::public_id_of(settings.identity)));
 }
 
 TEST_F(KmtoolSoter, DocumentsAreSplitAndVerified) {

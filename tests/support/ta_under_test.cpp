@@ -80,7 +80,7 @@ ta_under_test::ta_under_test(const options& wanted)
   tee::host::set_clocks(START_SYSTEM_MS, START_REE_MS);
   tee::host::set_block_hook(inspect_freed, this);
   tee::device_settings settings;
-  settings.id = DEVICE_ID;
+  settings.identity = DEVICE_ID;
   settings.rpmb = wanted.rpmb;
   tee::device::create(path_, settings);
   EXPECT_EQ(start(), TEEC_SUCCESS) << trace_.errors();

@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <functional>
 #include <gtest/gtest.h>
+#include <map>
 #include <signal.h>
 #include <sqlite3.h>
 #include <sys/syscall.h>
@@ -11,6 +12,7 @@
 #include <unistd.h>
 
 #include "tee/device/object_store.h"
+#include "tee/device/uuid.h"
 #include "tests/tee/temp_device.h"
 
 // Calls by which this process changes files. Armed, the n-th from then on is where the power goes,
@@ -47,11 +49,12 @@ int fdatasync(int fd) {
 int ftruncate64(int fd, off64_t size) noexcept {
   return static_cast<int>(changing_call(SYS_ftruncate, fd, size));
 }
-int unlink(const char* path) noexcept {
-  return static_cast<int>(changing_call(SYS_unlink, as_long(path)));
+int unlinkat(int folder, const char* path, int flags) noexcept {
+  return static_cast<int>(changing_call(SYS_unlinkat, folder, as_long(path), flags));
 }
-int rename(const char* from, const char* to) noexcept {
-  return static_cast<int>(changing_call(SYS_rename, as_long(from), as_long(to)));
+int renameat(int from_folder, const char* from, int to_folder, const char* to) noexcept {
+  return static_cast<int>(
+      changing_call(SYS_renameat, from_folder, as_long(from), to_folder, as_long(to)));
 }
 ssize_t write(int fd, const void* data, size_t size) {
   return changing_call(SYS_write, fd, as_long(data), static_cast<long>(size));
@@ -108,42 +111,88 @@ std::string sql(const temp_device& made, const std::string& text) {
 
 class storage : public ::testing::TestWithParam<uint32_t> {
  protected:
-  storage() { made.open()->make_rpmb(); }
+  // Refused in every way, as often as one asks.
+  void expect_refused(const std::string& what) {
+    auto dev = made.open();
+    for (int look = 0; look < 2; look++)
+      EXPECT_EQ(state_of(*dev, GetParam(), "a"), "corrupt") << what;
+    EXPECT_THROW(save(*dev, GetParam(), "a", "new"), storage_error) << what;
+    EXPECT_THROW(dev->objects().remove(name_of(GetParam(), "a")), storage_error) << what;
+    const auto damaged = dev->check();
+    ASSERT_FALSE(damaged.empty()) << what;
+    EXPECT_TRUE(std::any_of(damaged.begin(), damaged.end(), [](const damaged_object& object) {
+      return object.name == name_of(GetParam(), "a");
+    })) << what;
+  }
+  void expect_fine(const std::string& state) {
+    auto dev = made.open();
+    EXPECT_EQ(state_of(*dev, GetParam(), "a"), state);
+    EXPECT_TRUE(dev->check().empty());
+  }
+
   temp_device made;
+  const std::string db = made.file("storage.db");
 };
 INSTANTIATE_TEST_SUITE_P(kinds, storage, ::testing::Values(PRIVATE, RPMB));
 
-TEST_P(storage, edited_and_swapped_rows_are_corrupt_and_removed) {
+TEST_P(storage, edited_and_swapped_rows_are_refused_and_kept) {
   const char* attacks[] = {
       "UPDATE objects SET sealed = substr(sealed, 1, length(sealed) - 1) WHERE id = x'61'",
       "UPDATE objects SET sealed = CAST(substr(sealed, 1, 14) ||"
       " CASE substr(sealed, 15, 1) WHEN x'5a' THEN x'5b' ELSE x'5a' END ||"
       " substr(sealed, 16) AS BLOB) WHERE id = x'61'",
       "UPDATE objects SET generation = generation + 1 WHERE id = x'61'",
+      "UPDATE objects SET generation = 0 WHERE id = x'61'",
+      "DELETE FROM objects WHERE id = x'61'",
+      "DELETE FROM objects",
       "DELETE FROM objects WHERE id = x'61'; UPDATE objects SET id = x'61' WHERE id = x'62'",
       "UPDATE objects SET (sealed, generation) ="
       " (SELECT sealed, generation FROM objects WHERE id = x'63') WHERE id = x'61'",
   };
-  for (const char* attack : attacks) {
-    {
-      auto dev = made.open();
-      save(*dev, GetParam(), "a", "content a");
-      save(*dev, GetParam(), "b", "content b");
-      save(*dev, GetParam() == RPMB ? PRIVATE : RPMB, "c", "content a");
-    }
-    sql(made, "DELETE FROM quarantine");
-    sql(made, attack);
+  {
     auto dev = made.open();
-    EXPECT_EQ(state_of(*dev, GetParam(), "a"), "corrupt") << attack;
-    EXPECT_EQ(state_of(*dev, GetParam(), "a"), "absent") << attack;
-    EXPECT_EQ(sql(made, "SELECT count(*) FROM quarantine"), "1") << attack;
+    save(*dev, GetParam(), "a", "content a");
+    save(*dev, GetParam(), "b", "content b");
+    save(*dev, GetParam() == RPMB ? PRIVATE : RPMB, "c", "content a");
   }
+  const std::string good = content_of(db);
+  for (const char* attack : attacks) {
+    sql(made, attack);
+    expect_refused(attack);
+    set_content(db, good);
+    expect_fine("content a");
+  }
+  sql(made, attacks[0]);
+  made.open()->forget(name_of(GetParam(), "a"));
+  expect_fine("absent");
+  save(*made.open(), GetParam(), "a", "anew");
+  expect_fine("anew");
+}
+
+TEST_P(storage, old_copies_are_refused_and_the_right_one_still_serves) {
+  std::map<std::string, std::string> copies;  // of the database, by the state of "a" in it
+  for (const char* state : {"absent", "first", "second"}) {
+    if (state != std::string("absent")) save(*made.open(), GetParam(), "a", state);
+    save(*made.open(), GetParam(), "b", state);
+    copies[state] = content_of(db);
+  }
+  for (const char* old : {"absent", "first"}) {
+    set_content(db, copies[old]);
+    expect_refused(old);
+    set_content(db, copies["second"]);
+    expect_fine("second");
+  }
+  made.open()->objects().remove(name_of(GetParam(), "a"));
+  copies["removed"] = content_of(db);
+  set_content(db, copies["second"]);
+  expect_refused("came back");
+  set_content(db, copies["removed"]);
+  expect_fine("absent");
 }
 
 TEST_P(storage, trouble_with_the_database_is_no_loss) {
   auto dev = made.open();
   save(*dev, GetParam(), "a", "kept");
-  const std::string db = made.file("storage.db");
   const std::string good = content_of(db);
 
   sqlite3* locker = nullptr;
@@ -211,51 +260,135 @@ TEST_P(storage, a_power_cut_or_a_full_disk_leaves_the_old_object_or_the_new_one)
       }
       EXPECT_EQ(sql(made, "PRAGMA integrity_check"), "ok");
     }
-    EXPECT_GT(cuts, GetParam() == RPMB ? 12 : 4);
+    EXPECT_GT(cuts, 12);
   }
 }
 
-TEST(replay_protection, old_copies_and_lost_rows_are_seen) {
-  temp_device made;
-  const std::string db = made.file("storage.db");
-  auto open = [&] {
-    auto dev = made.open();
-    EXPECT_TRUE(dev->make_rpmb());
-    return dev;
-  };
-  EXPECT_EQ(state_of(*made.open(), RPMB, "a"), "no storage");
-  save(*open(), RPMB, "a", "first");
+// A change that was cut off is settled by the object alone: an older copy in between decides
+// nothing.
+TEST_P(storage, an_old_copy_does_not_settle_a_change) {
+  save(*made.open(), GetParam(), "a", "first");
   const std::string first = content_of(db);
-  save(*open(), RPMB, "a", "second");
-  save(*open(), PRIVATE, "a", "private");
-
+  save(*made.open(), GetParam(), "a", "second");
+  pid_t child = fork();
+  if (child == 0) {
+    auto dev = made.open();
+    calls_until_cut = 12;
+    save(*dev, GetParam(), "a", "third");
+    _exit(0);
+  }
+  int status = 0;
+  waitpid(child, &status, 0);
+  ASSERT_TRUE(WIFSIGNALED(status));
+  const std::string cut = content_of(db);
   set_content(db, first);
-  EXPECT_EQ(state_of(*open(), RPMB, "a"), "corrupt");
-  EXPECT_EQ(state_of(*open(), RPMB, "a"), "absent");
-  EXPECT_EQ(state_of(*open(), PRIVATE, "a"), "absent");  // protected from edits, not from replay
+  expect_refused("first");
+  set_content(db, cut);
+  auto dev = made.open();
+  const std::string now = state_of(*dev, GetParam(), "a");
+  EXPECT_TRUE(now == "second" || now == "third") << now;
+  EXPECT_TRUE(dev->check().empty());
+}
 
-  save(*open(), RPMB, "a", "third");
-  const std::string third = content_of(db);
-  open()->objects().remove(name_of(RPMB, "a"));
-  const std::string without = content_of(db);
-  set_content(db, third);
-  EXPECT_EQ(state_of(*open(), RPMB, "a"), "corrupt");
+TEST(storage_of_a_device, is_there_or_it_does_not_open) {
+  EXPECT_EQ(state_of(*temp_device(false).open(), RPMB, "a"), "no storage");
+  EXPECT_EQ(state_of(*temp_device(false).open(), PRIVATE, "a"), "absent");
+}
 
-  save(*open(), RPMB, "a", "fourth");
-  set_content(db, without);
-  EXPECT_EQ(state_of(*open(), RPMB, "a"), "corrupt");
+// A forked child has the parent's device before its eyes and no part in it.
+TEST(storage_of_a_device, is_not_shared_with_a_forked_process) {
+  temp_device made;
+  auto dev = made.open();
+  save(*dev, PRIVATE, "a", "1");
+  pid_t child = fork();
+  if (child == 0) {
+    bool refused = state_of(*dev, PRIVATE, "a") == "unavailable";
+    try {
+      save(*dev, PRIVATE, "a", "2");
+      refused = false;
+    } catch (const storage_error&) {  // as it must be
+    }
+    _exit(refused ? 0 : 1);
+  }
+  int status = 1;
+  waitpid(child, &status, 0);
+  EXPECT_EQ(status, 0);
+  EXPECT_EQ(state_of(*dev, PRIVATE, "a"), "1");
+}
 
-  // A table that is lost, or another device's, proves nothing.
-  save(*open(), RPMB, "a", "fifth");
-  std::filesystem::rename(made.file("rpmb"), made.file("away"));
-  EXPECT_EQ(state_of(*made.open(), RPMB, "a"), "no storage");
-  EXPECT_EQ(state_of(*open(), RPMB, "a"), "corrupt");
+// What was opened is what is written, wherever it lies by now and whatever lies in its place.
+TEST(storage_of_a_device, moves_with_its_folder) {
+  temp_device made;
   temp_device other;
-  { EXPECT_TRUE(other.open()->make_rpmb()); }
-  std::filesystem::copy_file(other.file("rpmb"), made.file("rpmb"),
-                             std::filesystem::copy_options::overwrite_existing);
-  EXPECT_THROW(made.open(), device_error);
-  EXPECT_FALSE(temp_device(false).open()->make_rpmb());
+  { save(*other.open(), PRIVATE, "a", "other"); }
+  auto dev = made.open();
+  const std::string away = made.path() + ".away";
+  std::filesystem::rename(made.path(), away);
+  std::filesystem::rename(other.path(), made.path());
+  save(*dev, PRIVATE, "a", std::string(20'000, 'm'));
+  EXPECT_THROW(device::open(away), device_error);
+  EXPECT_EQ(state_of(*made.open(), PRIVATE, "a"), "other");
+  dev.reset();
+  EXPECT_EQ(state_of(*device::open(away), PRIVATE, "a"), std::string(20'000, 'm'));
+  std::filesystem::remove_all(away);
+}
+
+// tests/data/earlier_device: a device with three objects, private and replay-protected ones.
+class earlier_folder : public ::testing::Test {
+ protected:
+  earlier_folder() { put(); }
+  void put() {
+    namespace fs = std::filesystem;
+    fs::remove_all(made.path());
+    fs::copy(EARLIER_DEVICE, made.path());
+    fs::permissions(made.path(), fs::perms::owner_all);
+    for (const auto& file : fs::directory_iterator(made.path()))
+      fs::permissions(file, fs::perms::owner_read | fs::perms::owner_write);
+  }
+  temp_device made;
+};
+
+TEST_F(earlier_folder, is_brought_over_wherever_the_power_goes) {
+  for (int cuts = 1, status = 1; status != 0; cuts++) {
+    put();
+    pid_t child = fork();
+    if (child == 0) {
+      calls_until_cut = cuts;
+      made.open();
+      _exit(0);
+    }
+    waitpid(child, &status, 0);
+    EXPECT_TRUE(status == 0 || WIFSIGNALED(status)) << cuts;
+    EXPECT_TRUE(status != 0 || cuts > 20);
+    auto dev = made.open();
+    EXPECT_EQ(to_text(dev->identity()), "8e6bcb0e-0d5c-4a43-9b1c-7f2b1c2d3e4f");
+    EXPECT_EQ(dev->settings().os_version, 120000u);
+    EXPECT_TRUE(dev->has_rpmb());
+    EXPECT_TRUE(dev->check().empty()) << cuts;
+    EXPECT_EQ(sql(made, "SELECT count(*) FROM objects WHERE generation > 0"), "3");
+    for (const char* file : {"rpmb", "lock"})
+      EXPECT_FALSE(std::filesystem::exists(made.file(file))) << file;
+  }
+}
+
+TEST_F(earlier_folder, is_left_alone_when_something_is_wrong_with_it) {
+  const std::tuple<const char*, std::string> cases[] = {
+      {"rpmb", ""},
+      {"rpmb", std::string(95, 'r')},
+      {"device.key", std::string(32, 'k')},
+      {"storage.db", ""},
+      {"storage.db", std::string(16'384, 's')},
+  };
+  for (const auto& [file, damage] : cases) {
+    const std::string good = content_of(made.file(file));
+    set_content(made.file(file), damage);
+    EXPECT_THROW(made.open(), device_error) << file;
+    std::filesystem::remove(made.file(file));
+    EXPECT_THROW(made.open(), device_error) << file;
+    set_content(made.file(file), good);
+    std::filesystem::permissions(made.file(file), std::filesystem::perms(0600));
+  }
+  EXPECT_TRUE(made.open()->check().empty());
 }
 
 }  // namespace

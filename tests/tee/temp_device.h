@@ -22,7 +22,7 @@ class temp_device {
     std::string name = base / "device-test-XXXXXX";
     if (mkdtemp(name.data()) == nullptr) throw std::runtime_error("mkdtemp");
     root_ = name;
-    settings.id = {0x01020304, 0x0506, 0x0708, {9, 10, 11, 12, 13, 14, 15, 16}};
+    settings.identity = {0x01020304, 0x0506, 0x0708, {9, 10, 11, 12, 13, 14, 15, 16}};
     settings.rpmb = rpmb;
     device::create(path(), settings);
   }

@@ -164,7 +164,7 @@ verb_result demonstrate(const command_line& line) {
   demo_device device(folder);
   device.start();
   tee::device_settings settings = tee::device::read_settings(folder);
-  story.say("identity  " + tee::to_text(settings.id));
+  story.say("identity  " + tee::to_text(settings.public_id));
   story.say("system    OS version " + std::to_string(settings.os_version) + ", patch level " +
             std::to_string(settings.os_patchlevel));
 

@@ -49,10 +49,8 @@ demo_device::demo_device(const std::string& folder) : folder_(folder) {
     original_ = tee::device::read_settings(folder_);
   } catch (const tee::device_error& error) {
     if (error.reason() != tee::device_error::kind::NOT_FOUND) throw;
-    tee::device_settings fresh;
-    fresh.id = tee::new_uuid();
-    tee::device::create(folder_, fresh);
-    provision(folder_, factory_options().data(fresh));
+    tee::device::create(folder_, {});
+    provision(folder_, factory_options().data(tee::device::read_settings(folder_)));
   }
   set_version(FIRST_VERSION, FIRST_PATCHLEVEL);
 }

@@ -31,7 +31,7 @@ verb_result describe(const std::string& title, const std::string& folder,
                      const tee::device_settings& settings) {
   verb_result result;
   result.object = {{"device", folder},
-                   {"id", tee::to_text(settings.id)},
+                   {"id", tee::to_text(settings.public_id)},
                    {"manufacturer", settings.manufacturer},
                    {"implementation_version", settings.implementation_version},
                    {"rpmb", settings.rpmb},
@@ -39,7 +39,7 @@ verb_result describe(const std::string& title, const std::string& folder,
                    {"os_patchlevel", settings.os_patchlevel}};
   table lines;
   lines.row("folder", folder)
-      .row("id", tee::to_text(settings.id))
+      .row("id", tee::to_text(settings.public_id))
       .row("manufacturer", settings.manufacturer)
       .row("implementation", settings.implementation_version)
       .row("RPMB storage", settings.rpmb ? "yes" : "no")
@@ -54,11 +54,12 @@ verb_result create_device(const std::string& folder, const device_options& optio
   settings.rpmb = !options.no_rpmb;
   options.apply_versions_to(&settings);
   if (options.id.empty()) {
-    settings.id = tee::new_uuid();
-  } else if (!tee::parse_uuid(options.id, &settings.id)) {
+    settings.identity = tee::new_uuid();
+  } else if (!tee::parse_uuid(options.id, &settings.identity)) {
     throw failure(WRONG_USAGE, "--id: '" + options.id + "' is not a UUID",
                   "Its form is 00000000-0000-0000-0000-000000000000.");
   }
+  settings.public_id = tee::public_id_of(settings.identity);
   const keymaster::client::factory_data data = options.factory.data(settings);
   tee::device::create(folder, settings);
   provision(folder, data);
@@ -94,7 +95,11 @@ void add_device_verbs(CLI::App* app, command_line* line) {
 
   CLI::App* create = verb->add_subcommand("create", "Create the device's folder and provision it");
   create->add_flag("--no-rpmb", options->no_rpmb, "A device without replay-protected storage");
-  create->add_option("--id", options->id, "The device's identity (default: a random one)")
+  create
+      ->add_option(
+          "--id", options->id,
+          "The device's identity, which is secret and is not shown again (default: a random "
+          "one)")
       ->type_name("UUID");
   options->add_versions_to(create);
   options->factory.add_to(create);

@@ -47,13 +47,14 @@ void factory_options::add_to(CLI::App* verb) {
       ->type_name("FILE");
   add_text(verb, "--fp-name", &fingerprint_name, MAX_SENSOR_TEXT, "Name of the fingerprint sensor");
   add_text(verb, "--fp-version", &fingerprint_version, MAX_SENSOR_TEXT, "Version of the sensor");
-  add_text(verb, "--cpu-id", &cpu_id, MAX_CPU_ID, "CPU id (default: made of the device's id)");
+  add_text(verb, "--cpu-id", &cpu_id, MAX_CPU_ID,
+           "CPU id (default: made of the device's public id)");
   add_text(verb, "--device-id", &device_id, MAX_DEVICE_ID,
-           "Identifier that SOTER gives out (default: the device's id)");
+           "Identifier that SOTER gives out (default: the device's public id)");
 }
 
 client::factory_data factory_options::data(const tee::device_settings& settings) const {
-  const std::string id = tee::to_text(settings.id);
+  const std::string id = tee::to_text(settings.public_id);
   client::factory_data made;
   made.attk = attk_file.empty() ? client::read_rsa_numbers(new_rsa_key_data(ATTK_BITS))
                                 : read_attk(attk_file);

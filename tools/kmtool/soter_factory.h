@@ -18,7 +18,7 @@ struct factory_options {
 
   void add_to(CLI::App* verb);
   // data: with what was not given filled in: a fresh RSA-2048 key, and identifiers made of the
-  // device's identity. Throws failure (WRONG_USAGE) when the file holds no RSA-2048 key.
+  // device's public one. Throws failure (WRONG_USAGE) when the file holds no RSA-2048 key.
   keymaster::client::factory_data data(const tee::device_settings& settings) const;
 };
 

@@ -96,6 +96,48 @@ TEE_Result read_record(block* record) {
   return res;
 }
 
+// An identifier of the platform in its text form, with its terminating zero byte.
+struct id_text {
+  char text[37];
+
+  TEE_Result read(const char* property) {
+    size_t size = sizeof(text);
+    return TEE_GetPropertyAsString(TEE_PROPSET_TEE_IMPLEMENTATION, property, text, &size);
+  }
+};
+
+// Calls visit(byte, digit) for the bytes of `name` but hyphens, each with the digit of `id` at its
+// place; false unless there are as many and every visit says yes.
+template <typename F>
+bool visit_digits(field name, const id_text& id, F visit) {
+  const char* digit = id.text;
+  for (size_t i = 0; i < name.length; i++) {
+    if (name.data[i] == '-') continue;
+    while (*digit == '-')
+      digit++;
+    if (*digit == 0 || !visit(i, *digit++)) return false;
+  }
+  return *digit == 0;
+}
+
+// Early records name the device by its identity. That is key material, so the public identifier
+// goes out in its place, digit for digit. `record` is what `name` lies in.
+TEE_Result hide_identity(field name, uint8_t* record) {
+  id_text identity;
+  if (TEE_Result res = identity.read("gpd.tee.deviceID")) return res;
+  const bool is_identity = visit_digits(
+      name, identity, [&](size_t i, char digit) { return (name.data[i] | 0x20) == digit; });
+  if (!is_identity) return TEE_SUCCESS;
+  id_text shown;
+  if (TEE_Result res = shown.read("keymaster.device.publicID")) return res;
+  uint8_t* bytes = record + (name.data - record);
+  visit_digits(name, shown, [&](size_t i, char digit) {
+    bytes[i] = static_cast<uint8_t>(digit);
+    return true;
+  });
+  return TEE_SUCCESS;
+}
+
 // Writes one item of the record to `output`, whose size becomes the item's length.
 TEE_Result retrieve(item which, TEE_Param* output) {
   block record;
@@ -104,6 +146,9 @@ TEE_Result retrieve(item which, TEE_Param* output) {
   if (!parse_record(record.data(), record.size(), fields)) return TEE_ERROR_BAD_STATE;
   const field& found = fields[which];
   if (found.length == 0) return TEE_ERROR_ITEM_NOT_FOUND;
+  if (which == CPU_ID || which == DEVICE_ID) {
+    if (TEE_Result res = hide_identity(found, record.data())) return res;
+  }
   const size_t capacity = output->memref.size;
   output->memref.size = found.length;
   if (capacity < found.length) return TEE_ERROR_SHORT_BUFFER;
