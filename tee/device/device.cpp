@@ -145,6 +145,7 @@ struct device::state {
     remove_leftovers(folder);
   }
 
+  const pid_t process = getpid();
   device_folder folder;
   device_secrets secrets;
   device_settings settings;
@@ -209,6 +210,21 @@ device::~device() = default;
 
 const std::string& device::path() const {
   return state_->folder.path();
+}
+bool device::in_own_process() const {
+  return state_->process == getpid();
+}
+void device::require_at(const std::string& path) const {
+  if (!in_own_process()) {
+    throw device_error(device_error::kind::BUSY,
+                       "device " + path + " is in use by process " +
+                           std::to_string(state_->process) + ", which this one was forked from");
+  }
+  if (!state_->folder.is_at(path)) {
+    throw device_error(device_error::kind::BUSY,
+                       "another folder lies at " + path + ", and the device that was opened there "
+                       "is still open");
+  }
 }
 const device_settings& device::settings() const {
   return state_->settings;

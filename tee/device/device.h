@@ -95,6 +95,13 @@ class device {
   const std::string& path() const;
   const device_settings& settings() const;
 
+  // in_own_process: whether this is the process that opened the device. One that was forked from it
+  // has no part in the device: its store refuses every call.
+  bool in_own_process() const;
+
+  // require_at: throws BUSY unless this process can use the device and `path` still leads to it.
+  void require_at(const std::string& path) const;
+
   // identity: what makes the keys of a device without replay-protected storage its own. Secret.
   TEE_UUID identity() const;
 

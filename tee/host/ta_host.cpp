@@ -44,7 +44,10 @@ std::shared_ptr<ta_host> ta_host::open(const std::string& path) {
   std::unique_lock lock(hosts().mutex);
   for (auto found = hosts().places.find(key); found != hosts().places.end();
        found = hosts().places.find(key)) {
-    if (auto host = found->second.shared.lock()) return host;
+    if (auto host = found->second.shared.lock()) {
+      host->device_->require_at(key);
+      return host;
+    }
     hosts().ended.wait(lock);
   }
   auto host = std::make_shared<ta_host>(key, device::open(key));

@@ -4,6 +4,7 @@
 
 #include <cstring>
 #include <gtest/gtest.h>
+#include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
 
@@ -52,6 +53,35 @@ TEST_F(sessions, what_a_trusted_application_leaves_is_counted_and_reported) {
   EXPECT_NE(trace.find("1f3c5e70-0001-4a00-8000-000000000001 ended with 1 heap blocks (100 bytes)"),
             std::string::npos)
       << trace;
+}
+
+// Two users of one device, by the ways around its lock.
+TEST_F(sessions, a_device_is_not_shared_by_fork_or_by_moving_its_folder) {
+  client user(made.path(), echo::FIRST);
+  const auto try_context = [&] {
+    TEEC_Context other{};
+    const TEEC_Result res = TEEC_InitializeContext(made.path().c_str(), &other);
+    TEEC_FinalizeContext(&other);
+    return res;
+  };
+  const pid_t child = fork();
+  if (child == 0) {
+    const bool refused = user.invoke(echo::LEAK, nullptr) == TEEC_ERROR_BAD_STATE &&
+                         user.open_session(echo::SECOND) == TEEC_ERROR_BAD_STATE &&
+                         try_context() == TEEC_ERROR_BUSY;
+    _exit(refused ? 0 : 1);
+  }
+  int status = 1;
+  waitpid(child, &status, 0);
+  EXPECT_EQ(status, 0);
+
+  temp_device other;
+  std::filesystem::rename(made.path(), made.path() + ".away");
+  std::filesystem::rename(other.path(), made.path());
+  EXPECT_EQ(try_context(), TEEC_ERROR_BUSY);
+  EXPECT_EQ(user.open_session(echo::SECOND), TEEC_SUCCESS);
+  user.close_context();
+  EXPECT_EQ(try_context(), TEEC_SUCCESS);
 }
 
 TEST_F(sessions, the_callee_sees_who_calls) {
