@@ -127,7 +127,7 @@ constexpr tee_row TEE_CODES[] = {
     {0xFFFF3071, "TEE_ERROR_MAC_INVALID", ""},
     {0xFFFF3072, "TEE_ERROR_SIGNATURE_INVALID", ""},
     {0xF0100001, "TEE_ERROR_CORRUPT_OBJECT",
-     "What the device had stored was damaged or exchanged and has been taken away."},
+     "What the device has stored is damaged or exchanged; 'kmtool device check' lists it."},
     {0xF0100003, "TEE_ERROR_STORAGE_NOT_AVAILABLE",
      "The device's storage cannot be read. Look at the device folder."},
 };

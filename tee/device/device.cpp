@@ -11,6 +11,7 @@
 #include <unistd.h>
 #include <utility>
 
+#include "tee/device/backup.h"
 #include "tee/device/boot.h"
 #include "tee/device/clock.h"
 #include "tee/device/earlier_form.h"
@@ -94,22 +95,6 @@ void fill_folder(const device_folder& folder, const device_settings& settings) {
   store_key(folder, secrets);
 }
 
-void move_into_place(const std::string& draft, const std::string& folder) {
-  if (std::rename(draft.c_str(), folder.c_str()) != 0) {
-    if (errno == ENOTEMPTY || errno == EEXIST || errno == ENOTDIR) {
-      throw device_error(device_error::kind::EXISTS, folder + " exists already");
-    }
-    throw file_error("create", folder);
-  }
-  sync_folder(std::filesystem::path(folder).parent_path());
-}
-
-// The path without what does not change it, such as a slash at its end.
-std::string tidy(const std::string& path) {
-  std::filesystem::path tidied = std::filesystem::path(path).lexically_normal();
-  return tidied.has_filename() ? tidied : tidied.parent_path();
-}
-
 // The folder of a device that is there, and private.
 device_folder find_device(const std::string& path) {
   device_folder folder(path);
@@ -168,18 +153,7 @@ std::string device::default_path() {
 }
 
 void device::create(const std::string& path, const device_settings& settings) {
-  const std::string folder = tidy(path);
-  make_parents(folder);
-  std::string draft = folder + ".new-XXXXXX";
-  if (mkdtemp(draft.data()) == nullptr) throw file_error("create", folder);
-  try {
-    fill_folder(device_folder(draft), settings);
-    move_into_place(draft, folder);
-  } catch (...) {
-    std::error_code failed;
-    std::filesystem::remove_all(draft, failed);
-    throw;
-  }
+  make_device_folder(path, [&](const device_folder& draft) { fill_folder(draft, settings); });
 }
 
 device_settings device::read_settings(const std::string& path) {
@@ -190,6 +164,21 @@ device_settings device::read_settings(const std::string& path) {
 
 void device::write_settings(const std::string& path, const device_settings& settings) {
   store_settings(take_device(path), settings);
+}
+
+void device::backup(const std::string& path, const std::string& file) {
+  const state opened(path);  // so that what is kept is known to be whole
+  write_backup(opened.folder, opened.secrets.key, file);
+}
+
+void device::restore(const std::string& file, const std::string& path) {
+  make_device_folder(path, [&](const device_folder& draft) {
+    const device_key key = read_backup(file, draft);
+    const device_secrets secrets = load_secrets(draft);
+    parse_settings(draft, secrets);
+    object_store(draft, key, secrets.rpmb);
+    start_boot(draft);
+  });
 }
 
 void device::reboot(const std::string& path) {
@@ -216,14 +205,14 @@ bool device::in_own_process() const {
 }
 void device::require_at(const std::string& path) const {
   if (!in_own_process()) {
-    throw device_error(device_error::kind::BUSY,
-                       "device " + path + " is in use by process " +
-                           std::to_string(state_->process) + ", which this one was forked from");
+    throw device_error(device_error::kind::BUSY, "device " + path + " is in use by process " +
+                                                     std::to_string(state_->process) +
+                                                     ", which this one was forked from");
   }
   if (!state_->folder.is_at(path)) {
-    throw device_error(device_error::kind::BUSY,
-                       "another folder lies at " + path + ", and the device that was opened there "
-                       "is still open");
+    throw device_error(device_error::kind::BUSY, "another folder lies at " + path +
+                                                     ", and the device that was opened there "
+                                                     "is still open");
   }
 }
 const device_settings& device::settings() const {

@@ -78,6 +78,15 @@ class device {
   // it is open. Like create, throws std::invalid_argument for texts that break the rule above.
   static void write_settings(const std::string& path, const device_settings& settings);
 
+  // backup: writes everything that the device is to `file` (mode 0600, a new one: EXISTS). Whoever
+  // has the file has the device's keys. BUSY while the device is open.
+  static void backup(const std::string& path, const std::string& file);
+
+  // restore: makes the folder `path` of such a file, like create, in a new boot. The device is as
+  // it was then: of what it counted, signed or forgot since, nothing is known to it. DAMAGED when
+  // the file is not a backup or not authentic.
+  static void restore(const std::string& file, const std::string& path);
+
   // reboot: starts a new boot of the device at `path`: a new boot seed, and system time from 0.
   // BUSY while it is open.
   static void reboot(const std::string& path);

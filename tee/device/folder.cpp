@@ -149,18 +149,56 @@ std::string device_folder::path_through(const std::string& name) const {
   return "/proc/self/fd/" + std::to_string(fd_.get()) + "/" + name;
 }
 
+void sync_parent(const std::string& path) {
+  const std::filesystem::path parent = std::filesystem::path(path).parent_path();
+  file_descriptor folder(os::open_folder(parent.empty() ? "." : parent.c_str()));
+  if (!folder || fsync(folder.get()) != 0) throw file_error("sync", parent);
+}
+
+namespace {
+
+// The folders that lead to `path`.
 void make_parents(const std::string& path) {
   const std::filesystem::path parent = std::filesystem::path(path).parent_path();
   std::error_code failed;
   if (parent.empty() || std::filesystem::is_directory(parent, failed)) return;
   make_parents(parent);
   if (mkdir(parent.c_str(), 0777) != 0 && errno != EEXIST) throw file_error("create", parent);
-  sync_folder(parent.parent_path());
+  sync_parent(parent);
 }
 
-void sync_folder(const std::string& path) {
-  file_descriptor folder(os::open_folder(path.empty() ? "." : path.c_str()));
-  if (!folder || fsync(folder.get()) != 0) throw file_error("sync", path);
+void move_into_place(const std::string& draft, const std::string& folder) {
+  if (std::rename(draft.c_str(), folder.c_str()) != 0) {
+    if (errno == ENOTEMPTY || errno == EEXIST || errno == ENOTDIR) {
+      throw device_error(device_error::kind::EXISTS, folder + " exists already");
+    }
+    throw file_error("create", folder);
+  }
+  sync_parent(folder);
+}
+
+// The path without what does not change it, such as a slash at its end.
+std::string tidy(const std::string& path) {
+  std::filesystem::path tidied = std::filesystem::path(path).lexically_normal();
+  return tidied.has_filename() ? tidied : tidied.parent_path();
+}
+
+}  // namespace
+
+void make_device_folder(const std::string& path,
+                        const std::function<void(const device_folder&)>& fill) {
+  const std::string folder = tidy(path);
+  make_parents(folder);
+  std::string draft = folder + ".new-XXXXXX";
+  if (mkdtemp(draft.data()) == nullptr) throw file_error("create", folder);
+  try {
+    fill(device_folder(draft));
+    move_into_place(draft, folder);
+  } catch (...) {
+    std::error_code failed;
+    std::filesystem::remove_all(draft, failed);
+    throw;
+  }
 }
 
 }  // namespace tee

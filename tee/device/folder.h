@@ -2,6 +2,7 @@
 // that whatever is done to its path, what was opened is what is read and written.
 #pragma once
 
+#include <functional>
 #include <optional>
 #include <span>
 #include <string>
@@ -66,10 +67,13 @@ class device_folder {
   file_descriptor fd_;
 };
 
-// make_parents: makes the folders that lead to `path`, each durably. Throws file_error.
-void make_parents(const std::string& path);
+// make_device_folder: makes the folder `path` (mode 0700) with what `fill` puts into it, and the
+// folders that lead there, durably. It appears complete or not at all. EXISTS unless nothing or an
+// empty folder is there.
+void make_device_folder(const std::string& path,
+                        const std::function<void(const device_folder&)>& fill);
 
-// sync_folder: makes the names in the folder `path` (empty: the current one) durable.
-void sync_folder(const std::string& path);
+// sync_parent: makes the name `path` durable.
+void sync_parent(const std::string& path);
 
 }  // namespace tee

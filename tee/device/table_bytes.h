@@ -1,4 +1,4 @@
-// Little-endian records of the replay table's files.
+// Little-endian records, as the device's own files hold them.
 #pragma once
 
 #include "tee_internal_api.h"
@@ -13,8 +13,8 @@
 
 namespace tee {
 
-template <typename T>
-void append_number(std::vector<uint8_t>* out, T value) {
+template <typename Bytes, typename T>
+void append_number(Bytes* out, T value) {
   for (size_t i = 0; i < sizeof(T); i++)
     out->push_back(static_cast<uint8_t>(value >> (8 * i)));
 }

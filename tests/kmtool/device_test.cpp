@@ -114,4 +114,63 @@ TEST_F(KmtoolDevice, OfTheEarlierFormIsBroughtOver) {
   expect({"device", "provision"}, REFUSED, "provisioned before");
 }
 
+// A wrong storage.db costs nothing; giving up what it lacks is said and done on its own.
+TEST_F(KmtoolDevice, IsCheckedAndRepaired) {
+  expect_done({"device", "create"});
+  const std::string before = read("device/storage.db");
+  expect_done({"generate", "hmac", "-o", "k"});
+  expect_done({"sign", "k", "-i", "k", "-o", "mac"});
+  const std::string right = read("device/storage.db");
+  expect({"device", "check"}, DONE, "pass their checks");
+
+  write("device/storage.db", before);
+  for (int look = 0; look < 2; look++) {
+    expect({"show", "k"}, TEE_FAILED, "kmtool device check");
+    const json found = run_json({"device", "check"})["damaged"];
+    ASSERT_EQ(found.size(), 1U);
+    EXPECT_EQ(found[0]["object"], "key storage key");
+    EXPECT_EQ(found[0]["fault"], "its row is missing");
+  }
+  EXPECT_EQ(run({"device", "check"}).exit_code, TEE_FAILED);
+  const call_result told = run({"device", "repair"});
+  EXPECT_EQ(told.exit_code, REFUSED);
+  EXPECT_NE(told.out.find("every key"), std::string::npos);
+  write("device/storage.db", right);
+  expect({"device", "repair"}, DONE, "nothing to repair");
+  expect({"verify", "k", "-i", "k", "--signature", "mac"}, DONE);
+
+  write("device/storage.db", before);
+  expect({"device", "repair", "--forget"}, DONE, "every key");
+  expect({"device", "check"}, DONE, "pass their checks");
+  expect({"show", "k"}, REFUSED, "(-62)");
+  expect_done({"generate", "hmac", "-o", "again"});
+}
+
+TEST_F(KmtoolDevice, IsBackedUpAndRestored) {
+  expect_done({"device", "create"});
+  all_that_is_told();  // counter 1 and 2
+  expect({"device", "backup", "b"}, DONE, "has the device's keys");
+  EXPECT_EQ(fs::status(path("b")).permissions(), fs::perms(0600));
+  expect({"device", "backup", "b"}, WRONG_USAGE, "exists already");
+  expect_done({"generate", "hmac", "-o", "k"});
+  const json third = run_json({"sign", "s", "-i", "m"});
+
+  const std::string good = read("b");
+  for (const size_t size : {size_t{0}, size_t{7}, size_t{50}, good.size() / 2, good.size() - 1}) {
+    write("bad", good.substr(0, size));
+    expect({"--device", "d2", "device", "restore", "bad"}, WRONG_USAGE, "bad");
+    write("bad", good.substr(0, size) + char(~good[size]) + good.substr(size + 1));
+    expect({"--device", "d2", "device", "restore", "bad"}, WRONG_USAGE);
+  }
+  write("bad", good + "x");
+  expect({"--device", "d2", "device", "restore", "bad"}, WRONG_USAGE, "not authentic");
+  expect({"--device", "d2", "device", "restore", "nowhere"}, WRONG_USAGE, "nowhere");
+  EXPECT_FALSE(fs::exists(path("d2")));
+
+  expect({"device", "restore", "b"}, WRONG_USAGE, "exists already");
+  expect({"--device", "d2", "device", "restore", "b"}, DONE, "repeat numbers");
+  expect_done({"--device", "d2", "show", "k"});
+  EXPECT_EQ(run_json({"--device", "d2", "sign", "s", "-i", "m"})["document"], third["document"]);
+}
+
 }  // namespace

@@ -127,6 +127,7 @@ void add_device_verbs(CLI::App* app, command_line* line) {
 
   CLI::App* reboot = verb->add_subcommand("reboot", "Start a new boot of the device");
   reboot->callback([=] { line->action = [=] { return reboot_device(line->device_folder()); }; });
+  add_device_care_verbs(verb, line);
 }
 
 }  // namespace kmtool

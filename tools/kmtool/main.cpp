@@ -139,8 +139,9 @@ int run_command_line(int argc, char** argv) {
     app.parse(argc, argv);
     if (!line.action) throw failure(WRONG_USAGE, "no verb is given", "'kmtool --help' lists them.");
     check_outputs(app, line);
-    print_result(run(line), line.as_json);
-    return DONE;
+    const verb_result result = run(line);
+    print_result(result, line.as_json);
+    return result.code;
   } catch (const CLI::ParseError& error) {
     if (error.get_exit_code() == 0) return app.exit(error);  // help
     return report({WRONG_USAGE, error.what(), "'kmtool VERB --help' tells what it takes."},

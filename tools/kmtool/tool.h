@@ -41,10 +41,12 @@ inline void require(const keymaster::client::status& outcome, const std::string&
   if (!outcome.ok()) throw failure(action, outcome);
 }
 
-// What a verb has to say: the object for --json, and text for people (empty: nothing).
+// What a verb has to say: the object for --json, text for people (empty: nothing), and the code to
+// exit with.
 struct verb_result {
   json object = json::object();
   std::string text;
+  exit_code code = DONE;
 };
 
 // The command line as parsed: options of every call, and what the chosen verb will do.
@@ -59,6 +61,7 @@ struct command_line {
 
 // Each adds its verbs to the application; their actions refer to `line`, which must outlive them.
 void add_device_verbs(CLI::App* app, command_line* line);
+void add_device_care_verbs(CLI::App* device_verb, command_line* line);
 void add_key_verbs(CLI::App* app, command_line* line);
 void add_crypt_verbs(CLI::App* app, command_line* line);
 void add_export_verb(CLI::App* app, command_line* line);
