@@ -19,6 +19,7 @@ struct update_step {
   const keymaster_key_param_set_t& params;
   byte_view input;
   byte_span output;     // may be the client's shared memory: never read back
+  byte_view request;    // all of the command's input; `output` may share memory with it
   size_t consumed = 0;  // bytes taken of `input`
   size_t produced = 0;  // bytes written to `output`
 };

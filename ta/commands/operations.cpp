@@ -75,7 +75,7 @@ outcome update(command_io* io) {
   if (operation->update == nullptr) {
     return refuse(KM_ERROR_UNIMPLEMENTED, "Update not implemented");
   }
-  update_step step{.params = params, .input = input, .output = io->output};
+  update_step step{.params = params, .input = input, .output = io->output, .request = io->input};
   const outcome how = operation->update(operation.get(), &step);
   io->result = static_cast<uint32_t>(step.consumed);
   io->output_size = step.produced;

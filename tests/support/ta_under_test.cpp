@@ -49,12 +49,32 @@ testing::AssertionResult judge(bool as_wanted, const reply& answer) {
   return (as_wanted ? testing::AssertionSuccess() : testing::AssertionFailure()) << outcome.text();
 }
 
-// A copy in a heap block of exactly its size, as is the room for outputs.
-std::unique_ptr<uint8_t[]> exact_block(byte_view content) {
-  auto block = std::make_unique<uint8_t[]>(content.size());
-  std::ranges::copy(content, block.get());
-  return block;
-}
+// Input and output of a command, in heap blocks of exactly their size: one each, or one for both
+// where they share memory.
+class memory {
+ public:
+  explicit memory(const request& what) {
+    const auto at = what.output_at.value_or(0);
+    const size_t in_front = at < 0 ? static_cast<size_t>(-at) : 0;
+    const size_t behind = at < 0 ? 0 : static_cast<size_t>(at);
+    const size_t own = what.output_at
+                           ? std::max(in_front + what.input.size(), behind + what.capacity)
+                           : what.input.size();
+    block_ = std::make_unique<uint8_t[]>(own);
+    other_ = std::make_unique<uint8_t[]>(what.output_at ? 0 : what.capacity);
+    input = block_.get() + in_front;
+    output = what.output_at ? block_.get() + behind : other_.get();
+    std::fill_n(output, what.capacity, UNTOUCHED);
+    std::ranges::copy(what.input, input);
+  }
+
+  uint8_t* input;
+  uint8_t* output;
+
+ private:
+  std::unique_ptr<uint8_t[]> block_;
+  std::unique_ptr<uint8_t[]> other_;
+};
 
 }  // namespace
 
@@ -98,24 +118,24 @@ ta_under_test::~ta_under_test() {
 reply ta_under_test::send(const request& what) {
   trace_.clear();
   const uint32_t types = what.types.value_or(default_types(what.id));
-  const auto input = exact_block(what.input);
-  const auto output = exact_block(bytes(what.capacity, UNTOUCHED));
+  const memory place(what);
   client::parameter_slots slots{};
   slots[0].value = {what.a, what.b};
   if (is_memory(types, 0)) slots[0].tmpref = {};
-  if (is_memory(types, 1)) slots[1].tmpref = {input.get(), what.input.size()};
-  if (is_memory(types, 2)) slots[2].tmpref = {output.get(), what.capacity};
+  if (is_memory(types, 1)) slots[1].tmpref = {place.input, what.input.size()};
+  if (is_memory(types, 2)) slots[2].tmpref = {place.output, what.capacity};
 
   const live_counts before = counts();
   const client::status outcome = session_->invoke(what.id, types, &slots);
   reply answer{
-      outcome.tee,         outcome.origin, 0, 0, bytes(output.get(), output.get() + what.capacity),
+      outcome.tee,         outcome.origin, 0, 0, bytes(place.output, place.output + what.capacity),
       slots[2].tmpref.size};
   if (!is_memory(types, 0)) {
     answer.km_error = static_cast<int32_t>(slots[0].value.a);
     answer.b = slots[0].value.b;
   }
-  EXPECT_TRUE(std::ranges::equal(what.input, byte_view(input.get(), what.input.size())))
+  EXPECT_TRUE(what.output_at ||
+              std::ranges::equal(what.input, byte_view(place.input, what.input.size())))
       << "command " << what.id << " wrote to its input";
   account(what, answer, before);
   return answer;

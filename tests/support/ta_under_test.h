@@ -61,6 +61,8 @@ struct request {
   size_t capacity = 0;  // of the output buffer, if the command has one
   uint32_t b = 0;
   std::optional<uint32_t> types = std::nullopt;
+  // How far behind the input's first byte the output starts, when both lie in the same memory.
+  std::optional<ptrdiff_t> output_at = std::nullopt;
 };
 
 // What came back. A command is done when neither result tells of a failure.

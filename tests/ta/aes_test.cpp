@@ -136,6 +136,41 @@ TEST_F(aes, makes_and_takes_the_vectors_in_pieces_of_every_size) {
   }
 }
 
+// What two updates and finish give. The updates' outputs lie `output_at` bytes behind the start of
+// their inputs, in which four bytes of length are in front of the data.
+bytes shared(ta_under_test* ta, uint32_t purpose, const param_set& begun, byte_view blob,
+             byte_view input, size_t first, std::optional<ptrdiff_t> output_at) {
+  const uint32_t handle = ta->begun(purpose, blob, begun);
+  bytes output;
+  for (const byte_view part : {input.first(first), input.subspan(first)}) {
+    request update = step_request(command::UPDATE, handle, part, {}, part.size() + 2 * BLOCK);
+    update.output_at = output_at;
+    client::append(&output, ta->send_well(update).output());
+  }
+  client::append(&output, finished(ta->send_well(step_request(command::FINISH, handle))));
+  return output;
+}
+
+// Short texts, and one that is longer than what the TA takes into its memory at once.
+TEST_F(aes, output_may_lie_anywhere_over_the_input) {
+  for (const stream_vector& v : VECTORS) {
+    const bytes its_blob = ta.import(ANY_USE, from_hex(v.key));
+    for (const size_t blocks : {3U, 800U}) {
+      bytes plain(blocks * BLOCK);
+      for (size_t i = 0; i < plain.size(); i++)
+        plain[i] = static_cast<uint8_t>(i * i >> 4);
+      const bytes sealed = shared(&ta, ENCRYPT, v.params(), its_blob, plain, BLOCK, {});
+      for (const ptrdiff_t at : {-40, -4, 0, 3, 4, 5, 19, 20, 21, 37, 4099, 5000, 12000}) {
+        for (const size_t first : {BLOCK, 2 * BLOCK - 1, plain.size() - BLOCK}) {
+          SCOPED_TRACE(v.name + ", from byte " + std::to_string(at) + ", " + std::to_string(first));
+          EXPECT_EQ(shared(&ta, ENCRYPT, v.params(), its_blob, plain, first, at), sealed);
+          EXPECT_EQ(shared(&ta, DECRYPT, v.params(), its_blob, sealed, first, at), plain);
+        }
+      }
+    }
+  }
+}
+
 TEST_F(aes, keys_are_checked) {
   const std::string no_minimum = "No or too many KM_TAG_MIN_MAC_LENGTH";
   const std::string minimum = "Invalid KM_TAG_MIN_MAC_LENGTH ";
@@ -247,13 +282,18 @@ TEST_F(aes, updates_refuse) {
       {"little room for the block held back", DECRYPT, padded, two, first, {}, 15, 0, -41},
   };
   for (const auto& row : rows) {
-    SCOPED_TRACE(row.name);
-    const uint32_t handle = ta.begun(row.purpose, blob, row.begun);
-    EXPECT_TRUE(succeeded(ta.update(handle, row.before)));
-    const reply last =
-        ta.send(step_request(command::UPDATE, handle, row.input, row.params, row.room));
-    EXPECT_EQ(last.res, row.res);
-    EXPECT_EQ(last.km_error, row.error);
+    for (const auto output_at : {std::optional<ptrdiff_t>(), {4}}) {
+      SCOPED_TRACE(row.name);
+      const uint32_t handle = ta.begun(row.purpose, blob, row.begun);
+      EXPECT_TRUE(succeeded(ta.update(handle, row.before)));
+      request update = step_request(command::UPDATE, handle, row.input, row.params, row.room);
+      update.output_at = output_at;
+      const reply last = ta.send(update);
+      EXPECT_EQ(last.res, row.res);
+      EXPECT_EQ(last.km_error, row.error);
+      EXPECT_EQ(last.b, 0U) << "nothing is consumed";
+      EXPECT_EQ(last.output_size, 0U);
+    }
   }
 }
 
@@ -267,6 +307,9 @@ TEST_F(aes, streams_must_end_where_they_can) {
         {DECRYPT, padded, 0, -21},
         {DECRYPT, gcm, 12, -30}}) {
     EXPECT_TRUE(refused(ta.try_run(purpose, blob, params, bytes(length, 3)), error)) << length;
+    // Of padding alone it is said.
+    EXPECT_EQ(ta.trace().has("aes_decrypt_finish: Input data not align to block size"),
+              error == -21 && params.number(KM_TAG_PADDING) == KM_PAD_PKCS7 && purpose == DECRYPT);
   }
   // The front of a genuine tag is none.
   const param_set params = use(KM_MODE_GCM, KM_PAD_NONE, 96, bytes(12));

@@ -4,7 +4,7 @@
 
 #include <algorithm>
 
-#include "ta/alg/aes/aes_operation.h"
+#include "ta/alg/aes/aes_transfer.h"
 
 namespace keymaster {
 namespace {
@@ -14,62 +14,66 @@ void aes_decrypt_free(operation_t* operation) {
   free_operation<aes_decrypt_operation_t>(operation);
 }
 
-// Passes on the oldest `count` bytes that were held as the tag.
-TEE_Result feed_held(aes_decrypt_operation_t* operation, size_t count, update_step* step) {
+// How many bytes at the end of the input stay here: as much as may be the tag, or the last block of
+// a stream that fills whole blocks with it, which may be padding.
+size_t size_of_tail(const aes_decrypt_operation_t& operation, size_t input_size) {
+  if (operation.is_gcm()) return std::min(input_size, operation.tag_size());
+  const bool holds_back = operation.padding == KM_PAD_PKCS7 && !operation.ends_in_partial_block();
+  return holds_back ? std::min(input_size, AES_BLOCK_SIZE) : 0;
+}
+
+// GCM: all but the last tag_size() bytes of the stream so far are decrypted: passes on the oldest
+// bytes that were held as the tag, as many as `tail_size` new ones push out.
+TEE_Result feed_held(aes_decrypt_operation_t* operation, size_t tail_size, aes_transfer* transfer) {
+  const size_t needed = operation->tag_held + tail_size;
+  if (needed <= operation->tag_size()) return TEE_SUCCESS;
+  const size_t count = needed - operation->tag_size();
   uint8_t* tag = operation->tag;
-  TRY(aes_feed(operation, {tag, count}, step->output, &step->produced));
+  TRY(transfer->feed({tag, count}));
   std::copy(tag + count, tag + operation->tag_held, tag);
   operation->tag_held -= count;
   return TEE_SUCCESS;
 }
 
-// GCM: all but the last tag_size() bytes of the stream so far are decrypted.
-TEE_Result update_tagged(aes_decrypt_operation_t* operation, update_step* step) {
-  const byte_view input = step->input;
-  const size_t tag_size = operation->tag_size();
-  const byte_view tail = input.last(std::min(input.size(), tag_size));
-  const size_t overflow = operation->tag_held + tail.size();
-  TRY(feed_held(operation, overflow > tag_size ? overflow - tag_size : 0, step));
-  const byte_view body = input.first(input.size() - tail.size());
-  TRY(aes_feed(operation, body, step->output, &step->produced));
-  copy_bytes(byte_span(operation->tag).subspan(operation->tag_held), tail);
-  operation->tag_held += tail.size();
-  return TEE_SUCCESS;
-}
-
-// PKCS7: the block that an earlier update held back turns out not to be the last.
-keymaster_error_t release_held_block(const aes_decrypt_operation_t& operation, update_step* step) {
-  if (operation.total_input == 0 || operation.ends_in_partial_block()) return KM_ERROR_OK;
-  if (step->output.size() < AES_BLOCK_SIZE) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  copy_bytes(step->output, operation.held_block);
-  step->produced = AES_BLOCK_SIZE;
-  return KM_ERROR_OK;
-}
-
-// PKCS7: when the stream so far, this input included, fills whole blocks, the last one goes
-// straight into the operation, never through `output`, which others can write to.
-TEE_Result update_padded(aes_decrypt_operation_t* operation, update_step* step) {
-  const byte_view input = step->input;
-  const bool holds_back = !operation->ends_in_partial_block();
-  const size_t body = input.size() - (holds_back ? std::min(input.size(), AES_BLOCK_SIZE) : 0);
-  TRY(aes_feed(operation, input.first(body), step->output, &step->produced));
+// A block of padded text goes straight from the platform into the operation, never through the
+// output, which others can write to.
+TEE_Result hold_tail(aes_decrypt_operation_t* operation, byte_view tail) {
+  if (operation->is_gcm()) {
+    copy_bytes(byte_span(operation->tag).subspan(operation->tag_held), tail);
+    operation->tag_held += tail.size();
+    return TEE_SUCCESS;
+  }
   size_t held = 0;
-  return aes_feed(operation, input.subspan(body), operation->held_block, &held);
+  return aes_feed(operation, tail, operation->held_block, &held);
+}
+
+outcome decrypt_data(aes_decrypt_operation_t* operation, update_step* step) {
+  const byte_view input = step->input;
+  // PKCS7: the block that an earlier update held back turns out not to be the last.
+  const bool releases_block = operation->padding == KM_PAD_PKCS7 && operation->total_input != 0 &&
+                              !operation->ends_in_partial_block();
+  operation->data_started = true;
+  operation->total_input += input.size();
+  uint8_t room[std::max(AES_MAX_TAG_SIZE, AES_BLOCK_SIZE)];
+  const byte_span tail = byte_span(room).first(size_of_tail(*operation, input.size()));
+  copy_bytes(tail, input.last(tail.size()));
+  aes_transfer transfer(operation, step, input.first(input.size() - tail.size()));
+  TRY(transfer.start());
+  if (releases_block && !transfer.put(operation->held_block)) {
+    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+  }
+  if (operation->is_gcm()) TRY(feed_held(operation, tail.size(), &transfer));
+  TRY(transfer.feed_body());
+  return hold_tail(operation, tail);
 }
 
 outcome aes_decrypt_update(operation_t* operation, update_step* step) {
   const trace_scope scope;
   auto* record = static_cast<aes_decrypt_operation_t*>(operation);
-  step->consumed = step->input.size();
   TRY(aes_take_associated_data(record, step->params));
-  if (step->input.empty()) return DONE;
-  const bool pads = record->padding == KM_PAD_PKCS7;
-  if (pads) TRY(release_held_block(*record, step));
-  record->data_started = true;
-  record->total_input += step->input.size();
-  if (record->is_gcm()) return update_tagged(record, step);
-  if (pads) return update_padded(record, step);
-  return aes_feed(record, step->input, step->output, &step->produced);
+  if (!step->input.empty()) TRY(decrypt_data(record, step));
+  step->consumed = step->input.size();
+  return DONE;
 }
 
 // A stream shorter than a tag is refused like one with a wrong tag.
@@ -114,9 +118,11 @@ outcome aes_decrypt_finish(operation_t* operation, finish_step* step) {
   const bool pads = record->padding == KM_PAD_PKCS7;
   // The platform must not be asked to end a stream in the middle of a block; and padding is never
   // empty.
-  if ((record->mode->whole_blocks && record->ends_in_partial_block()) ||
-      (pads && record->total_input == 0)) {
+  if (pads && (record->ends_in_partial_block() || record->total_input == 0)) {
     return refuse(KM_ERROR_INVALID_INPUT_LENGTH, "Input data not align to block size");
+  }
+  if (record->mode->whole_blocks && record->ends_in_partial_block()) {
+    return KM_ERROR_INVALID_INPUT_LENGTH;
   }
   TRY(aes_end_cipher(*record));
   return pads ? strip_padding(record->held_block, &step->output) : KM_ERROR_OK;

@@ -3,7 +3,7 @@
 
 #include <array>
 
-#include "ta/alg/aes/aes_operation.h"
+#include "ta/alg/aes/aes_transfer.h"
 
 namespace keymaster {
 namespace {
@@ -13,15 +13,21 @@ void aes_encrypt_free(operation_t* operation) {
   free_operation<aes_encrypt_operation_t>(operation);
 }
 
+outcome encrypt_data(aes_encrypt_operation_t* operation, update_step* step) {
+  operation->data_started = true;
+  operation->total_input += step->input.size();
+  aes_transfer transfer(operation, step, step->input);
+  TRY(transfer.start());
+  return transfer.feed_body();
+}
+
 outcome aes_encrypt_update(operation_t* operation, update_step* step) {
   const trace_scope scope;
   auto* record = static_cast<aes_encrypt_operation_t*>(operation);
-  step->consumed = step->input.size();
   TRY(aes_take_associated_data(record, step->params));
-  if (step->input.empty()) return DONE;
-  record->data_started = true;
-  record->total_input += step->input.size();
-  return aes_feed(record, step->input, step->output, &step->produced);
+  if (!step->input.empty()) TRY(encrypt_data(record, step));
+  step->consumed = step->input.size();
+  return DONE;
 }
 
 // Fills the last block up with as many bytes as are missing, each of that value; a whole block of
