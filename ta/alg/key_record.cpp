@@ -3,6 +3,8 @@
 
 #include <array>
 
+#include "ta/alg/big_endian.h"
+
 namespace keymaster {
 namespace {
 
@@ -64,16 +66,17 @@ bool read_numbers(input_cursor* in, std::span<byte_view> numbers) {
   return true;
 }
 
-bool read_attributes(byte_view key_material, std::span<const uint32_t> ids, uint32_t* key_bits,
-                     std::span<TEE_Attribute> attributes) {
-  input_cursor in(key_material);
-  if (!in.read_u32(key_bits)) return false;
+TEE_Result number_attributes(std::span<const uint32_t> ids, std::span<const byte_view> numbers,
+                             size_t longest, std::span<TEE_Attribute> attributes) {
   for (size_t i = 0; i < ids.size(); i++) {
-    byte_view number;
-    if (!in.read_field(&number)) return false;
+    const byte_view number = without_leading_zeros(numbers[i]);
+    if (number.empty() || number.size() > longest) {
+      return fail(TEE_ERROR_BAD_PARAMETERS, "Key number %d has %dB, expect 1 to %dB",
+                  static_cast<int>(i), static_cast<int>(number.size()), static_cast<int>(longest));
+    }
     attributes[i] = ref_attribute(ids[i], number);
   }
-  return true;
+  return TEE_SUCCESS;
 }
 
 TEE_Result load_key(uint32_t object_type, uint32_t key_bits,

@@ -25,10 +25,12 @@ outcome generate_key_record(const key_form& form, const TEE_Attribute& parameter
 // read_numbers: reads numbers.size() numbers into views of the source; false when it is too short.
 [[nodiscard]] bool read_numbers(input_cursor* in, std::span<byte_view> numbers);
 
-// read_attributes: reads a record's size field and its numbers, as reference attributes `ids` that
-// point into `key_material`; `attributes` has room for them. False when the record is too short.
-[[nodiscard]] bool read_attributes(byte_view key_material, std::span<const uint32_t> ids,
-                                   uint32_t* key_bits, std::span<TEE_Attribute> attributes);
+// number_attributes: makes reference attributes `ids` of the numbers' significant bytes.
+// TEE_ERROR_BAD_PARAMETERS, traced: a number is 0, or longer than `longest` bytes. A platform may
+// end the TA that hands over such a number.
+[[nodiscard]] TEE_Result number_attributes(std::span<const uint32_t> ids,
+                                           std::span<const byte_view> numbers, size_t longest,
+                                           std::span<TEE_Attribute> attributes);
 
 // load_key: an object of the platform for operations with the key.
 [[nodiscard]] TEE_Result load_key(uint32_t object_type, uint32_t key_bits,

@@ -93,8 +93,8 @@ bytes ta_under_test::generate(const param_set& description) {
   return client::copy_of(send_well(generate_request(description)).output());
 }
 
-bytes ta_under_test::import(const param_set& description, byte_view key_data) {
-  const reply answer = send_well(import_request(description, key_data));
+bytes ta_under_test::import(const param_set& description, byte_view key_data, size_t capacity) {
+  const reply answer = send_well(import_request(description, key_data, capacity));
   client::key_result imported;
   if (answer.ok()) client::parse_imported(answer.output(), &imported);
   return imported.blob;

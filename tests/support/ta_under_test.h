@@ -149,7 +149,7 @@ class ta_under_test {
   // Commands with their usual arguments. generate and import expect success and return the blob.
   reply configure(uint32_t os_version, uint32_t os_patchlevel);
   bytes generate(const param_set& description);
-  bytes import(const param_set& description, byte_view key_data);
+  bytes import(const param_set& description, byte_view key_data, size_t capacity = AMPLE);
   // The characteristics of a key whose opening must succeed.
   param_set characteristics(byte_view blob, const client::application& app = {});
   reply begin(uint32_t purpose, byte_view blob, const param_set& params = {});

@@ -134,17 +134,30 @@ TEST_F(Ec, NumbersThatAreNoKeyAreRefusedWhenUsed) {
   const bytes x = key.number(OSSL_PKEY_PARAM_EC_PUB_X);
   const bytes y = key.number(OSSL_PKEY_PARAM_EC_PUB_Y);
   const bytes order = from_hex("ffffffff00000000ffffffffffffffffbce6faada7179e84f3b9cac2fc632551");
-  const bytes too_long(80, 0x11);
+  const bytes too_long(33, 0x11);
   const bytes zero(32);
-  const std::map<size_t, bytes> broken[] = {
-      {{0, y}, {1, x}}, {{2, x}},        {{2, zero}}, {{2, order}},
-      {{0, {}}},        {{1, {}}},       {{2, {}}},   {{0, too_long}},
-      {{1, too_long}},  {{2, too_long}}, {{0, zero}}, {{0, zero}, {1, zero}}};
-  for (const auto& replaced : broken) {
-    const bytes blob = ta.import(ANY_USE, key.import_data(replaced));
-    ta.expect_refused(begin_request(SIGN, blob, use(SHA1)), -1000,
-                      "create_ec_sign: Resolve key data failed");
+  using numbers = std::vector<std::map<size_t, bytes>>;
+  // What the platform sees, and lengths that it does not see: it may end a TA that hands them over.
+  const numbers foreign = {{{0, y}, {1, x}}, {{2, order}}, {{0, {1}}}};
+  const numbers malformed = {{{2, zero}},     {{0, {}}},
+                             {{1, {}}},       {{2, {}}},
+                             {{0, too_long}}, {{1, too_long}},
+                             {{2, too_long}}, {{0, bytes(60000, 1)}},
+                             {{0, zero}},     {{0, zero}, {1, zero}}};
+  for (const numbers* broken : {&foreign, &malformed}) {
+    for (const auto& replaced : *broken) {
+      const bytes blob = ta.import(ANY_USE, key.import_data(replaced), 2 * 60000);
+      ta.expect_refused(begin_request(SIGN, blob, use(SHA1)), -1000,
+                        "create_ec_sign: Resolve key data failed");
+      const bool is_asked = ta.trace().errors().find("TransientObject") != std::string::npos;
+      EXPECT_EQ(is_asked, broken == &foreign);
+    }
   }
+  // Zeros in front change nothing.
+  const bytes blob =
+      ta.import(ANY_USE, key.import_data({{0, right_aligned(x, 40)}, {1, right_aligned(y, 40)}}));
+  const bytes made = ta.run(SIGN, blob, use(SHA256), as_bytes("sample"));
+  EXPECT_TRUE(key.verify(SHA256, as_bytes("sample"), made));
   for (const param_set& params : {param_set(), several(KM_TAG_DIGEST, {4, 4})}) {
     ta.expect_refused(begin_request(VERIFY, imported(key), params), -38,
                       "create_ec_verify: No or too many KM_TAG_DIGEST");

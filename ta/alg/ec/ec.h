@@ -45,7 +45,8 @@ outcome ec_export_key(byte_view key_material, byte_span output, size_t* produced
 outcome ec_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key);
 
 // ec_resolve_key_data: loads key material into the platform; *curve receives the key's.
-// TEE_ERROR_GENERIC: the record is too short. -6: no curve of its size.
+// TEE_ERROR_GENERIC: the record is too short. -6: no curve of its size. TEE_ERROR_BAD_PARAMETERS: a
+// number that is 0 or longer than the curve's, or the platform finds that the numbers are no key.
 outcome ec_resolve_key_data(byte_view key_material, tee_object* key, const ec_curve_t** curve);
 
 }  // namespace keymaster

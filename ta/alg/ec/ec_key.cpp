@@ -95,16 +95,17 @@ outcome ec_export_key(byte_view key_material, byte_span output, size_t* produced
 
 outcome ec_resolve_key_data(byte_view key_material, tee_object* key, const ec_curve_t** curve) {
   const trace_scope scope;
+  input_cursor in(key_material);
   uint32_t key_bits = 0;
-  TEE_Attribute attributes[NUMBER_COUNT + 1];
-  if (!read_attributes(key_material, NUMBERS, &key_bits, attributes)) {
-    return fail(TEE_ERROR_GENERIC, "Too short input");
-  }
+  byte_view numbers[NUMBER_COUNT];
+  if (!read_record(&in, &key_bits, numbers)) return fail(TEE_ERROR_GENERIC, "Too short input");
   *curve = find_ec_curve(key_bits);
   if (*curve == nullptr) {
     return refuse(KM_ERROR_UNSUPPORTED_KEY_SIZE, "Unsupported key size %d",
                   static_cast<int>(key_bits));
   }
+  TEE_Attribute attributes[NUMBER_COUNT + 1];
+  TRY(number_attributes(NUMBERS, numbers, (*curve)->size(), attributes));
   attributes[NUMBER_COUNT] = value_attribute(TEE_ATTR_ECC_CURVE, (*curve)->tee_curve);
   return load_key(TEE_TYPE_ECDSA_KEYPAIR, key_bits, attributes, key);
 }

@@ -27,8 +27,10 @@ outcome rsa_export_key(byte_view key_material, byte_span output, size_t* produce
 // too short. -41: out of memory.
 outcome rsa_set_key_info(byte_view key_material, X509_PUBKEY* subject_public_key);
 
-// rsa_resolve_key_data: loads key material into the platform; *key_bits receives its size.
-// TEE_ERROR_GENERIC: the record is too short.
+// rsa_resolve_key_data: loads key material into the platform; *key_bits receives its size, or that
+// of the modulus where zeros stand in front of it, as whole bytes. TEE_ERROR_GENERIC: the record is
+// too short. TEE_ERROR_BAD_PARAMETERS: an even modulus, a number that is 0 or longer than the
+// modulus, or the platform finds that the numbers are no key.
 [[nodiscard]] TEE_Result rsa_resolve_key_data(byte_view key_material, tee_object* key,
                                               uint32_t* key_bits);
 

@@ -24,6 +24,7 @@ constexpr uint32_t NUMBERS[] = {
 };
 constexpr size_t MODULUS = 0;
 constexpr size_t PUBLIC_EXPONENT = 1;
+constexpr size_t PRIVATE_EXPONENT = 2;
 
 keymaster_error_t check_key_size(uint32_t key_bits) {
   if (key_bits % 8 == 0 && key_bits <= MAX_KEY_BITS) return KM_ERROR_OK;
@@ -72,6 +73,13 @@ keymaster_error_t check_import(keymaster_key_param_set_t* description,
   TRY(settle_key_bits(description, uint64_t{numbers[MODULUS].size()} * 8, key_bits));
   TRY(check_key_size(*key_bits));
   return settle_exponent(description, numbers[PUBLIC_EXPONENT]);
+}
+
+// How many numbers the platform gets: what follows the private exponent comes all or not at all.
+size_t number_count(std::span<const byte_view> numbers) {
+  const auto derived = numbers.subspan(PRIVATE_EXPONENT + 1);
+  const bool has_derived = std::ranges::any_of(derived, [](byte_view n) { return !n.empty(); });
+  return has_derived ? numbers.size() : numbers.size() - derived.size();
 }
 
 // The messages of an export name the platform's calls, and every failure leaves as -1000.
@@ -134,9 +142,19 @@ outcome rsa_export_key(byte_view key_material, byte_span output, size_t* produce
 
 TEE_Result rsa_resolve_key_data(byte_view key_material, tee_object* key, uint32_t* key_bits) {
   const trace_scope scope;
+  input_cursor in(key_material);
+  byte_view numbers[std::size(NUMBERS)];
+  if (!in.read_u32(key_bits) || !read_numbers(&in, numbers)) return TEE_ERROR_GENERIC;
+  const byte_view modulus = without_leading_zeros(numbers[MODULUS]);
+  if (modulus.empty() || modulus.back() % 2 == 0) {
+    return fail(TEE_ERROR_BAD_PARAMETERS, "RSA modulus is not odd");
+  }
+  // A key is used by its modulus' real size, which zeros in front of it do not count to.
+  if (modulus.size() < *key_bits / 8) *key_bits = static_cast<uint32_t>(modulus.size()) * 8;
+  const size_t count = number_count(numbers);
   TEE_Attribute attributes[std::size(NUMBERS)];
-  if (!read_attributes(key_material, NUMBERS, key_bits, attributes)) return TEE_ERROR_GENERIC;
-  return load_key(TEE_TYPE_RSA_KEYPAIR, *key_bits, attributes, key);
+  TRY(number_attributes(std::span(NUMBERS).first(count), numbers, *key_bits / 8, attributes));
+  return load_key(TEE_TYPE_RSA_KEYPAIR, *key_bits, std::span(attributes).first(count), key);
 }
 
 tee_object resolve_key_from_data(byte_view key_material, uint32_t* key_bits) {
