@@ -11,6 +11,7 @@ struct digest_t {
   uint32_t digest;     // KM_DIGEST_*
   uint32_t algorithm;  // TEE_ALG_*
   size_t size;         // bytes
+  size_t info_size;    // bytes of a DigestInfo in front of the digest (RFC 8017, 9.2)
 };
 
 // find_digest: the row of a KM_DIGEST_* value; null for KM_DIGEST_NONE and unknown ones.

@@ -45,9 +45,7 @@ TEE_Result soter_do_sign_finish(rsa_sign_operation_t* operation, byte_view docum
   heap_buffer made;
   if (!made.allocate(operation->key_size())) return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
   // The longest salt, whatever the digest: unlike other keys' signatures, intended.
-  const TEE_Attribute salt = value_attribute(TEE_ATTR_RSA_PSS_SALT_LENGTH, TEE_PSS_SALT_MAX_LENGTH);
-  const size_t count = operation->padding == KM_PAD_RSA_PSS ? 1 : 0;
-  TRY(sign_digest(operation->main, {&salt, count}, message.data(), &made));
+  TRY(rsa_sign_digest(*operation, TEE_PSS_SALT_MAX_LENGTH, &made));
   *signature = std::move(made);
   return TEE_SUCCESS;
 }
@@ -69,6 +67,10 @@ TEE_Result do_sign_with_rsa(TEE_ObjectHandle key, uint32_t key_bits, byte_view d
   heap_buffer made;
   if (!made.allocate(std::max(USUAL_SIGNATURE, size_t{key_bits} / 8))) {
     return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
+  }
+  // The key may be a client's, and a platform need not answer for one that is too short.
+  if (pkcs1_size(*find_digest(KM_DIGEST_SHA_2_256)) > key_bits / 8) {
+    return checked(TEE_ERROR_BAD_PARAMETERS, "AsymmetricSignDigest");
   }
   TRY(sign_digest(rsa, {}, digest, &made));
   *signature = std::move(made);

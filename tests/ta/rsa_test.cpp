@@ -226,6 +226,34 @@ TEST_F(Rsa, KeysOfEverySizeSign) {
   }
 }
 
+// A platform may end the TA that has it sign what does not fit: it is not asked. The last key's
+// modulus has a single bit in its first byte, which leaves PSS a byte less.
+TEST_F(Rsa, WhatDoesNotFitIsNotGivenToThePlatform) {
+  const pkey key_1033 = pkey::rsa(1033);
+  const scheme pss = {KM_PAD_RSA_PSS, KM_DIGEST_SHA_2_512};
+  for (const auto& [key, how] :
+       {std::pair(&KEY_512, scheme{KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA_2_384}),
+        {&KEY_512, scheme{KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA_2_512}},
+        {&key_1033, pss}}) {
+    const bytes blob = imported(*key);
+    const auto finish = [&, how = how] {
+      const uint32_t handle = ta.begun(SIGN, blob, use(how));
+      ta.update(handle, text(9));
+      return step_request(command::FINISH, handle);
+    };
+    ta.fail_each_call(TEEC_ERROR_BUSY, finish, [&](const reply& answer, bool fired) {
+      EXPECT_FALSE(ta.trace().has("rsa_sign_finish: AsymmetricSignDigest failed with 0xffff000d"));
+      EXPECT_EQ(answer.res == TEEC_ERROR_BAD_PARAMETERS, !fired);
+      EXPECT_EQ(ta.trace().has("rsa_sign_finish: AsymmetricSignDigest failed with 0xffff0006"),
+                !fired);
+    });
+    EXPECT_TRUE(refused(verify(blob, how, text(9), bytes(key->size(), 1)), -30));
+  }
+  EXPECT_TRUE(key_1033.verify(
+      {KM_PAD_RSA_PSS, KM_DIGEST_SHA_2_256}, text(9),
+      ta.run(SIGN, imported(key_1033), use({KM_PAD_RSA_PSS, KM_DIGEST_SHA_2_256}), text(9))));
+}
+
 TEST_F(Rsa, BeginWantsOnePaddingAndOneDigest) {
   const bytes blob = imported(KEY_512);
   for (const auto& [tag, name] :

@@ -5,6 +5,7 @@
 #include "tee_internal_api.h"
 
 #include <algorithm>
+#include <bit>
 
 #include "ta/alg/big_endian.h"
 
@@ -36,10 +37,22 @@ constexpr rsa_choice_t ENCRYPTION_CHOICES[] = {
       TEE_ALG_RSAES_OAEP_PLATFORM_SHA512}},
 };
 
+// The bits of the modulus in a record that holds one.
+uint32_t read_modulus_bits(byte_view key_material) {
+  input_cursor in(key_material);
+  uint32_t key_bits = 0;
+  byte_view field;
+  if (!in.read_u32(&key_bits) || !in.read_field(&field)) return 0;
+  const byte_view modulus = without_leading_zeros(field);
+  return static_cast<uint32_t>(modulus.size()) * 8 -
+         static_cast<uint32_t>(std::countl_zero(modulus.front()));
+}
+
 keymaster_error_t load(rsa_operation_t* operation, byte_view key_material) {
   if (rsa_resolve_key_data(key_material, &operation->key, &operation->key_bits) != TEE_SUCCESS) {
     return refuse(KM_ERROR_UNKNOWN_ERROR, "Resolve key data failed");
   }
+  operation->modulus_bits = read_modulus_bits(key_material);
   if (!operation->message.buffer.allocate(operation->key_bits / 8)) {
     return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }

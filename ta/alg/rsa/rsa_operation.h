@@ -16,7 +16,8 @@ struct rsa_operation_t : operation_t {
   tee_object key;
   message_t message;  // its buffer has the key's size
   uint32_t padding = KM_PAD_NONE;
-  uint32_t key_bits = 0;
+  uint32_t key_bits = 0;      // whole bytes
+  uint32_t modulus_bits = 0;  // exactly
 
   size_t key_size() const { return message.buffer.size(); }
   int missing() const { return (key ? 0 : 1) + (main ? 0 : 1) + (message.buffer ? 0 : 1); }
@@ -75,6 +76,15 @@ outcome rsa_prepare(rsa_operation_t* operation, const rsa_purpose_t& purpose,
 // rsa_build_pkcs1_block: turns the kept message into the EMSA-PKCS1-v1_5 block (RFC 8017, 9.2) in
 // which it stands for the whole DigestInfo.
 void rsa_build_pkcs1_block(rsa_operation_t* operation);
+
+// pkcs1_size: how many bytes the block of an RSASSA-PKCS1-v1_5 signature takes at least.
+size_t pkcs1_size(const digest_t& digest);
+
+// rsa_sign_digest: signs the message's digest; `salt` is a TEE_PSS_SALT_* and counts for PSS alone.
+// The signature has room for it and is cut to what was made. TEE_ERROR_BAD_PARAMETERS: the digest
+// does not fit the key, which a platform need not answer and is not asked.
+[[nodiscard]] TEE_Result rsa_sign_digest(const rsa_operation_t& operation, uint32_t salt,
+                                         heap_buffer* signature);
 
 // rsa_crypt: runs TEE_AsymmetricEncrypt or TEE_AsymmetricDecrypt on `input`; *result is made, of
 // the key's size, and *produced tells how much of it the platform has filled. -41: out of memory.

@@ -65,14 +65,22 @@ uint32_t salt_length(const rsa_sign_operation_t& operation) {
   return fits ? TEE_PSS_SALT_DIGEST_LENGTH : TEE_PSS_SALT_MAX_LENGTH;
 }
 
+// Whether the platform can build the block of a signature with this salt.
+bool fits(const rsa_operation_t& operation, uint32_t salt) {
+  const digest_t& digest = *find_digest(operation.message.digest);
+  if (operation.padding != KM_PAD_RSA_PSS) return pkcs1_size(digest) <= operation.key_size();
+  // A PSS block has a bit less than the modulus, which may be a whole byte (RFC 8017, 8.1.1).
+  const size_t block = (size_t{operation.modulus_bits} + 6) / 8;
+  const size_t salt_size = salt == TEE_PSS_SALT_DIGEST_LENGTH ? digest.size : 0;
+  return digest.size + salt_size + 2 <= block;
+}
+
 outcome sign_hashed(rsa_sign_operation_t* operation, heap_buffer* signature) {
   TRY(operation->message.finish_hash());
   if (!signature->allocate(operation->key_size())) {
     return refuse(KM_ERROR_MEMORY_ALLOCATION_FAILED, "Out of memory");
   }
-  const TEE_Attribute salt = value_attribute(TEE_ATTR_RSA_PSS_SALT_LENGTH, salt_length(*operation));
-  const size_t count = operation->padding == KM_PAD_RSA_PSS ? 1 : 0;
-  return sign_digest(operation->main, {&salt, count}, operation->message.data(), signature);
+  return rsa_sign_digest(*operation, salt_length(*operation), signature);
 }
 
 // The private-key operation on a block that is built here.
@@ -112,6 +120,18 @@ outcome rsa_sign_finish(operation_t* operation, finish_step* step) {
 }
 
 }  // namespace
+
+size_t pkcs1_size(const digest_t& digest) {
+  return PKCS1_OVERHEAD + digest.info_size + digest.size;
+}
+
+TEE_Result rsa_sign_digest(const rsa_operation_t& operation, uint32_t salt,
+                           heap_buffer* signature) {
+  if (!fits(operation, salt)) return checked(TEE_ERROR_BAD_PARAMETERS, "AsymmetricSignDigest");
+  const TEE_Attribute length = value_attribute(TEE_ATTR_RSA_PSS_SALT_LENGTH, salt);
+  const size_t count = operation.padding == KM_PAD_RSA_PSS ? 1 : 0;
+  return sign_digest(operation.main, {&length, count}, operation.message.data(), signature);
+}
 
 keymaster_error_t create_rsa_sign(const begin_request& request, operation_t** operation) {
   const trace_scope scope;
