@@ -8,6 +8,7 @@
 #include <cstring>
 #include <optional>
 #include <string_view>
+#include <variant>
 
 #include "tee/api/arguments.h"
 #include "tee/core/faults.h"
@@ -21,50 +22,88 @@ constexpr uint32_t CORE_API_VERSION = 0x01030000;  // major, minor, maintenance,
 // How hard it is to tamper with: 100, as hard as for the normal world's own software.
 constexpr uint32_t PROTECTED_BY_REE = 100;
 
-using lookup = std::optional<property_value> (*)(device&);
-struct implementation_property {
+// What is the same on every device. Versions in binary are empty: there is none but the text.
+struct fixed_property {
+  std::string_view name;
+  std::variant<const char*, bool, uint32_t> value;
+};
+constexpr fixed_property FIXED[] = {
+    {"gpd.tee.apiversion", "1.3"},
+    {"gpd.tee.internalCore.version", CORE_API_VERSION},
+    {"gpd.tee.description", "TEE on a general-purpose host"},
+    {"gpd.tee.systemTime.protectionLevel", PROTECTED_BY_REE},
+    {"gpd.tee.trustedStorage.antiRollback.protectionLevel", PROTECTED_BY_REE},
+    {"gpd.tee.trustedStorage.rollbackDetection.protectionLevel", PROTECTED_BY_REE},
+    {"gpd.tee.TAPersistentTime.protectionLevel", uint32_t{0}},
+    {"gpd.tee.cryptography.ecc", true},
+    {"gpd.tee.cryptography.nist", true},
+    {"gpd.tee.cryptography.bsi-r", false},
+    {"gpd.tee.cryptography.bsi-t", false},
+    {"gpd.tee.cryptography.ietf", false},
+    {"gpd.tee.cryptography.octa", false},
+    {"gpd.tee.trustedos.implementation.binaryversion", ""},
+    {"gpd.tee.firmware.implementation.binaryversion", ""},
+    {"gpd.tee.event.maxSources", uint32_t{0}},
+};
+
+using lookup = property_value (*)(device&);
+struct device_property {
   std::string_view name;
   lookup value;
 };
-constexpr implementation_property IMPLEMENTATION[] = {
-    {"gpd.tee.apiversion", [](device&) { return std::optional<property_value>("1.3"); }},
-    {"gpd.tee.internalCore.version",
-     [](device&) { return std::optional<property_value>(CORE_API_VERSION); }},
-    {"gpd.tee.description",
-     [](device&) { return std::optional<property_value>("TEE on a general-purpose host"); }},
-    {"gpd.tee.deviceID", [](device& dev) { return std::optional<property_value>(dev.identity()); }},
-    {"gpd.tee.systemTime.protectionLevel",
-     [](device&) { return std::optional<property_value>(PROTECTED_BY_REE); }},
-    {"gpd.tee.trustedStorage.antiRollback.protectionLevel",
-     [](device&) { return std::optional<property_value>(PROTECTED_BY_REE); }},
-    {"keymaster.device.publicID",
-     [](device& dev) { return std::optional<property_value>(dev.settings().public_id); }},
-    {"gpd.tee.trustedos.manufacturer",
-     [](device& dev) { return std::optional<property_value>(dev.settings().manufacturer); }},
-    {"gpd.tee.trustedos.implementation.version",
-     [](device& dev) {
-       return std::optional<property_value>(dev.settings().implementation_version);
-     }},
+constexpr lookup MANUFACTURER = [](device& dev) {
+  return property_value(dev.settings().manufacturer);
 };
+constexpr lookup VERSION = [](device& dev) {
+  return property_value(dev.settings().implementation_version);
+};
+// The operating system is its own firmware.
+constexpr device_property OF_DEVICE[] = {
+    {"gpd.tee.deviceID", [](device& dev) { return property_value(dev.identity()); }},
+    {"keymaster.device.publicID",
+     [](device& dev) { return property_value(dev.settings().public_id); }},
+    {"gpd.tee.trustedos.manufacturer", MANUFACTURER},
+    {"gpd.tee.firmware.manufacturer", MANUFACTURER},
+    {"gpd.tee.trustedos.implementation.version", VERSION},
+    {"gpd.tee.firmware.implementation.version", VERSION},
+};
+
+template <typename Table>
+auto find_in(const Table& table, std::string_view name) {
+  auto found = std::find_if(std::begin(table), std::end(table),
+                            [=](const auto& property) { return property.name == name; });
+  return found == std::end(table) ? nullptr : &*found;
+}
+
+std::optional<property_value> of_implementation(device& dev, std::string_view name) {
+  if (const auto* property = find_in(OF_DEVICE, name)) return property->value(dev);
+  if (const auto* property = find_in(FIXED, name)) {
+    return std::visit([](auto value) { return property_value(value); }, property->value);
+  }
+  return std::nullopt;
+}
+
+std::optional<property_value> of_client(const TEE_Identity* client, std::string_view name) {
+  if (client && name == "gpd.client.identity") return *client;
+  if (client && name == "gpd.client.endian") return LITTLE_ENDIAN_CODE;
+  return std::nullopt;
+}
 
 std::optional<property_value> find_property(const char* call, TEE_PropSetHandle set,
                                             const char* name) {
   instance& caller = current_instance(call);
   if (!name) panic(call, "name is null");
   if (set == TEE_PROPSET_TEE_IMPLEMENTATION) {
-    for (const auto& property : IMPLEMENTATION) {
-      if (property.name == name) return property.value(caller.dev());
-    }
-  } else if (set == TEE_PROPSET_CURRENT_CLIENT) {
-    bool known = caller.client() && std::string_view(name) == "gpd.client.identity";
-    if (known) return *caller.client();
-  } else if (set == TEE_PROPSET_CURRENT_TA) {
-    auto found = caller.properties().find(std::string_view(name));
-    if (found != caller.properties().end()) return found->second;
-  } else {
-    panic(call, "%p is not a property set", static_cast<void*>(set));
+    return of_implementation(caller.dev(), name);
   }
-  return std::nullopt;
+  if (set == TEE_PROPSET_CURRENT_CLIENT) {
+    return of_client(caller.client(), name);
+  }
+  if (set == TEE_PROPSET_CURRENT_TA) {
+    auto found = caller.properties().find(std::string_view(name));
+    return found == caller.properties().end() ? std::nullopt : std::optional(found->second);
+  }
+  panic(call, "%p is not a property set", static_cast<void*>(set));
 }
 
 // As much of the text as fits is there even when the room is short.

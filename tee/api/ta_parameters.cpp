@@ -20,6 +20,8 @@ ta_parameters::ta_parameters(const char* call, uint32_t types, const TEE_Param* 
     if (!is_memref(type)) continue;
     auto [buffer, size] = callers[i].memref;
     if (buffer == nullptr && size != 0) panic(call, "buffer of slot %zu is null", i);
+    if (buffer == nullptr) continue;
+    memory_[i].reserve(size + 1);  // so that no memory is null, not even that of size 0
     memory_[i].resize(size);
     const auto* bytes = static_cast<const uint8_t*>(buffer);
     if (type != TEE_PARAM_TYPE_MEMREF_OUTPUT) std::copy_n(bytes, size, memory_[i].begin());

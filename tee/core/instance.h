@@ -42,14 +42,20 @@ class instance {
   const TEE_Identity* client() const { return client_ ? &*client_ : nullptr; }
   void set_client(const TEE_Identity* client);
 
+  // holds_of_client: whether the bytes share memory with a parameter of the entry point that runs,
+  // which its client can read or change at any time.
+  bool holds_of_client(const void* data, size_t length) const;
+
   // properties: the instance's gpd.ta.* and its own properties, by full name. gpd.ta.appID is there
-  // from the start.
+  // from the start, and defaults of those that every trusted application has.
   property_map& properties() { return properties_; }
 
   // counts: what the trusted application holds at the moment.
   live_counts counts() const;
 
  private:
+  friend class instance_scope;
+
   TEE_UUID uuid_;
   device& device_;
   heap memory_;
@@ -60,20 +66,22 @@ class instance {
   handle_table<std::shared_ptr<session>> sessions_;
   session_opener* opener_;
   std::optional<TEE_Identity> client_;
+  const call_parameters* parameters_ = nullptr;  // of the entry point that runs, if it has any
   property_map properties_;
 };
 
-// Makes an instance the one that runs on this thread, for the life of the scope. Scopes nest, since
-// a trusted application may call another one.
+// Makes an instance the one that runs on this thread, in an entry point with those parameters, for
+// the life of the scope. Scopes nest, since a trusted application may call another one.
 class instance_scope {
  public:
-  explicit instance_scope(instance& running);
+  explicit instance_scope(instance& running, const call_parameters* parameters = nullptr);
   instance_scope(const instance_scope&) = delete;
   instance_scope& operator=(const instance_scope&) = delete;
   ~instance_scope();
 
  private:
   instance* outer_;
+  const call_parameters* outer_parameters_;
 };
 
 // current_instance: the one that runs on this thread; panics in the name of `call` when none does.

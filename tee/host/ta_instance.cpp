@@ -67,12 +67,12 @@ TEE_Result ta_instance::create() {
 }
 
 TEE_Result ta_instance::open_session(call_parameters* parameters, void** context) {
-  instance_scope running(core_);
+  instance_scope running(core_, parameters);
   return library_->entries().open_session(parameters->types, parameters->slots.data(), context);
 }
 
 TEE_Result ta_instance::invoke(void* context, uint32_t command, call_parameters* parameters) {
-  instance_scope running(core_);
+  instance_scope running(core_, parameters);
   return library_->entries().invoke_command(context, command, parameters->types,
                                             parameters->slots.data());
 }

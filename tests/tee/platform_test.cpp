@@ -15,6 +15,14 @@ TEST_F(platform, properties_as_text) {
   ta_.properties()["gpd.ta.dataSize"] = uint32_t{4096};
   const std::tuple<TEE_PropSetHandle, const char*, std::string> rows[] = {
       {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.trustedos.manufacturer", "Keymaster"},
+      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.firmware.manufacturer", "Keymaster"},
+      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.TAPersistentTime.protectionLevel", "0"},
+      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.trustedStorage.rollbackDetection.protectionLevel",
+       "100"},
+      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.cryptography.nist", "true"},
+      {TEE_PROPSET_TEE_IMPLEMENTATION, "gpd.tee.event.maxSources", "0"},
+      {TEE_PROPSET_CURRENT_TA, "gpd.ta.endian", "0"},
+      {TEE_PROPSET_CURRENT_CLIENT, "gpd.client.endian", "0"},
       {TEE_PROPSET_CURRENT_TA, "gpd.ta.appID", "01020304-0506-0708-090a-0b0c0d0e0f10"},
       {TEE_PROPSET_CURRENT_TA, "gpd.ta.singleInstance", "true"},
       {TEE_PROPSET_CURRENT_TA, "gpd.ta.dataSize", "4096"},

@@ -8,6 +8,7 @@
 #include <thread>
 #include <unistd.h>
 
+#include "tee/api/ta_parameters.h"
 #include "tests/tee/client.h"
 #include "tests/tee/ta_echo/echo_ta.h"
 
@@ -36,7 +37,6 @@ TEEC_Result relay(client& from, std::vector<TEE_UUID> path, std::string* identit
 
 TEST_F(sessions, what_a_trusted_application_leaves_is_counted_and_reported) {
   std::string trace;
-  host::set_trace_level(TEE_TRACE_INFO);
   host::set_trace_sink([](void* out, uint32_t, const char* line,
                           size_t length) { static_cast<std::string*>(out)->append(line, length); },
                        &trace);
@@ -49,7 +49,6 @@ TEST_F(sessions, what_a_trusted_application_leaves_is_counted_and_reported) {
     EXPECT_EQ(counts, (host::live_counts{100, 1, 0, 0, 1}));
   }
   host::set_trace_sink(nullptr, nullptr);
-  host::set_trace_level(TEE_TRACE_ERROR);
   EXPECT_NE(trace.find("1f3c5e70-0001-4a00-8000-000000000001 ended with 1 heap blocks (100 bytes)"),
             std::string::npos)
       << trace;
@@ -82,6 +81,21 @@ TEST_F(sessions, a_device_is_not_shared_by_fork_or_by_moving_its_folder) {
   EXPECT_EQ(user.open_session(echo::SECOND), TEEC_SUCCESS);
   user.close_context();
   EXPECT_EQ(try_context(), TEEC_SUCCESS);
+}
+
+// Memory of size 0 is there for the callee when it is for the caller.
+TEST_F(sessions, references_of_size_0_stay_null_or_not) {
+  uint8_t byte = 0;
+  for (void* buffer : {static_cast<void*>(&byte), static_cast<void*>(nullptr)}) {
+    for (uint32_t type : {TEE_PARAM_TYPE_MEMREF_INPUT, TEE_PARAM_TYPE_MEMREF_OUTPUT}) {
+      TEE_Param own[4] = {};
+      own[0].memref = {buffer, 0};
+      ta_parameters copies("test", type, own);
+      EXPECT_EQ(copies.for_callee()->slots[0].memref.buffer != nullptr, buffer != nullptr);
+      copies.copy_back(own);
+      EXPECT_EQ(own[0].memref.buffer, buffer);
+    }
+  }
 }
 
 TEST_F(sessions, the_callee_sees_who_calls) {
