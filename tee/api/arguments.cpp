@@ -3,6 +3,9 @@
 
 #include <algorithm>
 
+#include "tee/core/instance.h"
+#include "tee/core/profile.h"
+
 namespace tee {
 namespace {
 
@@ -19,6 +22,24 @@ TEE_Result output_buffer::fill(std::span<const uint8_t> bytes) {
   std::copy(bytes.begin(), bytes.end(), data_);
   set_length(bytes.size());
   return TEE_SUCCESS;
+}
+
+void require_own(const char* call, const char* name, const void* data, size_t length) {
+  if (current_instance(call).holds_of_client(data, length)) {
+    panic(call, "%s is in memory of the client", name);
+  }
+}
+
+void require_own_output(const char* call, const char* name, const void* data, size_t length) {
+  if (current_profile().strict) require_own(call, name, data, length);
+}
+
+void require_apart(const char* call, std::span<const uint8_t> input, const uint8_t* output,
+                   size_t output_length, same_place rule) {
+  if (!current_profile().strict || input.empty() || output_length == 0) return;
+  if (!overlap(input, output, output_length)) return;
+  if (rule == same_place::ALLOWED && input.data() == output) return;
+  panic(call, "input and output share memory");
 }
 
 steady_input::steady_input(std::span<const uint8_t> input, const uint8_t* output,

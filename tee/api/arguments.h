@@ -50,6 +50,20 @@ class output_buffer {
   size_t* length_;
 };
 
+// require_own: panics when the bytes share memory with a parameter of the entry point that runs.
+void require_own(const char* call, const char* name, const void* data, size_t length);
+
+// require_own_output: the same in the strict profile, for outputs that the standard does not let be
+// the client's.
+void require_own_output(const char* call, const char* name, const void* data, size_t length);
+
+// May input and output of a computation begin at the same place?
+enum class same_place { ALLOWED, FORBIDDEN };
+
+// require_apart: panics in the strict profile when they share memory in another way.
+void require_apart(const char* call, std::span<const uint8_t> input, const uint8_t* output,
+                   size_t output_length, same_place rule);
+
 // What a computation reads while it writes `output_length` bytes to `output`: the input in place
 // when that is safe, else a copy. In the very same place it is safe when every byte is read before
 // it is written (`same_place_is_safe`).

@@ -26,7 +26,8 @@ TEE_Result admit(const operation& op, std::span<const uint8_t> input, output_buf
 }
 
 // Puts `input`, which was admitted, through the cipher.
-void run(operation* op, std::span<const uint8_t> input, output_buffer output) {
+void run(const char* call, operation* op, std::span<const uint8_t> input, output_buffer output) {
+  tee::require_apart(call, input, output.data(), input.size(), tee::same_place::FORBIDDEN);
   tee::steady_input steady(input, output.data(), input.size(), true);
   std::get<aead>(op->engine).update(steady.bytes(), output.data());
   output.set_length(input.size());
@@ -71,7 +72,7 @@ TEE_Result TEE_AEUpdate(TEE_OperationHandle operation, const void* srcData, size
     output_buffer output(CALL, "destData", destData, destLen);
     if (TEE_Result fault = fault_point()) return fault;
     if (TEE_Result res = admit(op, input, &output)) return res;
-    run(&op, input, output);
+    run(CALL, &op, input, output);
     return TEE_SUCCESS;
   });
 }
@@ -91,7 +92,7 @@ TEE_Result TEE_AEEncryptFinal(TEE_OperationHandle operation, const void* srcData
     TEE_Result data_room = admit(op, input, &output);
     TEE_Result tag_room = tag_output.reserve(engine.tag_length());
     if (data_room || tag_room) return data_room ? data_room : tag_room;
-    run(&op, input, output);
+    run(CALL, &op, input, output);
     engine.make_tag(tag_output.data());
     tag_output.set_length(engine.tag_length());
     op.state = operation::progress::INITIAL;
@@ -110,7 +111,7 @@ TEE_Result TEE_AEDecryptFinal(TEE_OperationHandle operation, const void* srcData
     output_buffer output(CALL, "destData", destData, destLen);
     if (TEE_Result fault = fault_point()) return fault;
     if (TEE_Result res = admit(op, input, &output)) return res;
-    run(&op, input, output);
+    run(CALL, &op, input, output);
     op.state = operation::progress::INITIAL;
     if (std::get<aead>(op.engine).check_tag(tag_bytes)) return TEE_SUCCESS;
     if (!input.empty()) explicit_bzero(output.data(), input.size());

@@ -17,9 +17,11 @@ namespace {
 // Puts `input` through the cipher once there is room for all that it will give. An input that
 // shares memory with the output is read in place only where a byte is never written before it was
 // read: in the very same place with no incomplete block held.
-TEE_Result run(block_cipher* engine, std::span<const uint8_t> input, tee::output_buffer output) {
+TEE_Result run(const char* call, block_cipher* engine, std::span<const uint8_t> input,
+               tee::output_buffer output) {
   size_t length = engine->output_size(input.size());
   if (TEE_Result res = output.reserve(length)) return res;
+  tee::require_apart(call, input, output.data(), length, tee::same_place::ALLOWED);
   tee::steady_input steady(input, output.data(), length, engine->held() == 0);
   engine->update(steady.bytes(), output.data());
   output.set_length(length);
@@ -50,7 +52,7 @@ TEE_Result TEE_CipherUpdate(TEE_OperationHandle operation, const void* srcData, 
     auto input = input_bytes(CALL, "srcData", srcData, srcLen);
     tee::output_buffer output(CALL, "destData", destData, destLen);
     if (TEE_Result fault = fault_point()) return fault;
-    return run(&std::get<block_cipher>(op.engine), input, output);
+    return run(CALL, &std::get<block_cipher>(op.engine), input, output);
   });
 }
 
@@ -66,7 +68,7 @@ TEE_Result TEE_CipherDoFinal(TEE_OperationHandle operation, const void* srcData,
       panic(CALL, "the message ends inside a block");
     }
     if (TEE_Result fault = fault_point()) return fault;
-    if (TEE_Result res = run(&engine, input, output)) return res;
+    if (TEE_Result res = run(CALL, &engine, input, output)) return res;
     op.state = tee::operation::progress::INITIAL;
     return TEE_SUCCESS;
   });

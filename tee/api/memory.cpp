@@ -3,6 +3,7 @@
 
 #include "tee/core/faults.h"
 #include "tee/core/instance.h"
+#include "tee/core/profile.h"
 
 using tee::current_instance;
 using tee::guarded;
@@ -25,12 +26,18 @@ void* allocate(const char* call, Allocate&& from_heap) {
 }  // namespace
 
 void* TEE_Malloc(size_t size, uint32_t hint) {
-  bool zero = (hint & TEE_MALLOC_NO_FILL) == 0;
+  constexpr uint32_t KNOWN_HINTS = TEE_MALLOC_NO_FILL | TEE_MALLOC_NO_SHARE;
+  const bool strict = tee::current_profile().strict;
+  if (strict && (hint & ~KNOWN_HINTS) != 0) tee::panic("TEE_Malloc", "hint 0x%x is unknown", hint);
+  const bool zero = strict ? hint == TEE_MALLOC_FILL_ZERO : (hint & TEE_MALLOC_NO_FILL) == 0;
   return allocate("TEE_Malloc", [=](tee::heap& heap) { return heap.allocate(size, zero); });
 }
 
 void* TEE_Realloc(void* buffer, size_t newSize) {
-  return allocate("TEE_Realloc", [=](tee::heap& heap) { return heap.resize(buffer, newSize); });
+  // That more room is zero is promised by nobody.
+  const bool zero = !tee::current_profile().strict;
+  return allocate("TEE_Realloc",
+                  [=](tee::heap& heap) { return heap.resize(buffer, newSize, zero); });
 }
 
 void TEE_Free(void* buffer) {

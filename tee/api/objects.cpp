@@ -4,13 +4,16 @@
 #include <vector>
 
 #include "tee/api/arguments.h"
+#include "tee/api/operations.h"
 #include "tee/core/faults.h"
 #include "tee/core/instance.h"
 #include "tee/core/object.h"
 #include "tee/core/persistent_stream.h"
+#include "tee/core/profile.h"
 #include "tee/crypto/algorithms.h"
 
 using tee::current_instance;
+using tee::current_profile;
 using tee::fault_point;
 using tee::guarded;
 using tee::object;
@@ -65,13 +68,27 @@ object& empty_object(const char* call, TEE_ObjectHandle handle) {
 }
 
 // Which size the trusted application may not go beyond is its own business only where it hands over
-// one secret; the numbers of a key pair often come from a client.
-void check_secret_size(const char* call, const object& target, const attribute_list& attributes) {
-  if (!attributes.type().symmetric()) return;
-  size_t length = attributes.views().front().bytes.size();
-  if (length > target.max_bits / 8) {
-    panic(call, "a secret of %zu bytes exceeds the object's %u bits", length, target.max_bits);
+// one secret; the numbers of a key pair often come from a client, and a lenient platform looks at
+// their values.
+void check_sizes(const char* call, const object& target, const attribute_list& attributes) {
+  if (!attributes.type().symmetric() && !current_profile().strict) return;
+  for (const attribute_view& given : attributes.views()) {
+    if (given.bytes.size() > (size_t{target.max_bits} + 7) / 8) {
+      panic(call, "an attribute of %zu bytes exceeds the object's %u bits", given.bytes.size(),
+            target.max_bits);
+    }
   }
+}
+
+// The results of the calls that make keys tell of wrong parameters alone, so a strict platform
+// panics for lack of memory, and no such fault can be asked of it.
+TEE_Result key_fault_point() {
+  return current_profile().strict ? TEE_SUCCESS : fault_point();
+}
+
+TEE_Result key_result(const char* call, TEE_Result result) {
+  if (result == TEE_ERROR_OUT_OF_MEMORY && current_profile().strict) panic(call, "out of memory");
+  return result;
 }
 
 // The readable attribute behind the arguments of a getter; null when the object does not have it.
@@ -113,7 +130,7 @@ TEE_Result TEE_AllocateTransientObject(uint32_t objectType, uint32_t maxObjectSi
     *object = TEE_HANDLE_NULL;
     if (TEE_Result fault = fault_point()) return fault;
     const key_type* type = find_key_type(objectType);
-    if (!type || !type->allows(maxObjectSize)) return TEE_ERROR_NOT_SUPPORTED;
+    if (!type || !tee::offers(*type, maxObjectSize)) return TEE_ERROR_NOT_SUPPORTED;
     *object = running.objects().emplace(tee::object{objectType, maxObjectSize});
     return *object ? TEE_SUCCESS : TEE_ERROR_OUT_OF_MEMORY;
   });
@@ -139,20 +156,21 @@ void TEE_CloseObject(TEE_ObjectHandle object) {
 TEE_Result TEE_PopulateTransientObject(TEE_ObjectHandle object, const TEE_Attribute* attrs,
                                        uint32_t attrCount) {
   constexpr const char* CALL = "TEE_PopulateTransientObject";
-  return guarded(CALL, [&]() -> TEE_Result {
+  const TEE_Result result = guarded(CALL, [&]() -> TEE_Result {
     tee::object& target = empty_object(CALL, object);
     auto attributes =
         arrange(CALL, *find_key_type(target.type), checked_list(CALL, attrs, attrCount));
-    check_secret_size(CALL, target, attributes);
-    if (TEE_Result fault = fault_point()) return fault;
+    check_sizes(CALL, target, attributes);
+    if (TEE_Result fault = key_fault_point()) return fault;
     return current_instance(CALL).keys().load(attributes, target.max_bits, &target.key);
   });
+  return key_result(CALL, result);
 }
 
 TEE_Result TEE_GenerateKey(TEE_ObjectHandle object, uint32_t keySize, const TEE_Attribute* params,
                            uint32_t paramCount) {
   constexpr const char* CALL = "TEE_GenerateKey";
-  return guarded(CALL, [&]() -> TEE_Result {
+  const TEE_Result result = guarded(CALL, [&]() -> TEE_Result {
     tee::object& target = empty_object(CALL, object);
     const key_type& type = *find_key_type(target.type);
     if (keySize > target.max_bits || !type.allows(keySize)) {
@@ -162,13 +180,14 @@ TEE_Result TEE_GenerateKey(TEE_ObjectHandle object, uint32_t keySize, const TEE_
     std::vector<attribute_view> parameters;
     for (const TEE_Attribute& given : checked_list(CALL, params, paramCount))
       parameters.push_back(view_of(CALL, given));
-    if (TEE_Result fault = fault_point()) return fault;
+    if (TEE_Result fault = key_fault_point()) return fault;
     if (TEE_Result res = tee::crypto::generate_key(target.type, keySize, parameters, &target.key)) {
       return res;
     }
     current_instance(CALL).keys().add(target.key);
     return TEE_SUCCESS;
   });
+  return key_result(CALL, result);
 }
 
 TEE_Result TEE_GetObjectBufferAttribute(TEE_ObjectHandle object, uint32_t attributeID, void* buffer,
@@ -188,6 +207,7 @@ TEE_Result TEE_GetObjectInfo1(TEE_ObjectHandle object, TEE_ObjectInfo* objectInf
   return guarded(CALL, [&]() -> TEE_Result {
     const tee::object& from = current_instance(CALL).objects().get(object, CALL);
     if (!objectInfo) panic(CALL, "objectInfo is null");
+    tee::require_own_output(CALL, "objectInfo", objectInfo, sizeof(*objectInfo));
     if (TEE_Result fault = fault_point()) return fault;
     *objectInfo = {};
     objectInfo->objectType = from.type;

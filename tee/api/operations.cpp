@@ -7,6 +7,7 @@
 #include "tee/core/faults.h"
 #include "tee/core/instance.h"
 #include "tee/core/object.h"
+#include "tee/core/profile.h"
 
 using tee::current_instance;
 using tee::fault_point;
@@ -38,6 +39,12 @@ operation& running_operation_of(const char* call, TEE_OperationHandle handle, fa
   return found;
 }
 
+bool offers(const crypto::key_type& type, uint32_t bits) {
+  constexpr uint32_t STRICT_RSA_BITS = 4096;
+  const bool rsa = type.has(TEE_ATTR_RSA_MODULUS);
+  return type.allows(bits) && (!rsa || bits <= STRICT_RSA_BITS || !current_profile().strict);
+}
+
 void require_mode(const char* call, const operation& op, uint32_t mode) {
   if (op.mode != mode) panic(call, "operation is of mode %u, not %u", op.mode, mode);
 }
@@ -50,11 +57,13 @@ bool is_public(uint32_t mode) {
   return mode == TEE_MODE_ENCRYPT || mode == TEE_MODE_VERIFY || mode == TEE_MODE_EXPORT;
 }
 
-// Whether keys of up to that size go with the algorithm; 0 stands for any.
+// Whether keys of up to that size go with the algorithm; 0 stands for any, to a lenient platform
+// and for export.
 bool size_fits(const algorithm& row, uint32_t mode, uint32_t max_bits) {
-  if (row.kind == family::DIGEST || mode == TEE_MODE_EXPORT || max_bits == 0) return true;
-  if (row.kind == family::ECDSA) return max_bits == row.curve_bits;
-  return tee::crypto::find_key_type(row.key_type)->allows(max_bits);
+  if (row.kind == family::DIGEST || mode == TEE_MODE_EXPORT) return true;
+  if (max_bits == 0 && !tee::current_profile().strict) return true;
+  if (row.curve_bits != 0) return max_bits == row.curve_bits;
+  return tee::offers(*tee::crypto::find_key_type(row.key_type), max_bits);
 }
 
 bool type_fits(const operation& op, uint32_t key_type) {
@@ -63,7 +72,7 @@ bool type_fits(const operation& op, uint32_t key_type) {
 }
 
 bool size_fits(const operation& op, uint32_t key_bits) {
-  if (op.algorithm.kind == family::ECDSA) return key_bits == op.algorithm.curve_bits;
+  if (op.algorithm.curve_bits != 0) return key_bits == op.algorithm.curve_bits;
   return op.max_bits == 0 || key_bits <= op.max_bits;
 }
 

@@ -17,6 +17,9 @@ operation& keyed_operation_of(const char* call, TEE_OperationHandle handle, cryp
 // running_operation_of: likewise, between its init and its final.
 operation& running_operation_of(const char* call, TEE_OperationHandle handle, crypto::family kind);
 
+// offers: whether the platform has keys of that type and size.
+bool offers(const crypto::key_type& type, uint32_t bits);
+
 // require_mode: panics unless the operation was allocated for that mode.
 void require_mode(const char* call, const operation& op, uint32_t mode);
 

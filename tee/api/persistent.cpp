@@ -30,6 +30,7 @@ tee::object_name checked_name(const char* call, uint32_t storage, const void* id
   }
   if ((flags & ~allowed_flags) != 0) panic(call, "flags 0x%x hold unknown bits", flags);
   auto bytes = tee::input_bytes(call, "objectID", id, id_length);
+  tee::require_own(call, "objectID", id, id_length);
   tee::uuid_bytes owner = tee::to_bytes(tee::current_instance(call).uuid());
   return {storage, owner, {bytes.begin(), bytes.end()}};
 }
@@ -63,7 +64,7 @@ TEE_Result take_attributes(const char* call, const stored_object& stored, object
 stored_object content_of(const char* call, TEE_ObjectHandle attributes, const void* data,
                          size_t length) {
   stored_object content;
-  content.usage = tee::ALL_USAGES;
+  content.usage = TEE_USAGE_DEFAULT;
   if (attributes != TEE_HANDLE_NULL) {
     const object& source = tee::current_instance(call).objects().get(attributes, call);
     if (!source.initialized()) panic(call, "attributes is an uninitialised object");
@@ -125,15 +126,17 @@ TEE_Result TEE_CreatePersistentObject(uint32_t storageID, const void* objectID, 
   return guarded(CALL, [&]() -> TEE_Result {
     auto name = checked_name(CALL, storageID, objectID, objectIDLen, flags,
                              ACCESS_FLAGS | SHARE_FLAGS | TEE_DATA_FLAG_OVERWRITE);
-    if (object == nullptr) panic(CALL, "object is null");
-    *object = TEE_HANDLE_NULL;
+    if (object != nullptr) *object = TEE_HANDLE_NULL;
     if (TEE_Result res = fault_point()) return res;
     if (initialDataLen > tee::STREAM_LIMIT) return TEE_ERROR_STORAGE_NO_SPACE;
     auto content = content_of(CALL, attributes, initialData, initialDataLen);
-    return open_with_handle(CALL, object, [&](auto* stream) {
+    const auto create = [&](std::shared_ptr<persistent_stream>* stream) {
       return persistent_stream::create(tee::current_instance(CALL).dev(), name, flags,
                                        std::move(content), stream);
-    });
+    };
+    if (object != nullptr) return open_with_handle(CALL, object, create);
+    std::shared_ptr<persistent_stream> stored;  // and closed again
+    return create(&stored);
   });
 }
 
@@ -156,6 +159,7 @@ TEE_Result TEE_ReadObjectData(TEE_ObjectHandle object, void* buffer, size_t size
     persistent_stream& stream = stream_of(CALL, object, TEE_DATA_FLAG_ACCESS_READ);
     if (count == nullptr) panic(CALL, "count is null");
     if (buffer == nullptr && size != 0) panic(CALL, "buffer is null");
+    tee::require_own_output(CALL, "buffer", buffer, size);
     *count = 0;
     if (TEE_Result res = fault_point()) return res;
     *count = stream.read({static_cast<uint8_t*>(buffer), size});

@@ -11,6 +11,7 @@ void TEE_GenerateRandom(void* randomBuffer, size_t randomBufferLen) {
   tee::guarded(CALL, [&] {
     tee::current_instance(CALL);
     tee::input_bytes(CALL, "randomBuffer", randomBuffer, randomBufferLen);
+    tee::require_own_output(CALL, "randomBuffer", randomBuffer, randomBufferLen);
     tee::crypto::fill_random({static_cast<uint8_t*>(randomBuffer), randomBufferLen});
   });
 }

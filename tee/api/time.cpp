@@ -1,12 +1,14 @@
 // TEE_GetSystemTime, TEE_GetREETime: the device's two clocks.
 #include "tee_internal_api.h"
 
+#include "tee/api/arguments.h"
 #include "tee/core/instance.h"
 
 namespace {
 
 TEE_Time* checked(const char* call, TEE_Time* time) {
   if (!time) tee::panic(call, "time is null");
+  tee::require_own_output(call, "time", time, sizeof(*time));
   return time;
 }
 

@@ -33,6 +33,10 @@ size_t spread(const void* block) {
   return static_cast<size_t>((number * 0x9E3779B97F4A7C15U) >> 32);
 }
 
+size_t charge_of(size_t size) {
+  return size > 0 ? size : heap::EMPTY_CHARGE;
+}
+
 void wipe_and_free(void* block, size_t size) {
   show(block_stage::RELEASED, block, size);
   if (size > 0) explicit_bzero(block, size);
@@ -63,7 +67,7 @@ inline size_t heap::live_slot(const char* call, const void* block) const {
 // moves into it.
 inline void heap::erase(size_t gap) {
   entry* table = table_.data();
-  bytes_ -= table[gap].size;
+  bytes_ -= charge_of(table[gap].size);
   --count_;
   const size_t mask = table_.size() - 1;
   for (size_t slot = (gap + 1) & mask; table[slot].block; slot = (slot + 1) & mask) {
@@ -81,22 +85,22 @@ heap::~heap() {
 }
 
 void* heap::allocate(size_t size, bool zero) {
-  if (size > limit_ - bytes_) return nullptr;
+  if (charge_of(size) > limit_ - bytes_) return nullptr;
   if ((count_ + 1) * 2 > table_.size()) grow();
   // calloc would pass by the allocator's cache of freed blocks.
   void* block = std::malloc(size);
   if (!block) return nullptr;
   if (size > 0) std::memset(block, zero ? 0 : UNFILLED, size);
   table_[slot_of(block)] = {block, size};
-  bytes_ += size;
+  bytes_ += charge_of(size);
   ++count_;
   return block;
 }
 
-void* heap::resize(void* block, size_t size) {
+void* heap::resize(void* block, size_t size, bool zero) {
   if (!block) return allocate(size, true);
   const size_t old_size = table_[live_slot("TEE_Realloc", block)].size;
-  void* moved = allocate(size, true);
+  void* moved = allocate(size, zero);
   if (!moved) return nullptr;
   if (size_t kept = std::min(old_size, size); kept > 0) std::memcpy(moved, block, kept);
   release(block);

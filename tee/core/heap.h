@@ -17,7 +17,10 @@ void set_block_hook(block_hook hook, void* context);
 
 class heap {
  public:
-  // `limit` bounds the sum of the live blocks' sizes, in bytes.
+  static constexpr size_t EMPTY_CHARGE = 16;
+
+  // `limit` bounds what the live blocks are charged, in bytes: their sizes, EMPTY_CHARGE for a
+  // block of size 0.
   explicit heap(size_t limit) : limit_(limit) {}
   heap(const heap&) = delete;
   heap& operator=(const heap&) = delete;
@@ -27,10 +30,10 @@ class heap {
   // block of size 0 is a unique address that must not be dereferenced.
   void* allocate(size_t size, bool zero);
 
-  // resize: as TEE_Realloc; the new part is zero-filled. Null, and the old block untouched, when
-  // the limit would be passed (both blocks count while the content moves). Panics for an address
-  // that is no live block.
-  void* resize(void* block, size_t size);
+  // resize: as TEE_Realloc; the new part is filled as by allocate. Null, and the old block
+  // untouched, when the limit would be passed (both blocks count while the content moves). Panics
+  // for an address that is no live block.
+  void* resize(void* block, size_t size, bool zero);
 
   // release: wipes and frees. Null has no effect; panics for an address that is no live block.
   void release(void* block);

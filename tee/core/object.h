@@ -12,12 +12,10 @@ namespace tee {
 
 class persistent_stream;  // data stream, identifier and access rights of an open persistent object
 
-constexpr uint32_t ALL_USAGES = 0x7F;
-
 struct object {
-  uint32_t type = 0;            // TEE_TYPE_
-  uint32_t max_bits = 0;        // largest key it may take
-  uint32_t usage = ALL_USAGES;  // TEE_USAGE_ bits
+  uint32_t type = 0;                   // TEE_TYPE_
+  uint32_t max_bits = 0;               // largest key it may take
+  uint32_t usage = TEE_USAGE_DEFAULT;  // TEE_USAGE_ bits
   // The key, shared with the operations that were given it; null while the object is uninitialised
   // and in pure data objects.
   crypto::key_ptr key{};

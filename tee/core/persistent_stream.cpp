@@ -31,6 +31,7 @@ bool conflict(uint32_t a, uint32_t b) {
   uint32_t either = a | b;
   uint32_t both = a & b;
   if ((either & TEE_DATA_FLAG_ACCESS_WRITE_META) != 0) return true;
+  if ((a & SHARE_FLAGS) == 0 || (b & SHARE_FLAGS) == 0) return true;
   if (((a ^ b) & SHARE_FLAGS) != 0) return true;
   if ((either & TEE_DATA_FLAG_ACCESS_READ) != 0 && (both & TEE_DATA_FLAG_SHARE_READ) == 0) {
     return true;

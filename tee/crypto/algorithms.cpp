@@ -31,8 +31,13 @@ constexpr algorithm rsa_row(uint32_t id, family kind, rsa_padding padding, hash 
   uint32_t modes = (kind == family::RSA_SIGNATURE ? SIGNS : CRYPTS) | more_modes;
   return {id, kind, modes, RSA, h, block_mode::NONE, padding};
 }
+// Named by its curve, for digests of any length.
 constexpr algorithm ecdsa_row(uint32_t id, uint32_t bits) {
   return {id, family::ECDSA, SIGNS, EC, hash::NONE, block_mode::NONE, rsa_padding::NONE, bits};
+}
+// Named by its digest, for keys on any curve.
+constexpr algorithm ecdsa_row(uint32_t id, hash h) {
+  return {id, family::ECDSA, SIGNS, EC, h};
 }
 
 // Sorted by identifier.
@@ -77,16 +82,21 @@ constexpr std::array ALGORITHMS{
     rsa_row(TEE_ALG_RSAES_OAEP_PLATFORM_SHA512, family::RSA_ENCRYPTION, rsa_padding::OAEP,
             hash::SHA512),
     ecdsa_row(TEE_ALG_ECDSA_P192, 192),
+    ecdsa_row(TEE_ALG_ECDSA_SHA1, hash::SHA1),
     rsa_row(TEE_ALG_RSASSA_PKCS1_V1_5_MD5, family::RSA_SIGNATURE, rsa_padding::PKCS1, hash::MD5),
     ecdsa_row(TEE_ALG_ECDSA_P224, 224),
+    ecdsa_row(TEE_ALG_ECDSA_SHA224, hash::SHA224),
     rsa_row(TEE_ALG_RSASSA_PKCS1_V1_5_SHA1, family::RSA_SIGNATURE, rsa_padding::PKCS1, hash::SHA1),
     ecdsa_row(TEE_ALG_ECDSA_P256, 256),
+    ecdsa_row(TEE_ALG_ECDSA_SHA256, hash::SHA256),
     rsa_row(TEE_ALG_RSASSA_PKCS1_V1_5_SHA224, family::RSA_SIGNATURE, rsa_padding::PKCS1,
             hash::SHA224),
     ecdsa_row(TEE_ALG_ECDSA_P384, 384),
+    ecdsa_row(TEE_ALG_ECDSA_SHA384, hash::SHA384),
     rsa_row(TEE_ALG_RSASSA_PKCS1_V1_5_SHA256, family::RSA_SIGNATURE, rsa_padding::PKCS1,
             hash::SHA256),
     ecdsa_row(TEE_ALG_ECDSA_P521, 521),
+    ecdsa_row(TEE_ALG_ECDSA_SHA512, hash::SHA512),
     rsa_row(TEE_ALG_RSASSA_PKCS1_V1_5_SHA384, family::RSA_SIGNATURE, rsa_padding::PKCS1,
             hash::SHA384),
     rsa_row(TEE_ALG_RSASSA_PKCS1_V1_5_SHA512, family::RSA_SIGNATURE, rsa_padding::PKCS1,

@@ -24,7 +24,7 @@ struct algorithm {
   hash digest = hash::NONE;
   block_mode mode = block_mode::NONE;
   rsa_padding padding = rsa_padding::NONE;
-  uint32_t curve_bits = 0;
+  uint32_t curve_bits = 0;  // 0: any curve
 
   constexpr bool allows(uint32_t operation_mode) const {
     return operation_mode < 32 && ((modes >> operation_mode) & 1) != 0;

@@ -33,14 +33,44 @@ bool set_padding(EVP_PKEY_CTX* context, const algorithm& row) {
   return EVP_PKEY_CTX_set_rsa_padding(context, libcrypto_padding(row.padding)) == 1;
 }
 
-bool prepare_encryption(EVP_PKEY_CTX* context, const algorithm& row, uint32_t mode) {
-  int ready =
-      mode == TEE_MODE_ENCRYPT ? EVP_PKEY_encrypt_init(context) : EVP_PKEY_decrypt_init(context);
-  if (ready != 1 || !set_padding(context, row)) return false;
-  if (row.padding != rsa_padding::OAEP) return true;
-  const EVP_MD* digest = digest_of(row.digest);
-  return EVP_PKEY_CTX_set_rsa_oaep_md(context, digest) == 1 &&
-         EVP_PKEY_CTX_set_rsa_mgf1_md(context, digest) == 1;
+// From 3.2 on libcrypto answers wrong padding with made-up bytes unless it is told not to.
+bool refuse_wrong_padding(EVP_PKEY_CTX* context) {
+  constexpr const char* MADE_UP_BYTES = "implicit-rejection";
+  const OSSL_PARAM* known = EVP_PKEY_CTX_settable_params(context);
+  if (!known || !OSSL_PARAM_locate_const(known, MADE_UP_BYTES)) return true;
+  unsigned int off = 0;
+  const OSSL_PARAM params[] = {OSSL_PARAM_construct_uint(MADE_UP_BYTES, &off),
+                               OSSL_PARAM_construct_end()};
+  return EVP_PKEY_CTX_set_params(context, params) == 1;
+}
+
+bool set_oaep(EVP_PKEY_CTX* context, const algorithm& row, const oaep_options& options) {
+  const hash mask = options.mask_digest == hash::NONE ? row.digest : options.mask_digest;
+  if (EVP_PKEY_CTX_set_rsa_oaep_md(context, digest_of(row.digest)) != 1 ||
+      EVP_PKEY_CTX_set_rsa_mgf1_md(context, digest_of(mask)) != 1) {
+    return false;
+  }
+  if (options.label.empty()) return true;
+  void* label = OPENSSL_memdup(options.label.data(), options.label.size());
+  const int length = static_cast<int>(options.label.size());
+  if (EVP_PKEY_CTX_set0_rsa_oaep_label(context, label, length) == 1) return true;
+  OPENSSL_free(label);
+  return false;
+}
+
+// One way to encrypt or decrypt.
+struct encryption {
+  const algorithm& row;
+  uint32_t mode;
+  const oaep_options& oaep;
+};
+
+bool prepare_encryption(EVP_PKEY_CTX* context, const encryption& how) {
+  const bool encrypts = how.mode == TEE_MODE_ENCRYPT;
+  const int ready = encrypts ? EVP_PKEY_encrypt_init(context) : EVP_PKEY_decrypt_init(context);
+  if (ready != 1 || !set_padding(context, how.row)) return false;
+  if (how.row.padding == rsa_padding::PKCS1) return encrypts || refuse_wrong_padding(context);
+  return how.row.padding != rsa_padding::OAEP || set_oaep(context, how.row, how.oaep);
 }
 
 bool prepare_signature(EVP_PKEY_CTX* context, const algorithm& row, uint32_t mode) {
@@ -93,30 +123,43 @@ using crypt_function = int (*)(EVP_PKEY_CTX*, unsigned char*, size_t*, const uns
                                size_t);
 
 // Runs one encryption or decryption whose input was checked as far as it can be.
-TEE_Result crypt(key& rsa_key, const algorithm& row, uint32_t mode, std::span<const uint8_t> input,
-                 secret_bytes* result) {
-  pkey_context context(rsa_key, row.id, mode,
-                       [&](EVP_PKEY_CTX* fresh) { return prepare_encryption(fresh, row, mode); });
-  crypt_function run = mode == TEE_MODE_ENCRYPT ? EVP_PKEY_encrypt : EVP_PKEY_decrypt;
-  secret_bytes output(modulus_length(rsa_key));
-  size_t written = output.size();
+TEE_Result run(EVP_PKEY_CTX* context, const encryption& how, std::span<const uint8_t> input,
+               secret_bytes* output) {
+  crypt_function crypt = how.mode == TEE_MODE_ENCRYPT ? EVP_PKEY_encrypt : EVP_PKEY_decrypt;
+  size_t written = output->size();
   // A null pointer would ask for the length only, and an empty message may have one.
   const uint8_t nothing = 0;
   const uint8_t* data = input.empty() ? &nothing : input.data();
-  if (run(context.get(), output.data(), &written, data, input.size()) != 1) {
+  if (crypt(context, output->data(), &written, data, input.size()) != 1) {
     forget_errors();
     return TEE_ERROR_BAD_PARAMETERS;
   }
-  output.resize(written);
-  *result = std::move(output);
+  output->resize(written);
   return TEE_SUCCESS;
 }
 
-TEE_Result crypt_raw(key& rsa_key, const algorithm& row, uint32_t mode,
-                     std::span<const uint8_t> input, secret_bytes* result) {
+TEE_Result crypt(key& rsa_key, const encryption& how, std::span<const uint8_t> input,
+                 secret_bytes* result) {
+  secret_bytes output(modulus_length(rsa_key));
+  const auto prepare = [&](EVP_PKEY_CTX* fresh) { return prepare_encryption(fresh, how); };
+  TEE_Result res = TEE_SUCCESS;
+  if (how.oaep.usual()) {
+    pkey_context context(rsa_key, how.row.id, how.mode, prepare);
+    res = run(context.get(), how, input, &output);
+  } else {  // of no use to the next call
+    pkey_ctx_ptr context(EVP_PKEY_CTX_new_from_pkey(nullptr, rsa_key.pkey(), nullptr));
+    must(context && prepare(context.get()), "preparing a key");
+    res = run(context.get(), how, input, &output);
+  }
+  if (res == TEE_SUCCESS) *result = std::move(output);
+  return res;
+}
+
+TEE_Result crypt_raw(key& rsa_key, const encryption& how, std::span<const uint8_t> input,
+                     secret_bytes* result) {
   secret_bytes block;
   if (!pad_raw(rsa_key, input, &block)) return TEE_ERROR_BAD_PARAMETERS;
-  if (TEE_Result res = crypt(rsa_key, row, mode, block, result)) return res;
+  if (TEE_Result res = crypt(rsa_key, how, block, result)) return res;
   strip_raw(result);
   return TEE_SUCCESS;
 }
@@ -127,22 +170,20 @@ size_t modulus_length(const key& rsa_key) {
   return (size_t{rsa_key.bits()} + 7) / 8;
 }
 
-TEE_Result rsa_encrypt(key& rsa_key, const algorithm& row, std::span<const uint8_t> input,
-                       secret_bytes* result) {
-  if (row.padding == rsa_padding::NONE) {
-    return crypt_raw(rsa_key, row, TEE_MODE_ENCRYPT, input, result);
-  }
+TEE_Result rsa_encrypt(key& rsa_key, const algorithm& row, const oaep_options& oaep,
+                       std::span<const uint8_t> input, secret_bytes* result) {
+  const encryption how{row, TEE_MODE_ENCRYPT, oaep};
+  if (row.padding == rsa_padding::NONE) return crypt_raw(rsa_key, how, input, result);
   if (input.size() > longest_message(rsa_key, row)) return TEE_ERROR_BAD_PARAMETERS;
-  return crypt(rsa_key, row, TEE_MODE_ENCRYPT, input, result);
+  return crypt(rsa_key, how, input, result);
 }
 
-TEE_Result rsa_decrypt(key& rsa_key, const algorithm& row, std::span<const uint8_t> input,
-                       secret_bytes* result) {
-  if (row.padding == rsa_padding::NONE) {
-    return crypt_raw(rsa_key, row, TEE_MODE_DECRYPT, input, result);
-  }
+TEE_Result rsa_decrypt(key& rsa_key, const algorithm& row, const oaep_options& oaep,
+                       std::span<const uint8_t> input, secret_bytes* result) {
+  const encryption how{row, TEE_MODE_DECRYPT, oaep};
+  if (row.padding == rsa_padding::NONE) return crypt_raw(rsa_key, how, input, result);
   if (input.size() != modulus_length(rsa_key)) return TEE_ERROR_BAD_PARAMETERS;
-  return crypt(rsa_key, row, TEE_MODE_DECRYPT, input, result);
+  return crypt(rsa_key, how, input, result);
 }
 
 TEE_Result rsa_sign(key& rsa_key, const algorithm& row, pss_salt salt,

@@ -13,14 +13,22 @@ namespace tee::crypto {
 // modulus_length: of a key, in bytes.
 size_t modulus_length(const key& rsa_key);
 
+// What OAEP takes beside the algorithm (RFC 8017, 7.1).
+struct oaep_options {
+  std::span<const uint8_t> label{};
+  hash mask_digest = hash::NONE;  // of MGF1; NONE: the algorithm's
+
+  bool usual() const { return label.empty() && mask_digest == hash::NONE; }
+};
+
 // rsa_encrypt, rsa_decrypt: with a row of family RSA_ENCRYPTION. Raw input of up to modulus_length
 // bytes is a number below the modulus; a raw result is a number without leading zeros, zero being
-// one byte. TEE_ERROR_BAD_PARAMETERS, and *result untouched, for a raw number that is not below the
-// modulus, a message that is too long, and a ciphertext of another length than the modulus or whose
-// padding is wrong.
-[[nodiscard]] TEE_Result rsa_encrypt(key& rsa_key, const algorithm& row,
+// one byte; `oaep` counts with that padding alone. TEE_ERROR_BAD_PARAMETERS, and *result untouched,
+// for a raw number that is not below the modulus, a message that is too long, and a ciphertext of
+// another length than the modulus or whose padding is wrong.
+[[nodiscard]] TEE_Result rsa_encrypt(key& rsa_key, const algorithm& row, const oaep_options& oaep,
                                      std::span<const uint8_t> input, secret_bytes* result);
-[[nodiscard]] TEE_Result rsa_decrypt(key& rsa_key, const algorithm& row,
+[[nodiscard]] TEE_Result rsa_decrypt(key& rsa_key, const algorithm& row, const oaep_options& oaep,
                                      std::span<const uint8_t> input, secret_bytes* result);
 
 // Length of a PSS salt: a number of bytes, or one of the codes TEE_PSS_SALT_. Absent: as long as

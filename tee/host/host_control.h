@@ -1,5 +1,5 @@
-// Control of the host TEE by the process it runs in: live counts, faults, trace, clocks. For tests,
-// benchmarks and tools; nothing here is reachable by trusted applications.
+// Control of the host TEE by the process it runs in: profile, live counts, faults, trace, clocks.
+// For tests, benchmarks and tools; nothing here is reachable by trusted applications.
 #pragma once
 
 #include "tee_internal_api.h"
@@ -8,6 +8,7 @@
 
 #include "tee/core/heap.h"
 #include "tee/core/live_counts.h"
+#include "tee/core/profile.h"
 #include "tee/core/trace.h"
 #include "tee/device/clock.h"
 
@@ -22,6 +23,11 @@ using tee::set_trace_sink;
 using tee::trace_sink;
 
 using tee::live_counts;
+
+// How strict the platform is (profile.h).
+using tee::current_profile;
+using tee::profile;
+using tee::set_profile;
 
 // counts_of: what the instance of `ta` holds; false (and *counts untouched) when none is alive.
 // Call it while no command runs in that instance.

@@ -10,15 +10,17 @@ namespace {
 
 using asymmetric = in_instance;
 
-// Operations that sign and verify with a new key.
+// Operations of two modes with a new key; by default those that sign and verify.
 std::array<TEE_OperationHandle, 2> on_new_key(uint32_t type, uint32_t bits, uint32_t algorithm,
-                                              const std::vector<TEE_Attribute>& params) {
+                                              const std::vector<TEE_Attribute>& params,
+                                              std::array<uint32_t, 2> modes = {TEE_MODE_SIGN,
+                                                                               TEE_MODE_VERIFY}) {
   TEE_ObjectHandle key = nullptr;
   EXPECT_EQ(TEE_AllocateTransientObject(type, bits, &key), TEE_SUCCESS);
   EXPECT_EQ(TEE_GenerateKey(key, bits, params.data(), static_cast<uint32_t>(params.size())),
             TEE_SUCCESS);
-  std::array ops = {operation(algorithm, TEE_MODE_SIGN, bits, nullptr),
-                    operation(algorithm, TEE_MODE_VERIFY, bits, nullptr)};
+  std::array ops = {operation(algorithm, modes[0], bits, nullptr),
+                    operation(algorithm, modes[1], bits, nullptr)};
   for (auto op : ops)
     EXPECT_EQ(TEE_SetOperationKey(op, key), TEE_SUCCESS);
   TEE_FreeTransientObject(key);
@@ -56,6 +58,92 @@ TEST_F(asymmetric, rsa_signatures_keep_their_leading_zero) {
   EXPECT_EQ(verify(verifier, digest, signature), TEE_ERROR_SIGNATURE_INVALID);
   TEE_FreeOperation(signer);
   TEE_FreeOperation(verifier);
+}
+
+constexpr std::array<uint32_t, 2> CRYPTS = {TEE_MODE_ENCRYPT, TEE_MODE_DECRYPT};
+
+// What was encrypted under a label and a digest of MGF1 opens under the same ones alone.
+TEST_F(asymmetric, oaep_heeds_label_and_mask_digest) {
+  auto [encrypter, decrypter] =
+      on_new_key(TEE_TYPE_RSA_KEYPAIR, 1024, TEE_ALG_RSAES_PKCS1_OAEP_MGF1_SHA256, {}, CRYPTS);
+  const auto digest = [](uint32_t id) {
+    const auto* begin = reinterpret_cast<const uint8_t*>(&id);
+    return bytes(begin, begin + sizeof(id));
+  };
+  const bytes label = {'L'};
+  const bytes sha1 = digest(TEE_ALG_SHA1);
+  const bytes sha256 = digest(TEE_ALG_SHA256);
+  const bytes unknown = digest(TEE_ALG_HMAC_SHA1);
+  const std::vector<TEE_Attribute> none;
+  const std::vector<TEE_Attribute> usual = {ref(TEE_ATTR_RSA_OAEP_LABEL, {}),
+                                            ref(TEE_ATTR_RSA_OAEP_MGF_HASH, sha256)};
+  const std::vector<TEE_Attribute> labelled = {ref(TEE_ATTR_RSA_OAEP_LABEL, label)};
+  const std::vector<TEE_Attribute> masked = {ref(TEE_ATTR_RSA_OAEP_MGF_HASH, sha1)};
+  const std::vector<TEE_Attribute>* ways[] = {&none, &labelled, &masked};
+  bytes sealed(128);
+  bytes opened(128);
+  const auto run = [](auto function, auto op, const auto& params, const bytes& in, bytes* out) {
+    size_t length = out->size();
+    return function(op, params.data(), static_cast<uint32_t>(params.size()), in.data(), in.size(),
+                    out->data(), &length);
+  };
+  for (const auto* there : ways) {
+    ASSERT_EQ(run(TEE_AsymmetricEncrypt, encrypter, *there, label, &sealed), TEE_SUCCESS);
+    for (const auto* back : ways) {
+      const TEE_Result expected = there == back ? TEE_SUCCESS : TEE_ERROR_BAD_PARAMETERS;
+      EXPECT_EQ(run(TEE_AsymmetricDecrypt, decrypter, *back, sealed, &opened), expected);
+    }
+  }
+  ASSERT_EQ(run(TEE_AsymmetricEncrypt, encrypter, usual, label, &sealed), TEE_SUCCESS);
+  EXPECT_EQ(run(TEE_AsymmetricDecrypt, decrypter, none, sealed, &opened), TEE_SUCCESS);
+  const std::vector<TEE_Attribute> refused = {ref(TEE_ATTR_RSA_OAEP_MGF_HASH, unknown)};
+  EXPECT_EQ(run(TEE_AsymmetricEncrypt, encrypter, refused, label, &sealed),
+            TEE_ERROR_NOT_SUPPORTED);
+  TEE_FreeOperation(encrypter);
+  TEE_FreeOperation(decrypter);
+}
+
+// Whatever libcrypto likes to answer: wrong padding is refused.
+TEST_F(asymmetric, wrong_pkcs1_padding_is_refused) {
+  auto [encrypter, decrypter] =
+      on_new_key(TEE_TYPE_RSA_KEYPAIR, 512, TEE_ALG_RSAES_PKCS1_V1_5, {}, CRYPTS);
+  for (uint8_t fill = 1; fill < 8; ++fill) {
+    const bytes rubbish(64, fill);
+    bytes opened(64);
+    size_t length = opened.size();
+    EXPECT_EQ(TEE_AsymmetricDecrypt(decrypter, nullptr, 0, rubbish.data(), rubbish.size(),
+                                    opened.data(), &length),
+              TEE_ERROR_BAD_PARAMETERS);
+  }
+  TEE_FreeOperation(encrypter);
+  TEE_FreeOperation(decrypter);
+}
+
+// An algorithm that names the digest takes keys of any curve, and makes the same signatures as the
+// one that names the curve.
+TEST_F(asymmetric, ecdsa_under_either_name) {
+  TEE_Attribute curve;
+  TEE_InitValueAttribute(&curve, TEE_ATTR_ECC_CURVE, TEE_ECC_CURVE_NIST_P384, 0);
+  TEE_ObjectHandle key = nullptr;
+  ASSERT_EQ(TEE_AllocateTransientObject(TEE_TYPE_ECDSA_KEYPAIR, 384, &key), TEE_SUCCESS);
+  ASSERT_EQ(TEE_GenerateKey(key, 384, &curve, 1), TEE_SUCCESS);
+  auto verifier = operation(TEE_ALG_ECDSA_P384, TEE_MODE_VERIFY, 384, nullptr);
+  ASSERT_EQ(TEE_SetOperationKey(verifier, key), TEE_SUCCESS);
+  constexpr std::pair<uint32_t, size_t> DIGESTS[] = {{TEE_ALG_ECDSA_SHA1, 20},
+                                                     {TEE_ALG_ECDSA_SHA224, 28},
+                                                     {TEE_ALG_ECDSA_SHA256, 32},
+                                                     {TEE_ALG_ECDSA_SHA384, 48},
+                                                     {TEE_ALG_ECDSA_SHA512, 64}};
+  for (const auto& [algorithm, length] : DIGESTS) {
+    auto signer = operation(algorithm, TEE_MODE_SIGN, 384, nullptr);
+    ASSERT_EQ(TEE_SetOperationKey(signer, key), TEE_SUCCESS);
+    const bytes digest(length, 7);
+    EXPECT_EQ(verify(verifier, digest, sign(signer, digest)), TEE_SUCCESS) << length;
+    EXPECT_DEATH(sign(signer, bytes(length + 1)), "panic: .*: a digest of .* bytes, not");
+    TEE_FreeOperation(signer);
+  }
+  TEE_FreeOperation(verifier);
+  TEE_FreeTransientObject(key);
 }
 
 struct curve_row {

@@ -45,10 +45,14 @@ TEST_F(ta_heap, the_bound_holds_and_hostile_sizes_get_null) {
   ASSERT_NE(rest, nullptr);
   EXPECT_EQ(TEE_Realloc(rest, SIZE_MAX), nullptr);
   EXPECT_EQ(ta_.counts().heap_bytes, HEAP_LIMIT);
-  // Two blocks of no bytes are two blocks.
+  // Two blocks of no bytes are two blocks, and cost something.
+  EXPECT_EQ(TEE_Malloc(0, 0), nullptr);
+  TEE_Free(most);
+  most = TEE_Malloc(HEAP_LIMIT - 50, 0);
   void* none[2] = {TEE_Malloc(0, 0), TEE_Realloc(nullptr, 0)};
   EXPECT_NE(none[0], nullptr);
   EXPECT_NE(none[0], none[1]);
+  EXPECT_EQ(TEE_Realloc(nullptr, 0), nullptr);
   EXPECT_EQ(ta_.counts().heap_blocks, 4U);
   for (void* block : {most, rest, none[0], none[1]})
     TEE_Free(block);

@@ -63,7 +63,8 @@ TEST_F(persistent, flags_of_two_handles_agree_or_conflict) {
       {READ | SHARE_R, WRITE | SHARE_R, false},
       {READ | SHARE_R | SHARE_W, WRITE | SHARE_R | SHARE_W, true},
       {META | SHARE_R | SHARE_W, READ | SHARE_R | SHARE_W, false},
-      {0, 0, true},
+      {0, 0, false},
+      {SHARE_R, SHARE_R, true},
       {0, META, false},
   };
   ASSERT_EQ(create_object(0, "data", &object), TEE_SUCCESS);
@@ -82,6 +83,27 @@ TEST_F(persistent, flags_of_two_handles_agree_or_conflict) {
     }
   }
   EXPECT_EQ(owner.objects().size(), 0u);
+}
+
+TEST_F(persistent, an_object_can_be_stored_without_a_handle) {
+  EXPECT_EQ(create_object(0, "first", nullptr), TEE_SUCCESS);
+  EXPECT_EQ(create_object(0, "second", nullptr), TEE_ERROR_ACCESS_CONFLICT);
+  ASSERT_EQ(open_object(READ, &object), TEE_SUCCESS);
+  EXPECT_EQ(read_all(object), "first");
+  EXPECT_EQ(create_object(OVERWRITE, "second", nullptr), TEE_ERROR_ACCESS_CONFLICT);
+  TEE_CloseObject(object);
+  EXPECT_EQ(owner.objects().size(), 0u);
+}
+
+TEST_F(persistent, names_do_not_lie_in_memory_of_the_client) {
+  char memory[] = "id";
+  call_parameters parameters{.types = TEE_PARAM_TYPE_MEMREF_INPUT};
+  parameters.slots[0].memref = {memory, sizeof(memory)};
+  instance_scope entered(owner, &parameters);
+  EXPECT_DEATH((void)TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, memory + 2, 1, READ, &object),
+               "panic: TEE_OpenPersistentObject: objectID is in memory of the client");
+  EXPECT_EQ(TEE_OpenPersistentObject(TEE_STORAGE_PRIVATE, memory, 0, READ, &object),
+            TEE_ERROR_ITEM_NOT_FOUND);
 }
 
 TEST_F(persistent, names_belong_to_storage_and_trusted_application) {

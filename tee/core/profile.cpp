@@ -1,0 +1,39 @@
+// What kind of platform this is.
+#include "tee/core/profile.h"
+
+#include <cstdlib>
+#include <string_view>
+
+namespace tee {
+namespace {
+
+bool names(std::string_view list, std::string_view word) {
+  while (!list.empty()) {
+    const size_t end = list.find(',');
+    if (list.substr(0, end) == word) return true;
+    list.remove_prefix(end == std::string_view::npos ? list.size() : end + 1);
+  }
+  return false;
+}
+
+profile from_environment() {
+  const char* words = secure_getenv("TEE_PROFILE");
+  return {.strict = words != nullptr && names(words, "strict")};
+}
+
+profile& chosen() {
+  static profile of_process = from_environment();
+  return of_process;
+}
+
+}  // namespace
+
+const profile& current_profile() {
+  return chosen();
+}
+
+void set_profile(const profile& wanted) {
+  chosen() = wanted;
+}
+
+}  // namespace tee
