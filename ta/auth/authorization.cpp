@@ -11,6 +11,39 @@
 namespace keymaster {
 namespace {
 
+// What a key says once for all of its parameters, gathered in one walk: a key may name very many
+// users, and each is checked against these. Of a repeated limit the strictest holds.
+struct key_terms_t {
+  bool is_without_auth = false;     // KM_TAG_NO_AUTH_REQUIRED
+  bool takes_caller_nonce = false;  // KM_TAG_CALLER_NONCE
+  bool has_auth_type = false;
+  uint32_t auth_type = UINT32_MAX;                      // the bits that every entry has
+  const keymaster_key_param_t* auth_timeout = nullptr;  // the shortest
+  const keymaster_key_param_t* min_seconds = nullptr;   // the largest
+};
+
+key_terms_t read_terms(const keymaster_key_param_set_t& key_params) {
+  key_terms_t terms;
+  for (const keymaster_key_param_t& param : key_params) {
+    const auto replaces = [&](const keymaster_key_param_t* held, bool by_larger) {
+      return held == nullptr || (param.integer > held->integer) == by_larger;
+    };
+    if (param.tag == KM_TAG_NO_AUTH_REQUIRED) terms.is_without_auth = true;
+    if (param.tag == KM_TAG_CALLER_NONCE) terms.takes_caller_nonce = true;
+    if (param.tag == KM_TAG_USER_AUTH_TYPE) {
+      terms.has_auth_type = true;
+      terms.auth_type &= param.enumerated;
+    }
+    if (param.tag == KM_TAG_AUTH_TIMEOUT && replaces(terms.auth_timeout, false)) {
+      terms.auth_timeout = &param;
+    }
+    if (param.tag == KM_TAG_MIN_SECONDS_BETWEEN_OPS && replaces(terms.min_seconds, true)) {
+      terms.min_seconds = &param;
+    }
+  }
+  return terms;
+}
+
 // The user authentication that a key demands, and what the request brings for it.
 struct user_auth_t {
   uint64_t challenge;  // that the token must carry; 0: any
@@ -34,6 +67,8 @@ struct begin_check_t {
   const keymaster_key_param_set_t& key_params;
   uint32_t algorithm = 0;
   uint32_t purpose = 0;
+  key_terms_t terms{};
+  const keymaster_key_param_t* mac_length = nullptr;  // of the request, in bits
   key_identity_t identity{};
   user_auth_t user{};
   bool is_purpose_allowed = false;
@@ -53,21 +88,19 @@ keymaster_error_t read_user_auth(const keymaster_key_param_set_t& request, uint6
 }
 
 // One KM_TAG_USER_SECURE_ID of the key. No match is no refusal: another identifier may match.
-keymaster_error_t check_secure_id(uint64_t secure_id, const keymaster_key_param_set_t& key_params,
+keymaster_error_t check_secure_id(uint64_t secure_id, const key_terms_t& terms,
                                   user_auth_t* user) {
-  if (get_unique(key_params, KM_TAG_NO_AUTH_REQUIRED) != nullptr) {
+  if (terms.is_without_auth) {
     return refuse(KM_ERROR_INVALID_ARGUMENT,
                   "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED");
   }
-  const keymaster_key_param_t* auth_type = get_unique(key_params, KM_TAG_USER_AUTH_TYPE);
-  if (auth_type == nullptr) {
+  if (!terms.has_auth_type) {
     return refuse(KM_ERROR_INVALID_ARGUMENT,
                   "Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE");
   }
   user->is_demanded = true;
-  user->is_given = user->is_given ||
-                   check_auth(secure_id, user->challenge, user->token,
-                              get_unique(key_params, KM_TAG_AUTH_TIMEOUT), auth_type->enumerated);
+  user->is_given = user->is_given || check_auth(secure_id, user->challenge, user->token,
+                                                terms.auth_timeout, terms.auth_type);
   return KM_ERROR_OK;
 }
 
@@ -96,7 +129,7 @@ keymaster_error_t check_mac_length(const begin_check_t& check, uint32_t minimum_
   const bool makes_mac =
       check.algorithm == KM_ALGORITHM_HMAC ||
       (check.algorithm == KM_ALGORITHM_AES && check.block_mode.value == KM_MODE_GCM);
-  const keymaster_key_param_t* bits = get_unique(check.request, KM_TAG_MAC_LENGTH);
+  const keymaster_key_param_t* bits = check.mac_length;
   if (!makes_mac || bits == nullptr || minimum_bits <= bits->integer) return KM_ERROR_OK;
   return refuse(KM_ERROR_INVALID_MAC_LENGTH, "MAC length %d below the key's minimum %d",
                 static_cast<int>(bits->integer), static_cast<int>(minimum_bits));
@@ -159,7 +192,7 @@ keymaster_error_t check_param(const keymaster_key_param_t& param, begin_check_t*
       // can be used to try a key for free.
       return check_use_count_and_add(check->identity, param.integer);
     case KM_TAG_USER_SECURE_ID:
-      return check_secure_id(param.long_integer, check->key_params, &check->user);
+      return check_secure_id(param.long_integer, check->terms, &check->user);
     case KM_TAG_BOOTLOADER_ONLY:
       return refuse(KM_ERROR_INVALID_KEY_BLOB, "Bootloader only key");
     default:
@@ -189,7 +222,7 @@ keymaster_error_t check_allowed(const begin_check_t& check) {
 // only after this begin.
 keymaster_error_t check_begin_auth(const begin_check_t& check) {
   if (!check.user.is_due()) return KM_ERROR_OK;
-  if (get_unique(check.key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) {
+  if (check.terms.auth_timeout != nullptr) {
     return refuse(KM_ERROR_KEY_USER_NOT_AUTHENTICATED, "Auth token check failed");
   }
   trace(TEE_TRACE_INFO, "OP AUTH NEEDED");
@@ -197,8 +230,8 @@ keymaster_error_t check_begin_auth(const begin_check_t& check) {
 }
 
 keymaster_error_t check_caller_nonce(const begin_check_t& check) {
-  if (check.purpose != KM_PURPOSE_ENCRYPT || get_unique(check.request, KM_TAG_NONCE) == nullptr ||
-      get_unique(check.key_params, KM_TAG_CALLER_NONCE) != nullptr) {
+  if (check.purpose != KM_PURPOSE_ENCRYPT || check.terms.takes_caller_nonce ||
+      !contains_tag(check.request, KM_TAG_NONCE)) {
     return KM_ERROR_OK;
   }
   return refuse(KM_ERROR_CALLER_NONCE_PROHIBITED, "Caller nonce prohibited");
@@ -216,7 +249,7 @@ keymaster_error_t check_begin(begin_check_t* check) {
   if (due != KM_ERROR_OK && due != KM_AUTHENTICATION_DUE) return due;
   TRY(check_caller_nonce(*check));
   // A full log does not refuse: the limit then goes unenforced until a record is free.
-  const auto* min_seconds = get_unique(check->key_params, KM_TAG_MIN_SECONDS_BETWEEN_OPS);
+  const keymaster_key_param_t* min_seconds = check->terms.min_seconds;
   if (min_seconds != nullptr) record_key_use(check->identity, min_seconds->integer);
   return due;
 }
@@ -267,7 +300,9 @@ outcome authorize_begin(byte_view key_blob, uint32_t purpose,
   begin_check_t check{.request = begin_params,
                       .key_params = key_params,
                       .algorithm = algorithm->enumerated,
-                      .purpose = purpose};
+                      .purpose = purpose,
+                      .terms = read_terms(key_params),
+                      .mac_length = get_unique(begin_params, KM_TAG_MAC_LENGTH)};
   TRY(identify_key(key_blob, &check.identity));
   return check_begin(&check);
 }
@@ -276,12 +311,13 @@ keymaster_error_t authorize_update_or_finish(const keymaster_key_param_set_t& re
                                              const keymaster_key_param_set_t& key_params,
                                              uint64_t challenge) {
   const trace_scope scope;
-  if (get_unique(key_params, KM_TAG_AUTH_TIMEOUT) != nullptr) return KM_ERROR_OK;
+  const key_terms_t terms = read_terms(key_params);
+  if (terms.auth_timeout != nullptr) return KM_ERROR_OK;
   user_auth_t user{};
   TRY(read_user_auth(request_params, challenge, &user));
   for (const keymaster_key_param_t& param : key_params) {
     if (param.tag == KM_TAG_USER_SECURE_ID) {
-      TRY(check_secure_id(param.long_integer, key_params, &user));
+      TRY(check_secure_id(param.long_integer, terms, &user));
     }
   }
   if (!user.is_due()) return KM_ERROR_OK;

@@ -1,5 +1,6 @@
 // Authorisation of key use: what a begin, update and finish are refused for, tokens, counted and
 // rate-limited keys, the TA's clock, the operation pool.
+#include <ctime>
 #include <set>
 
 #include "support/sets.h"
@@ -141,6 +142,14 @@ const begin_case BEGINS[] = {
     {-38, "Found KM_TAG_USER_SECURE_ID but no KM_TAG_USER_AUTH_TYPE",
      signer(KM_TAG_USER_SECURE_ID, USER)},
     {-26, NOT_MET, user_key(1).add(KM_TAG_AUTH_TIMEOUT, UINT32_MAX)},
+    // To have a tag is to have it at least once, on both sides.
+    {-55, BAD_NONCE, aes_key(KM_MODE_CBC), param_set(OWN_NONCE).add_bytes(KM_TAG_NONCE, bytes(16)),
+     ENCRYPT},
+    {0, "", aes_key(KM_MODE_CBC, several(KM_TAG_CALLER_NONCE, {1, 1})), OWN_NONCE, ENCRYPT},
+    {-38, "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED",
+     user_key(1).append(several(KM_TAG_NO_AUTH_REQUIRED, {1, 1}))},
+    {-26, NOT_MET, user_key(1).append(several(KM_TAG_AUTH_TIMEOUT, {1, 2}))},
+    {0, "", user_key(1).add(KM_TAG_USER_AUTH_TYPE, 3)},
     // Authentication is due, but a later check refuses.
     {-55, BAD_NONCE,
      aes_key(KM_MODE_CBC, one(KM_TAG_USER_SECURE_ID, USER).add(KM_TAG_USER_AUTH_TYPE, 1)),
@@ -185,6 +194,33 @@ TEST_F(auth, rate_limit_counts_whole_seconds_and_includes_the_limit) {
   const bytes due = ta.generate(user_key(1).add(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 1));
   expect_sign(due);
   expect_sign(due, -54, TOO_SOON);
+}
+
+TEST_F(auth, every_rate_limit_of_a_key_counts_and_the_largest_is_recorded) {
+  const bytes key = ta.generate(sign_key(several(KM_TAG_MIN_SECONDS_BETWEEN_OPS, {3, 20, 5})));
+  expect_sign(key);
+  ta.advance(20'000);
+  expect_sign(key, -54, TOO_SOON);
+  // Seven more records fill the log: the first is not given away before its largest limit is over.
+  for (int i = 0; i < 7; i++)
+    expect_sign(ta.generate(signer(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 60)));
+  const bytes ninth = ta.generate(signer(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 60));
+  expect_sign(ninth);
+  expect_sign(ninth);
+  ta.advance(1'000);
+  expect_sign(ninth);
+  expect_sign(ninth, -54, TOO_SOON);
+}
+
+// A key with very many users: were the set searched for each of them, this would take minutes.
+TEST_F(auth, begin_takes_time_in_proportion_to_the_key_s_parameters) {
+  param_set users = user_key(1);
+  for (uint64_t i = 0; i < 15'000; i++)
+    users.add(KM_TAG_USER_SECURE_ID, i);
+  const reply key = ta.send_well(generate_request(users, 1 << 20));
+  const std::clock_t before = std::clock();
+  expect_sign(key.output());
+  EXPECT_LT(std::clock() - before, CLOCKS_PER_SEC / 2);
 }
 
 TEST_F(auth, full_log_lets_a_rate_limited_key_pass_until_a_record_is_over) {
