@@ -29,7 +29,7 @@ bool raise_version(keymaster_key_param_set_t* characteristics, keymaster_tag_t t
   }
   keymaster_key_param_t* param = get_unique(*characteristics, tag);
   if (param == nullptr || param->integer > configured_value) return false;
-  param->integer = configured_value;
+  param->long_integer = configured_value;  // the bytes beyond a version's 32 bits are zero
   return true;
 }
 

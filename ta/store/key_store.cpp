@@ -88,13 +88,19 @@ TEE_Result delete_wrong_ksk(tee_object* stored, size_t length) {
   return KEY_STORE_ERROR_KSK_DELETED;
 }
 
+// How long a stored KSK is, of which `read` bytes fit the buffer.
+size_t stored_length(const tee_object& stored, size_t read) {
+  TEE_ObjectInfo info{};
+  return TEE_GetObjectInfo1(stored.get(), &info) == TEE_SUCCESS ? info.dataSize : read;
+}
+
 TEE_Result load_rpmb_ksk(tee_object* stored, tee_object* ksk) {
   // One byte more than expected, so that a stream that is too long is seen.
   secret_bytes<KSK_SIZE + 1> secret;
   tee_size length = 0;
   TRY(checked(TEE_ReadObjectData(stored->get(), secret.data(), secret.size(), &length),
               "ReadObjectData"));
-  if (length != KSK_SIZE) return delete_wrong_ksk(stored, length);
+  if (length != KSK_SIZE) return delete_wrong_ksk(stored, stored_length(*stored, length));
   return load_ksk(byte_view(secret).first(KSK_SIZE), ksk);
 }
 

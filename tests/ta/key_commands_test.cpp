@@ -1,4 +1,6 @@
 // The commands that make, describe, export, upgrade and delete keys.
+#include <algorithm>
+
 #include "support/blob_forge.h"
 #include "support/sets.h"
 #include "support/ta_under_test.h"
@@ -163,6 +165,12 @@ TEST(Version, UpgradeAddsMissingTagsAndRefusesRepeatedOnes) {
   const param_set upgraded =
       hmac_key(256).add(KM_TAG_OS_VERSION, OS_VERSION).add(KM_TAG_OS_PATCHLEVEL, OS_PATCHLEVEL);
   EXPECT_EQ(unseal(ta.upgrade(bare).output()), blob_plaintext(record, upgraded));
+  // What a version tag holds beyond its 32 bits goes.
+  bytes wide = blob_plaintext(record, upgraded);
+  const bytes tag = client::field_writer().u32(KM_TAG_OS_VERSION).take();
+  std::ranges::search(wide, tag).begin()[13] = 7;
+  const reply narrowed = ta.upgrade(seal(wide));
+  EXPECT_EQ(unseal(narrowed.output()), blob_plaintext(record, upgraded));
   const bytes repeated = seal(blob_plaintext(record, with(upgraded, KM_TAG_OS_VERSION, {1, 1})));
   EXPECT_TRUE(refused(ta.upgrade(repeated), -38));
 }
