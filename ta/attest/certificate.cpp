@@ -24,9 +24,6 @@ constexpr uint32_t KEY_USAGE_BITS = 8;
 constexpr uint32_t DIGITAL_SIGNATURE = 1 << 0;
 constexpr uint32_t ENCIPHERMENT = 1 << 2 | 1 << 3;  // of keys and of data
 constexpr size_t KEY_USAGE_BUFFER_SIZE = 100;
-// No more memory than this is taken for a certificate, however large the client's buffer is. Its
-// variable part, an application identifier, comes from the TA's heap as well.
-constexpr size_t MAX_CERTIFICATE_SIZE = 16384;
 
 template <size_t SIZE>
 byte_view text_bytes(const char (&text)[SIZE]) {
@@ -118,13 +115,12 @@ keymaster_error_t fill_certificate(const attested_key& key, X509_CINF* cinf) {
   return KM_ERROR_OK;
 }
 
-// Signs into `certificate`, which lies in TA memory.
 outcome sign_certificate(const keymaster_key_param_set_t& attest_params, const X509_CINF* cinf,
-                         heap_buffer* certificate) {
+                         size_t capacity, heap_buffer* certificate) {
   const auto* algorithm = get_unique(attest_params, KM_TAG_ALGORITHM);
   tee_object key;
   TRY(get_attest_key(algorithm == nullptr ? KM_ALGORITHM_RSA : algorithm->enumerated, &key));
-  return X509_CINF_sign(cinf, key, certificate);
+  return X509_CINF_sign(cinf, key, capacity, certificate);
 }
 
 // The Keymaster error of a step: a failure has one.
@@ -150,17 +146,15 @@ outcome internal_attest_key(const attested_key& key, byte_span output, size_t* p
   *count = 0;
   const algorithm_t* algorithm = nullptr;
   TRY(choose_algorithm(key.characteristics, &algorithm));
-  if (output.size() < sizeof(uint32_t)) return fail(TEE_ERROR_GENERIC, "Too short buffer");
   const asn1_owner<X509_CINF, X509_CINF_free> cinf(X509_CINF_alloc());
   if (!cinf) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
   const outcome has_key = algorithm->set_key_info(key.material, &cinf->key);
   if (failed(has_key)) return {has_key.tee, error_of(has_key)};
   TRY(fill_certificate(key, cinf.get()));
+  if (output.size() < sizeof(uint32_t)) return fail(TEE_ERROR_GENERIC, "Too short buffer");
+  const size_t capacity = output.size() - sizeof(uint32_t);
   heap_buffer certificate;
-  if (!certificate.allocate(std::min(output.size() - sizeof(uint32_t), MAX_CERTIFICATE_SIZE))) {
-    return KM_ERROR_MEMORY_ALLOCATION_FAILED;
-  }
-  TRY(error_of(sign_certificate(key.params, cinf.get(), &certificate)));
+  TRY(error_of(sign_certificate(key.params, cinf.get(), capacity, &certificate)));
   return write_chain(certificate.view(), output, produced, count);
 }
 

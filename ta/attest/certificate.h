@@ -16,10 +16,11 @@ outcome get_attest_key(uint32_t algorithm, tee_object* key);
 
 // X509_CINF_sign: encodes the to-be-signed part, signs it with `key` as its `signature` field says
 // (RSA PKCS #1 v1.5 with MD5, SHA-1, SHA-256, SHA-384 or SHA-512) and encodes the certificate into
-// `certificate`, which is cut to its length. Keymaster errors: -41 it does not fit, or out of
+// `certificate`, in TA memory. Keymaster errors: -41 it is longer than `capacity` bytes, or out of
 // memory; -1000 a value cannot be encoded. TEE_ERROR_NOT_SUPPORTED: another signature algorithm;
 // otherwise the platform's code.
-outcome X509_CINF_sign(const X509_CINF* cinf, const tee_object& key, heap_buffer* certificate);
+outcome X509_CINF_sign(const X509_CINF* cinf, const tee_object& key, size_t capacity,
+                       heap_buffer* certificate);
 
 // attested_key: the key that a chain is for, and what the caller asks of it.
 struct attested_key {

@@ -140,7 +140,6 @@ const asn1_field* field_of(keymaster_tag_t tag) {
 
 // Puts one parameter where it belongs. False when out of memory.
 bool fill(const asn1_field& field, const keymaster_key_param_t& param, AuthorizationList* list) {
-  const trace_scope scope;
   auto* base = reinterpret_cast<uint8_t*>(list);
   void* value = base + field.offset;
   const uint32_t kind = tag_class(param.tag);
@@ -213,6 +212,7 @@ KM_DEFINE_ASN1_RECORD(AuthorizationList, asn1_sequence<AuthorizationList_FIELDS>
 KM_DEFINE_ASN1_RECORD(KeyDescription, asn1_sequence<KeyDescription_FIELDS>)
 
 uint64_t* SET_OF_INTEGER_alloc_item(SET_OF_INTEGER* set) {
+  const trace_scope scope;
   auto* item = static_cast<integer_item*>(asn1_list_add(INTEGER_SET, &set->items));
   return item == nullptr ? nullptr : &item->value;
 }

@@ -1,6 +1,7 @@
 // Signing of certificates with the provisioned attestation key.
 #include <algorithm>
 
+#include "ta/alg/big_endian.h"
 #include "ta/attest/attestation_key.h"
 #include "ta/attest/certificate.h"
 #include "ta/der/oids.h"
@@ -10,6 +11,9 @@ namespace {
 
 constexpr uint32_t ATTEST_KEY_BITS = 2048;
 constexpr size_t FIRST_BUFFER_SIZE = 1024;
+// What a certificate adds to its to-be-signed part and the signature's bytes: the outer header, the
+// algorithm's identifier, the header of the signature; 30 bytes or so.
+constexpr size_t MAX_CERTIFICATE_OVERHEAD = 64;
 
 struct signature_algorithm {
   const ASN1_OID* id;
@@ -65,14 +69,29 @@ outcome sign_digest(uint32_t algorithm, const tee_object& key, byte_view digest,
   return DONE;
 }
 
+// The stored number without its leading zeros: an object of the key's size has no room for them.
+TEE_Attribute number_attribute(uint32_t id, byte_view number) {
+  return ref_attribute(id, without_leading_zeros(number));
+}
+
+// Makes room for the certificate as far as it may be needed, at most `capacity` bytes, and encodes.
+keymaster_error_t encode_certificate(const X509_CERT& signed_cinf, size_t needed, size_t capacity,
+                                     heap_buffer* certificate) {
+  if (!certificate->allocate(std::min(needed, capacity))) return KM_ERROR_MEMORY_ALLOCATION_FAILED;
+  const int32_t length = asn1_encode(X509_CERT_TYPE, &signed_cinf, certificate->span());
+  TRY(der_error(length));
+  certificate->truncate(static_cast<size_t>(length));
+  return KM_ERROR_OK;
+}
+
 }  // namespace
 
 outcome get_attest_key(uint32_t, tee_object* key) {
   const trace_scope scope;
   const TEE_Attribute attributes[] = {
-      ref_attribute(TEE_ATTR_RSA_MODULUS, ATTESTATION_KEY.modulus),
-      ref_attribute(TEE_ATTR_RSA_PUBLIC_EXPONENT, ATTESTATION_KEY.public_exponent),
-      ref_attribute(TEE_ATTR_RSA_PRIVATE_EXPONENT, ATTESTATION_KEY.private_exponent),
+      number_attribute(TEE_ATTR_RSA_MODULUS, ATTESTATION_KEY.modulus),
+      number_attribute(TEE_ATTR_RSA_PUBLIC_EXPONENT, ATTESTATION_KEY.public_exponent),
+      number_attribute(TEE_ATTR_RSA_PRIVATE_EXPONENT, ATTESTATION_KEY.private_exponent),
   };
   tee_object loaded;
   TEE_Result res = loaded.allocate(TEE_TYPE_RSA_KEYPAIR, ATTEST_KEY_BITS);
@@ -82,7 +101,8 @@ outcome get_attest_key(uint32_t, tee_object* key) {
   return DONE;
 }
 
-outcome X509_CINF_sign(const X509_CINF* cinf, const tee_object& key, heap_buffer* certificate) {
+outcome X509_CINF_sign(const X509_CINF* cinf, const tee_object& key, size_t capacity,
+                       heap_buffer* certificate) {
   const trace_scope scope;
   const ASN1_OID* id = cinf->signature.algorithm;
   const auto* algorithm = std::ranges::find(SIGNATURE_ALGORITHMS, id, &signature_algorithm::id);
@@ -99,10 +119,9 @@ outcome X509_CINF_sign(const X509_CINF* cinf, const tee_object& key, heap_buffer
   X509_ALGOR_set_rsa(&signed_cinf->algorithm, id);
   TRY(der_error(ASN1_BIT_STRING_set(&signed_cinf->signature, signature.size() * uint64_t{8},
                                     signature.view())));
-  const int32_t length = asn1_encode(X509_CERT_TYPE, signed_cinf.get(), certificate->span());
-  TRY(der_error(length));
-  certificate->truncate(static_cast<size_t>(length));
-  return DONE;
+  const size_t needed = encoding.size() + signature.size() + MAX_CERTIFICATE_OVERHEAD;
+  encoding.reset();
+  return encode_certificate(*signed_cinf.get(), needed, capacity, certificate);
 }
 
 }  // namespace keymaster

@@ -7,6 +7,7 @@
 
 #include "ta/base/bytes.h"
 #include "ta/base/heap.h"
+#include "ta/base/trace.h"
 #include "ta/der/der.h"
 
 namespace keymaster {
@@ -218,6 +219,7 @@ extern const asn1_type ASN1_TIME_TYPE;
 // asn1_list_type<...>.
 #define KM_DEFINE_ASN1_OPERATIONS(type)                                    \
   type* type##_alloc() {                                                   \
+    const trace_scope scope;                                               \
     return static_cast<type*>(asn1_alloc(type##_TYPE, sizeof(type)));      \
   }                                                                        \
   void type##_free(type* record) {                                         \

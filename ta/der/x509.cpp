@@ -150,17 +150,18 @@ KM_DEFINE_ASN1_RECORD(X509_CINF, asn1_sequence<X509_CINF_FIELDS>)
 KM_DEFINE_ASN1_RECORD(X509_CERT, asn1_sequence<X509_CERT_FIELDS>)
 
 X509_ATTR* X509_NAME_alloc_item(X509_NAME* name) {
+  const trace_scope scope;
   auto* item = static_cast<name_item*>(asn1_list_add(NAME_LIST, &name->entries));
   return item == nullptr ? nullptr : &item->attribute;
 }
 
 X509_EXTENSION* X509_EXTENSIONS_alloc_item(X509_EXTENSIONS* extensions) {
+  const trace_scope scope;
   auto* item = static_cast<extension_item*>(asn1_list_add(EXTENSION_LIST, &extensions->items));
   return item == nullptr ? nullptr : &item->extension;
 }
 
 int32_t X509_NAME_add(X509_NAME* name, const ASN1_OID* attribute, byte_view value) {
-  const trace_scope scope;
   X509_ATTR* entry = X509_NAME_alloc_item(name);
   if (entry == nullptr) return DER_NO_MEMORY;
   entry->type = attribute;

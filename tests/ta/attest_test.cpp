@@ -182,6 +182,10 @@ TEST(Attestation, Refusals) {
   EXPECT_TRUE(refused(ta.send(attest_request(bytes{1})), KM_ERROR_KEY_REQUIRES_UPGRADE));
   const bytes unique = ta.generate(param_set(EC_256_KEY).add_flag(KM_TAG_INCLUDE_UNIQUE_ID));
   EXPECT_TRUE(refused(ta.send(attest_request(unique)), KM_ERROR_UNIMPLEMENTED));
+  // What is asked for counts before the room for it.
+  const auto too_long = param_set().add_bytes(KM_TAG_ATTESTATION_CHALLENGE, bytes(129));
+  EXPECT_TRUE(refused(ta.send(attest_request(blob, too_long, 0)), KM_ERROR_INVALID_INPUT_LENGTH));
+  EXPECT_TRUE(refused(ta.send(attest_request(unique, {}, 3)), KM_ERROR_UNIMPLEMENTED));
   // A unique id is made of the creation date, which an imported RSA key has not.
   const bytes undated =
       ta.import(without(RSA_KEY, KM_TAG_KEY_SIZE).add_flag(KM_TAG_INCLUDE_UNIQUE_ID),
@@ -204,15 +208,20 @@ TEST(Attestation, OfShortCoordinates) {
   EXPECT_EQ(pkey::rsa_public(subject_of(chain.at(0))).number(OSSL_PKEY_PARAM_EC_PUB_X), x);
 }
 
-// Descriptions beyond the first buffer and beyond its double. The application is attested without
-// being asked for.
+// Descriptions beyond the first buffer and beyond its double, and a certificate beyond 64 KiB: the
+// output is the bound. The application is attested without being asked for.
 TEST(Attestation, OfLongDescriptions) {
   ta_under_test ta;
-  for (const size_t size : {1100u, 2500u}) {
+  for (const size_t size : {1100u, 2500u, 70'000u}) {
     const bytes application(size, 'x');
-    const bytes blob =
-        ta.generate(param_set(EC_256_KEY).add_bytes(KM_TAG_APPLICATION_ID, application));
-    const auto chain = parse_chain(ta.send_well(attest_request(blob)).output());
+    const request made = generate_request(
+        param_set(EC_256_KEY).add_bytes(KM_TAG_APPLICATION_ID, application), size + AMPLE);
+    const reply key = ta.send_well(made);
+    const reply whole = ta.send_well(attest_request(key.output(), {}, size + AMPLE));
+    const size_t first = whole.output_size - 4 - STORED_SIZE;
+    EXPECT_TRUE(refused(ta.send(attest_request(key.output(), {}, first - 1)),
+                        KM_ERROR_MEMORY_ALLOCATION_FAILED));
+    const auto chain = parse_chain(whole.output());
     const bytes description = extension_value(chain.at(0), KEY_DESCRIPTION);
     EXPECT_NE(std::ranges::search(description, application).begin(), description.end());
     EXPECT_EQ(X509_verify(chain[0].get(), X509_get0_pubkey(chain.at(1).get())), 1);

@@ -84,6 +84,35 @@ TEST(DerWriter, BitStringsGrowWhenBitsAreCleared) {
   ASN1_BIT_STRING_TYPE.free(&bits);
 }
 
+// The name that a failed allocation goes out under.
+template <class Make>
+std::string name_without_memory(Make make) {
+  platform::trace_lines.clear();
+  platform::allocations_to_fail = 1;
+  EXPECT_EQ(make(), nullptr);
+  if (platform::trace_lines.size() != 1) return "";
+  const std::string& line = platform::trace_lines[0];
+  EXPECT_NE(line.find(": Out of memory, need "), std::string::npos);
+  const size_t name = line.find("KEYMASTER:") + 10;
+  return line.substr(name, line.find(':', name) - name);
+}
+
+TEST_F(KeyDescriptions, AllocationsTraceUnderTheirOwnNames) {
+  const trace_scope caller("caller");
+  SET_OF_INTEGER set{};
+  X509_NAME name{};
+  X509_EXTENSIONS extensions{};
+  EXPECT_EQ(name_without_memory(X509_CINF_alloc), "X509_CINF_alloc");
+  EXPECT_EQ(name_without_memory(RSA_PUBKEY_alloc), "RSA_PUBKEY_alloc");
+  EXPECT_EQ(name_without_memory(KeyDescription_alloc), "KeyDescription_alloc");
+  EXPECT_EQ(name_without_memory([&] { return SET_OF_INTEGER_alloc_item(&set); }),
+            "SET_OF_INTEGER_alloc_item");
+  EXPECT_EQ(name_without_memory([&] { return X509_NAME_alloc_item(&name); }),
+            "X509_NAME_alloc_item");
+  EXPECT_EQ(name_without_memory([&] { return X509_EXTENSIONS_alloc_item(&extensions); }),
+            "X509_EXTENSIONS_alloc_item");
+}
+
 // Expected texts from `date -u -d @SECONDS`; the last year is beyond any calendar, and still text.
 TEST(DerWriter, Dates) {
   const std::pair<uint64_t, std::string> cases[] = {
