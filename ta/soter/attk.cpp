@@ -5,6 +5,7 @@
 
 #include <algorithm>
 
+#include "ta/alg/big_endian.h"
 #include "ta/base/outcome.h"
 #include "ta/soter/base64.h"
 #include "ta/soter/utf8.h"
@@ -33,13 +34,34 @@ TEE_Result export_der(TEE_ObjectHandle key, uint32_t key_bits, size_t capacity, 
     return fail(res, "TEE_SetOperationKey failed: %08x\n", res);
   }
   if (!der->allocate(capacity)) return fail(TEE_ERROR_OUT_OF_MEMORY, "Out of memory");
-  size_t length = capacity;
+  auto length = static_cast<tee_size>(capacity);
   if (TEE_Result res =
           TEE_AsymmetricExport(operation.get(), TEE_EXPORT_FORMAT_SPKI, der->data(), &length)) {
     return fail(res, "TEE_AsymmetricExport failed: %08x\n", res);
   }
   der->truncate(length);
   return TEE_SUCCESS;
+}
+
+// The key as the platform takes it: numbers without leading zeros, none longer than the modulus,
+// and that no longer than the object. A platform may end the TA for others.
+TEE_Result populate_attk(const soter_key_pair_t& key, TEE_ObjectHandle object) {
+  const std::pair<uint32_t, byte_view> numbers[] = {
+      {TEE_ATTR_RSA_MODULUS, key.n.view()},          {TEE_ATTR_RSA_PUBLIC_EXPONENT, key.e.view()},
+      {TEE_ATTR_RSA_PRIVATE_EXPONENT, key.d.view()}, {TEE_ATTR_RSA_PRIME1, key.p.view()},
+      {TEE_ATTR_RSA_PRIME2, key.q.view()},           {TEE_ATTR_RSA_EXPONENT1, key.dp.view()},
+      {TEE_ATTR_RSA_EXPONENT2, key.dq.view()},       {TEE_ATTR_RSA_COEFFICIENT, key.qinv.view()},
+  };
+  const size_t modulus_size = without_leading_zeros(key.n.view()).size();
+  if (modulus_size > ATTK_BITS / 8) return TEE_ERROR_BAD_PARAMETERS;
+  TEE_Attribute attributes[std::size(numbers)];
+  const uint32_t count = key.p.size() == 0 ? 3 : 8;
+  for (uint32_t i = 0; i < count; i++) {
+    const byte_view number = without_leading_zeros(numbers[i].second);
+    if (number.size() > modulus_size) return TEE_ERROR_BAD_PARAMETERS;
+    attributes[i] = ref_attribute(numbers[i].first, number);
+  }
+  return TEE_PopulateTransientObject(object, attributes, count);
 }
 
 }  // namespace
@@ -53,18 +75,7 @@ tee_object convert_key_to_object(const soter_key_pair_t& key_pair, uint32_t* key
     trace(TEE_TRACE_ERROR, "TEE_AllocateTransientObject failed: %08x\n", res);
     return {};
   }
-  const TEE_Attribute attributes[] = {
-      ref_attribute(TEE_ATTR_RSA_MODULUS, key_pair.n.view()),
-      ref_attribute(TEE_ATTR_RSA_PUBLIC_EXPONENT, key_pair.e.view()),
-      ref_attribute(TEE_ATTR_RSA_PRIVATE_EXPONENT, key_pair.d.view()),
-      ref_attribute(TEE_ATTR_RSA_PRIME1, key_pair.p.view()),
-      ref_attribute(TEE_ATTR_RSA_PRIME2, key_pair.q.view()),
-      ref_attribute(TEE_ATTR_RSA_EXPONENT1, key_pair.dp.view()),
-      ref_attribute(TEE_ATTR_RSA_EXPONENT2, key_pair.dq.view()),
-      ref_attribute(TEE_ATTR_RSA_COEFFICIENT, key_pair.qinv.view()),
-  };
-  const uint32_t count = key_pair.p.size() == 0 ? 3 : 8;
-  if (TEE_Result res = TEE_PopulateTransientObject(object.get(), attributes, count)) {
+  if (TEE_Result res = populate_attk(key_pair, object.get())) {
     trace(TEE_TRACE_ERROR, "TEE_PopulateTransientObject failed: %08x\n", res);
     return {};
   }

@@ -14,7 +14,6 @@ key_list::~key_list() {
 }
 
 bool key_list::add(uint16_t key, heap_buffer&& value) {
-  const trace_scope scope;
   if (find(key) != nullptr) return false;
   auto* added = heap_new<item>();
   if (added == nullptr) {

@@ -65,7 +65,6 @@ TEE_Result parse_buf_fill_key(soter_key_pair_t* key, byte_view serialized) {
 }
 
 TEE_Result load_key(soter_key_pair_t* key) {
-  const trace_scope scope;
   heap_buffer serialized;
   if (!serialized.allocate(KEY_BOX_CAPACITY)) {
     return fail(TEE_ERROR_OUT_OF_MEMORY, "No memory for serialization\n");
@@ -205,6 +204,10 @@ TEE_Result soter_init() {
 
 TEE_Result soter_check_init() {
   return loaded != nullptr ? TEE_SUCCESS : soter_init();
+}
+
+void soter_forget() {
+  loaded = nullptr;
 }
 
 void soter_deinit() {

@@ -39,6 +39,10 @@ struct soter_prop_set_t {
 [[nodiscard]] TEE_Result soter_init();
 void soter_deinit();
 
+// soter_forget: nothing is loaded; what an earlier instance in this process left is forgotten, not
+// freed.
+void soter_forget();
+
 // What is loaded; only after soter_check_init has succeeded.
 const soter_key_pair_t& soter_key_pair();
 const soter_prop_set_t& soter_prop_set();

@@ -147,6 +147,11 @@ TEST_F(Vault, AnswersThatMisbehaveKeepNothing) {
   twice.emplace_back(17, bytes(256, 0xFF));
   items wide = key_items(attk(), 3);  // of 4096 bits, as far as anyone can tell who has no factors
   wide[0].second.assign(512, 0xC5);
+  items padded = key;
+  for (auto& [tag, number] : padded)
+    number.insert(number.begin(), 300, 0);
+  items long_d = key_items(attk(), 3);
+  long_d[2].second.insert(long_d[2].second.begin(), 1);
   items uuid_15 = props;
   uuid_15[2].second.pop_back();
   // What the vault answers, and what 0xFF01 and 0xFF02 make of it.
@@ -164,6 +169,8 @@ TEST_F(Vault, AnswersThatMisbehaveKeepNothing) {
       {"a cut last item", {ASK_KEY, 0, 0, 0}, cut(box(key), 1), -2, -1},
       {"1024 bits", {ASK_KEY, 0, 0, 0}, box(key_items(pkey::rsa(1024))), 0, 0},
       {"4096 bits", {ASK_KEY, 0, 0, 0}, box(wide), 0, -1000},
+      {"leading zeros", {ASK_KEY, 0, 0, 0}, box(padded), 0, 0},
+      {"a private exponent beyond the modulus", {ASK_KEY, 0, 0, 0}, box(long_d), 0, -1000},
       {"no properties", {ASK_PROPERTIES, TEE_ERROR_ITEM_NOT_FOUND, FOR_EVER, 0}, {}, 0, -1},
       {"long properties", {ASK_PROPERTIES, 0, 0, 600}, box(props), 0, -1},
       {"a short UUID", {ASK_PROPERTIES, 0, 0, 0}, box(uuid_15), 0, -1},
