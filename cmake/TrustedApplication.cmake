@@ -10,6 +10,7 @@ set(TA_COMPILE_OPTIONS
     $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions> $<$<COMPILE_LANGUAGE:CXX>:-fno-rtti>
     $<$<COMPILE_LANGUAGE:CXX>:-fno-threadsafe-statics> -fvisibility=hidden
     -fno-asynchronous-unwind-tables -fno-math-errno -fno-stack-protector
+    $<$<CXX_COMPILER_ID:GNU>:-fno-gnu-unique>  # loaders of TEEs refuse files that are marked as GNU's
     -ffunction-sections -fdata-sections ${KEYMASTER_LTO_COMPILE})
 
 # A TA links the platform, the C library's few memory and text functions, and nothing else: no C++

@@ -88,8 +88,7 @@ keymaster_error_t read_user_auth(const keymaster_key_param_set_t& request, uint6
 }
 
 // One KM_TAG_USER_SECURE_ID of the key. No match is no refusal: another identifier may match.
-keymaster_error_t check_secure_id(uint64_t secure_id, const key_terms_t& terms,
-                                  user_auth_t* user) {
+keymaster_error_t check_secure_id(uint64_t secure_id, const key_terms_t& terms, user_auth_t* user) {
   if (terms.is_without_auth) {
     return refuse(KM_ERROR_INVALID_ARGUMENT,
                   "Found KM_TAG_USER_SECURE_ID but also KM_TAG_NO_AUTH_REQUIRED");

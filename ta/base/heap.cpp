@@ -3,8 +3,8 @@
 
 namespace keymaster {
 
-// The one place where memory is cleared: not every platform fills it, whatever the hint. The hint is
-// the one that all of them know.
+// The one place where memory is cleared: not every platform fills it, whatever the hint. The hint
+// is the one that all of them know.
 void* heap_take(size_t size) {
   const auto wanted = static_cast<tee_size>(size == 0 ? 1 : size);
   if (wanted < size) return nullptr;  // the platform's lengths have 32 bits

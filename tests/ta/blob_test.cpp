@@ -158,9 +158,9 @@ TEST(KeyStorageKey, OfWrongLengthIsReplacedOverTwoStarts) {
     ta.stop();
     store_ksk(ta, bytes(size, 7));
     EXPECT_EQ(ta.start(), KSK_DELETED) << size;
-    EXPECT_TRUE(ta.trace().has(
-        "key_store_init_rpmb_ksk: Wrong persistent data length, expected 32B, got " +
-        std::to_string(size) + "B"));
+    EXPECT_TRUE(
+        ta.trace().has("key_store_init_rpmb_ksk: Wrong persistent data length, expected 32B, got " +
+                       std::to_string(size) + "B"));
     EXPECT_TRUE(
         ta.trace().has("key_store_init_rpmb_ksk: Now, delete the key and recreate it, but "
                        "all previous keymaster key will die"));
