@@ -18,15 +18,18 @@ using tee::panic;
 
 namespace {
 
-// Runs a call to another instance with copied parameters: use(call_parameters*) makes it.
+// Runs a call to another instance with copied parameters: use(call_parameters*) makes it. It is
+// asked to end when the time is over or the caller is asked to.
 template <typename Use>
-TEE_Result call_out(const char* call, uint32_t types, TEE_Param* params, uint32_t* return_origin,
-                    Use use) {
+TEE_Result call_out(const char* call, uint32_t timeout_ms, uint32_t types, TEE_Param* params,
+                    uint32_t* return_origin, Use use) {
   uint32_t ignored = 0;
   uint32_t* origin = return_origin != nullptr ? return_origin : &ignored;
   *origin = TEE_ORIGIN_TEE;
   if (TEE_Result res = fault_point()) return res;
   tee::ta_parameters copies(call, types, params);
+  const tee::cancellation asked(timeout_ms, tee::current_instance(call).heard());
+  copies.for_callee()->asked = &asked;
   const call_result result = use(copies.for_callee());
   *origin = result.origin;
   if (result.origin == TEE_ORIGIN_TRUSTED_APP) copies.copy_back(params);
@@ -48,7 +51,7 @@ call_result open_session(const char* call, const TEE_UUID& destination, call_par
 
 }  // namespace
 
-TEE_Result TEE_OpenTASession(const TEE_UUID* destination, uint32_t /*cancellationRequestTimeout*/,
+TEE_Result TEE_OpenTASession(const TEE_UUID* destination, uint32_t cancellationRequestTimeout,
                              uint32_t paramTypes, TEE_Param params[4], TEE_TASessionHandle* session,
                              uint32_t* returnOrigin) {
   constexpr const char* CALL = "TEE_OpenTASession";
@@ -56,19 +59,19 @@ TEE_Result TEE_OpenTASession(const TEE_UUID* destination, uint32_t /*cancellatio
     if (destination == nullptr) panic(CALL, "destination is null");
     if (session == nullptr) panic(CALL, "session is null");
     *session = TEE_HANDLE_NULL;
-    return call_out(CALL, paramTypes, params, returnOrigin, [&](call_parameters* own) {
-      return open_session(CALL, *destination, own, session);
-    });
+    return call_out(
+        CALL, cancellationRequestTimeout, paramTypes, params, returnOrigin,
+        [&](call_parameters* own) { return open_session(CALL, *destination, own, session); });
   });
 }
 
-TEE_Result TEE_InvokeTACommand(TEE_TASessionHandle session, uint32_t /*cancellationRequestTimeout*/,
+TEE_Result TEE_InvokeTACommand(TEE_TASessionHandle session, uint32_t cancellationRequestTimeout,
                                uint32_t commandID, uint32_t paramTypes, TEE_Param params[4],
                                uint32_t* returnOrigin) {
   constexpr const char* CALL = "TEE_InvokeTACommand";
   return guarded(CALL, [&]() -> TEE_Result {
     tee::session& target = *tee::current_instance(CALL).sessions().get(session, CALL);
-    return call_out(CALL, paramTypes, params, returnOrigin,
+    return call_out(CALL, cancellationRequestTimeout, paramTypes, params, returnOrigin,
                     [&](call_parameters* own) { return target.invoke(commandID, own); });
   });
 }

@@ -1,5 +1,5 @@
 // TEE Client API 1.0: contexts and sessions. The TEE runs in the calling process; a context is
-// opened on a device folder. Cancellation has no effect: commands run to their end.
+// opened on a device folder.
 #include "tee_client_api.h"
 
 #include <cstring>
@@ -36,6 +36,8 @@ TEEC_Result call_in(const void* context, TEEC_Operation* operation, uint32_t* re
     tee::teec_parameters given;
     TEEC_Result taken = given.take(context, operation);
     if (taken != TEEC_SUCCESS) return taken;
+    const tee::operation_in_flight flight(operation);
+    given.for_callee()->asked = flight.asked();
     const call_result result = call(given.for_callee());
     origin = result.origin;
     if (origin == TEEC_ORIGIN_TRUSTED_APP && operation != nullptr) given.give_back(operation);
@@ -113,4 +115,9 @@ TEEC_Result TEEC_InvokeCommand(TEEC_Session* session, uint32_t commandID, TEEC_O
                  [&](call_parameters* own) { return client->session->invoke(commandID, own); });
 }
 
-void TEEC_RequestCancellation(TEEC_Operation* /*operation*/) {}
+void TEEC_RequestCancellation(TEEC_Operation* operation) {
+  client_call([&]() -> TEEC_Result {
+    tee::operation_in_flight::cancel(operation);
+    return TEEC_SUCCESS;
+  });
+}

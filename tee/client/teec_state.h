@@ -13,6 +13,7 @@
 #include <utility>
 #include <vector>
 
+#include "tee/core/cancellation.h"
 #include "tee/core/session.h"
 #include "tee/device/secret_bytes.h"
 
@@ -77,6 +78,25 @@ struct client_memory {
   uint8_t* buffer;
   size_t size;
   uint32_t flags;  // TEEC_MEM_
+};
+
+// A call with an operation, while it lasts; null: a call that nobody can cancel. A client cancels
+// by the operation's address, from another thread.
+class operation_in_flight {
+ public:
+  explicit operation_in_flight(const TEEC_Operation* operation);
+  operation_in_flight(const operation_in_flight&) = delete;
+  operation_in_flight& operator=(const operation_in_flight&) = delete;
+  ~operation_in_flight();
+
+  const cancellation* asked() const { return operation_ != nullptr ? &asked_ : nullptr; }
+
+  // cancel: requests the end of all calls with `operation`; none: no effect.
+  static void cancel(const TEEC_Operation* operation);
+
+ private:
+  const TEEC_Operation* operation_;
+  cancellation asked_;
 };
 
 // The tables of the process. Never destroyed: a program may end its contexts as late as it likes,

@@ -88,6 +88,15 @@ class handle_table {
     free_.push_back(static_cast<uint32_t>(slot_of(value)));
   }
 
+  // clear: ends all values and their handles.
+  void clear() {
+    for (uint32_t slot = 0; slot < slots_.size(); slot++) {
+      if (!slots_[slot]->value) continue;
+      slots_[slot]->value.reset();
+      free_.push_back(slot);
+    }
+  }
+
   size_t size() const { return slots_.size() - free_.size(); }
 
   // for_each: visit(handle, T&) for every live handle.

@@ -37,6 +37,16 @@ instance::~instance() {
            left.sessions);
 }
 
+// Operations hold keys of their own, so that the order among them is free; what lies in the heap
+// nobody needs any more.
+void instance::reclaim() {
+  sessions_.clear();
+  operations_.clear();
+  objects_.clear();
+  memory_.release_all();
+  keys_ = {};
+}
+
 void instance::set_client(const TEE_Identity* client) {
   client_ = client ? std::optional(*client) : std::nullopt;
 }

@@ -7,6 +7,7 @@
 #include <memory>
 #include <optional>
 
+#include "tee/core/cancellation.h"
 #include "tee/core/handles.h"
 #include "tee/core/heap.h"
 #include "tee/core/live_counts.h"
@@ -46,6 +47,21 @@ class instance {
   // which its client can read or change at any time.
   bool holds_of_client(const void* data, size_t length) const;
 
+  // asked: what can end the entry point that runs early; null: nothing. Until the trusted
+  // application says otherwise, it does not want to know (`cancellation_masked`).
+  const cancellation* asked() const { return asked_; }
+  void set_asked(const cancellation* asked) {
+    asked_ = asked;
+    cancellation_masked = true;
+  }
+  bool cancellation_masked = true;
+
+  // heard: `asked` as far as it is not masked.
+  const cancellation* heard() const { return cancellation_masked ? nullptr : asked_; }
+
+  // reclaim: closes, frees and wipes all that the trusted application holds.
+  void reclaim();
+
   // properties: the instance's gpd.ta.* and its own properties, by full name. gpd.ta.appID is there
   // from the start, and defaults of those that every trusted application has.
   property_map& properties() { return properties_; }
@@ -67,6 +83,7 @@ class instance {
   session_opener* opener_;
   std::optional<TEE_Identity> client_;
   const call_parameters* parameters_ = nullptr;  // of the entry point that runs, if it has any
+  const cancellation* asked_ = nullptr;
   property_map properties_;
 };
 

@@ -1,11 +1,24 @@
 // Ends a trusted application that broke a rule of the API.
 #include "tee/core/panic.h"
 
+#include <atomic>
 #include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
 
+#include "tee/core/log.h"
+
 namespace tee {
+
+namespace {
+
+std::atomic<bool> process_ends = false;
+
+}  // namespace
+
+void end_process_on_panic(bool wanted) {
+  process_ends = wanted;
+}
 
 void panic(const char* call, const char* format, ...) {
   char message[256];
@@ -13,8 +26,13 @@ void panic(const char* call, const char* format, ...) {
   va_start(arguments, format);
   std::vsnprintf(message, sizeof(message), format, arguments);
   va_end(arguments);
-  std::fprintf(stderr, "panic: %s: %s\n", call, message);
-  std::abort();
+  if (at_border.innermost == nullptr || process_ends) {
+    std::fprintf(stderr, "panic: %s: %s\n", call, message);
+    std::abort();
+  }
+  log_line(TEE_TRACE_ERROR, "panic: %s: %s", call, message);
+  if (at_border.in_trusted) leave_trusted(LEFT_BY_PANIC);
+  throw panic_in_host{};
 }
 
 }  // namespace tee

@@ -1,7 +1,6 @@
 // The entrance to an instance: one chain of calls at a time, and no waiting for ever.
 #include "tee/host/call_gate.h"
 
-#include <condition_variable>
 #include <mutex>
 
 namespace tee {
@@ -11,19 +10,6 @@ struct call_chain {
 };
 
 namespace {
-
-// One lock for all gates: who waits for whom is looked at as a whole. Never destroyed, since
-// programs may close sessions as late as they like.
-struct gate_state {
-  std::mutex mutex;
-  std::condition_variable left;
-  size_t waiting = 0;
-};
-
-gate_state& gates() {
-  static gate_state& state = *new gate_state;
-  return state;
-}
 
 call_chain& own_chain() {
   thread_local call_chain chain;
@@ -41,25 +27,36 @@ bool call_gate::waits_for(const call_chain& chain) const {
   return false;
 }
 
-bool call_gate::enter() {
+call_gate::outcome call_gate::enter(const cancellation* asked) {
   call_chain& chain = own_chain();
-  std::unique_lock lock(gates().mutex);
+  waiting_room& room = waiting_room::get();
+  std::unique_lock lock(room.mutex);
   while (holder_ != nullptr) {
-    if (waits_for(chain)) return false;
+    if (waits_for(chain)) return outcome::HELD;
+    if (asked != nullptr && asked->requested()) return outcome::CANCELLED;
     chain.awaited = this;
-    ++gates().waiting;
-    gates().left.wait(lock);
-    --gates().waiting;
+    ++room.at_gates;
+    waiting_room::wait(lock, room.left, asked);
+    --room.at_gates;
     chain.awaited = nullptr;
   }
+  if (asked != nullptr && asked->requested()) return outcome::CANCELLED;
   holder_ = &chain;
+  return outcome::INSIDE;
+}
+
+bool call_gate::try_enter() {
+  std::lock_guard lock(waiting_room::get().mutex);
+  if (holder_ != nullptr) return false;
+  holder_ = &own_chain();
   return true;
 }
 
 void call_gate::leave() {
-  std::lock_guard lock(gates().mutex);
+  waiting_room& room = waiting_room::get();
+  std::lock_guard lock(room.mutex);
   holder_ = nullptr;
-  if (gates().waiting > 0) gates().left.notify_all();
+  if (room.at_gates > 0) room.left.notify_all();
 }
 
 }  // namespace tee

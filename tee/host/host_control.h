@@ -8,9 +8,11 @@
 
 #include "tee/core/heap.h"
 #include "tee/core/live_counts.h"
+#include "tee/core/panic.h"
 #include "tee/core/profile.h"
 #include "tee/core/trace.h"
 #include "tee/device/clock.h"
+#include "tee/host/survival.h"
 
 namespace tee::host {
 
@@ -28,6 +30,11 @@ using tee::live_counts;
 using tee::current_profile;
 using tee::profile;
 using tee::set_profile;
+
+// For processes that run trusted applications only (survival.h); panics that end the process.
+using tee::end_process_on_panic;
+using tee::set_runaway_grace;
+using tee::survive_faults;
 
 // counts_of: what the instance of `ta` holds; false (and *counts untouched) when none is alive.
 // Call it while no command runs in that instance.

@@ -1,6 +1,7 @@
 // The trusted applications of an open device.
 #include "tee/host/ta_host.h"
 
+#include <algorithm>
 #include <condition_variable>
 #include <filesystem>
 #include <new>
@@ -104,10 +105,10 @@ call_result ta_host::open_session(const TEE_UUID& destination, const TEE_Identit
 TEE_Result ta_host::instance_of(const TEE_UUID& uuid, std::shared_ptr<ta_instance>* found) {
   std::lock_guard lock(mutex_);
   auto place = instances_.find(to_bytes(uuid));
-  if (place == instances_.end()) {
+  if (place == instances_.end() || !place->second->rules().single_instance) {
     std::shared_ptr<ta_instance> made;
     if (TEE_Result res = ta_instance::load(uuid, *device_, *this, &made)) return res;
-    place = instances_.emplace(to_bytes(uuid), std::move(made)).first;
+    place = instances_.emplace(to_bytes(uuid), std::move(made));
   }
   *found = place->second;
   return TEE_SUCCESS;
@@ -119,10 +120,14 @@ std::shared_ptr<ta_instance> ta_host::find(const TEE_UUID& uuid) {
   return place == instances_.end() ? nullptr : place->second;
 }
 
-void ta_host::drop(const std::shared_ptr<ta_instance>& instance) {
+void ta_host::drop(const ta_instance& ended) {
+  std::shared_ptr<ta_instance> last;  // goes after the lock
   std::lock_guard lock(mutex_);
-  auto place = instances_.find(to_bytes(instance->core().uuid()));
-  if (place != instances_.end() && place->second == instance) instances_.erase(place);
+  auto place = std::find_if(instances_.begin(), instances_.end(),
+                            [&](const auto& entry) { return entry.second.get() == &ended; });
+  if (place == instances_.end()) return;
+  last = std::move(place->second);
+  instances_.erase(place);
 }
 
 std::shared_ptr<instance> find_instance(const TEE_UUID& ta) {

@@ -15,9 +15,10 @@
 
 namespace tee {
 
-// One for each device that the process has open, shared by all who use the device. Instances are
-// made by the first session and live until the host is destroyed, so that what a trusted
-// application keeps in its globals lasts from session to session.
+// One for each device that the process has open, shared by all who use the device. Instances live
+// as their rules have it (ta_instance.h), at most until the host is destroyed. One that is kept
+// alive is made by the first session and stays, so that what a trusted application keeps in its
+// globals lasts from session to session.
 class ta_host final : public session_opener {
  public:
   // open: the host of the device at `path`; opens the device if this process does not have it open.
@@ -35,14 +36,15 @@ class ta_host final : public session_opener {
   call_result open_session(const TEE_UUID& destination, const TEE_Identity& client,
                            call_parameters* parameters, std::shared_ptr<session>* opened) override;
 
-  // instance_of: the instance of `uuid`, loaded if there is none. Codes as ta_library::load.
+  // instance_of: the instance of `uuid` for a further session, loaded if there is none that takes
+  // it. Codes as ta_library::load.
   [[nodiscard]] TEE_Result instance_of(const TEE_UUID& uuid, std::shared_ptr<ta_instance>* found);
 
-  // find: the instance of `uuid`, or null.
+  // find: an instance of `uuid`, or null.
   std::shared_ptr<ta_instance> find(const TEE_UUID& uuid);
 
-  // drop: forgets an instance whose create entry point failed.
-  void drop(const std::shared_ptr<ta_instance>& instance);
+  // drop: forgets an instance that nobody may enter any more.
+  void drop(const ta_instance& ended);
 
  private:
   std::shared_ptr<ta_instance> take_next_to_end();
@@ -51,7 +53,7 @@ class ta_host final : public session_opener {
   const std::string key_;
   std::unique_ptr<device> device_;
   std::mutex mutex_;
-  std::map<uuid_bytes, std::shared_ptr<ta_instance>> instances_;
+  std::multimap<uuid_bytes, std::shared_ptr<ta_instance>> instances_;
 };
 
 // find_instance: the instance of `ta` on any open device; null when none is alive.

@@ -5,6 +5,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <mutex>
 #include <utility>
 
 #include "tee/core/session.h"
@@ -19,8 +20,7 @@ class ta_session final : public session {
                           call_parameters* parameters, std::shared_ptr<session>* opened);
 
   // What open makes its results with.
-  ta_session(std::shared_ptr<ta_instance> target, const TEE_Identity& client)
-      : target_(std::move(target)), client_(client) {}
+  explicit ta_session(const TEE_Identity& client) : client_(client) {}
   ~ta_session() override { end(); }
 
   call_result invoke(uint32_t command, call_parameters* parameters) override;
@@ -28,12 +28,13 @@ class ta_session final : public session {
   bool is_with(const instance& target) const override;
 
  private:
+  std::shared_ptr<ta_instance> target() const;
   void end();
 
-  std::shared_ptr<ta_instance> target_;
-  TEE_Identity client_;
+  const TEE_Identity client_;
+  mutable std::mutex mutex_;
+  std::shared_ptr<ta_instance> target_;  // while it is open
   void* context_ = nullptr;
-  bool open_ = false;
 };
 
 }  // namespace tee

@@ -3,6 +3,7 @@
 // against its own TEE's header of the same name.
 #pragma once
 
+#include <stdbool.h>
 #include <stddef.h>
 #include <stdint.h>
 
@@ -174,6 +175,13 @@ TEE_Result TEE_GetPropertyAsIdentity(TEE_PropSetHandle propsetOrEnumerator, cons
 
 void TEE_GetSystemTime(TEE_Time* time);
 void TEE_GetREETime(TEE_Time* time);
+TEE_Result TEE_Wait(uint32_t timeout);
+
+// Cancellation.
+
+bool TEE_GetCancellationFlag(void);
+bool TEE_UnmaskCancellation(void);
+bool TEE_MaskCancellation(void);
 
 // Sessions to other trusted applications.
 

@@ -103,6 +103,7 @@ ta_under_test::ta_under_test(const options& wanted)
   settings.identity = DEVICE_ID;
   settings.rpmb = wanted.rpmb;
   tee::device::create(path_, settings);
+  tee::host::end_process_on_panic(true);  // a panic is a defect, and this finds its place
   EXPECT_EQ(start(), TEEC_SUCCESS) << trace_.errors();
 }
 

@@ -128,5 +128,17 @@ TEST_F(Operations, OutliveTheirSessionAndAConfigureButNotTheirInstance) {
   expect_gone(lost);
 }
 
+TEST_F(Operations, OutliveAnotherTrustedApplicationThatDies) {
+  constexpr TEEC_UUID FAULTY = {0x1f3c5e70, 0x0010, 0x4a00, {0x80, 0, 0, 0, 0, 0, 0, 1}};
+  constexpr uint32_t PANIC = 3;
+  const uint32_t handle = begun();
+  client::parameter_slots slots{};
+  tee::host::end_process_on_panic(false);
+  client::connection other(client::context(ta.path()), FAULTY);
+  EXPECT_EQ(other.invoke(PANIC, TEEC_VALUE_INPUT, &slots).tee, TEEC_ERROR_TARGET_DEAD);
+  tee::host::end_process_on_panic(true);
+  EXPECT_TRUE(succeeded(ta.finish(handle, as_bytes("Hi There"))));
+}
+
 }  // namespace
 }  // namespace keymaster::test
