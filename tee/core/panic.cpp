@@ -30,8 +30,10 @@ void panic(const char* call, const char* format, ...) {
     std::fprintf(stderr, "panic: %s: %s\n", call, message);
     std::abort();
   }
+  const bool guarded = !at_border.in_trusted;
+  at_border.in_trusted = false;  // until here, a handler may leave
   log_line(TEE_TRACE_ERROR, "panic: %s: %s", call, message);
-  if (at_border.in_trusted) leave_trusted(LEFT_BY_PANIC);
+  if (!guarded) leave_trusted(LEFT_BY_PANIC);
   throw panic_in_host{};
 }
 
