@@ -4,11 +4,11 @@
 #include "tee/core/heap.h"
 
 #include <algorithm>
-#include <cstdlib>
 #include <cstring>
 #include <utility>
 
 #include "tee/core/panic.h"
+#include "tee/device/secret_memory.h"
 
 namespace tee {
 namespace {
@@ -41,7 +41,7 @@ void wipe_and_free(void* block, size_t size) {
   show(block_stage::RELEASED, block, size);
   if (size > 0) explicit_bzero(block, size);
   show(block_stage::WIPED, block, size);
-  std::free(block);
+  release_secret(block, size);
 }
 
 }  // namespace
@@ -87,8 +87,7 @@ heap::~heap() {
 void* heap::allocate(size_t size, bool zero) {
   if (charge_of(size) > limit_ - bytes_) return nullptr;
   if ((count_ + 1) * 2 > table_.size()) grow();
-  // calloc would pass by the allocator's cache of freed blocks.
-  void* block = std::malloc(size);
+  void* block = allocate_secret(size);
   if (!block) return nullptr;
   if (size > 0) std::memset(block, zero ? 0 : UNFILLED, size);
   table_[slot_of(block)] = {block, size};

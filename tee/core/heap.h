@@ -1,6 +1,5 @@
-// The heap of a trusted application: bounded, accounted, wiped when freed. Each block is an
-// allocation of its own and exactly as long as was asked for, so that an address sanitizer sees one
-// byte too far.
+// The heap of a trusted application: bounded, accounted, wiped when freed. Blocks lie where secrets
+// lie; each is an allocation of its own, so that an address sanitizer sees one byte too far.
 #pragma once
 
 #include <cstddef>

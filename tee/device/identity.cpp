@@ -23,6 +23,13 @@ device_key check_value(const device_key& key) {
   return derive_key(key, "device key check");
 }
 
+secret_bytes secret_bytes_of(const TEE_UUID& identity) {
+  uuid_bytes bytes = to_bytes(identity);
+  secret_bytes copy(bytes.begin(), bytes.end());
+  OPENSSL_cleanse(bytes.data(), bytes.size());
+  return copy;
+}
+
 mac_bytes identity_mac(const device_key& key, std::span<const uint8_t> bytes) {
   return compute_mac(derive_key(key, "device identity"), bytes);
 }
@@ -58,8 +65,7 @@ secret_bytes encode(const device_secrets& secrets) {
 }  // namespace
 
 device_secrets new_secrets(const TEE_UUID& identity, bool rpmb) {
-  const uuid_bytes bytes = to_bytes(identity);
-  device_secrets made{device_key(DEVICE_KEY_LENGTH), {bytes.begin(), bytes.end()}, rpmb};
+  device_secrets made{device_key(DEVICE_KEY_LENGTH), secret_bytes_of(identity), rpmb};
   fill_random(made.key);
   return made;
 }
@@ -102,12 +108,13 @@ device_secrets load_identity(const device_folder& folder, device_key key) {
 TEE_UUID identity_uuid(const device_secrets& secrets) {
   uuid_bytes bytes{};
   std::ranges::copy(secrets.identity, bytes.begin());
-  return from_bytes(bytes);
+  const TEE_UUID identity = from_bytes(bytes);
+  OPENSSL_cleanse(bytes.data(), bytes.size());
+  return identity;
 }
 
 TEE_UUID public_id_of(const TEE_UUID& identity) {
-  const uuid_bytes bytes = to_bytes(identity);
-  const device_key made = derive_key({bytes.begin(), bytes.end()}, "public id of a device");
+  const device_key made = derive_key(secret_bytes_of(identity), "public id of a device");
   uuid_bytes id{};
   std::copy_n(made.begin(), id.size(), id.begin());
   return custom_uuid(id);

@@ -1,11 +1,13 @@
-// Byte strings that hold secrets: their memory is wiped before it is freed.
+// Byte strings that hold secrets: they lie where secrets lie and are wiped before they are freed.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
-#include <memory>
+#include <new>
 #include <openssl/crypto.h>
 #include <vector>
+
+#include "tee/device/secret_memory.h"
 
 namespace tee {
 
@@ -15,10 +17,14 @@ struct wiping_allocator {
   wiping_allocator() = default;
   template <typename U>
   explicit wiping_allocator(const wiping_allocator<U>& /*other*/) {}
-  T* allocate(size_t count) { return std::allocator<T>().allocate(count); }
+  T* allocate(size_t count) {
+    if (count > SIZE_MAX / sizeof(T)) throw std::bad_alloc();
+    if (void* block = allocate_secret(count * sizeof(T))) return static_cast<T*>(block);
+    throw std::bad_alloc();
+  }
   void deallocate(T* block, size_t count) {
     OPENSSL_cleanse(block, count * sizeof(T));
-    std::allocator<T>().deallocate(block, count);
+    release_secret(block, count * sizeof(T));
   }
   bool operator==(const wiping_allocator& /*other*/) const { return true; }
 };

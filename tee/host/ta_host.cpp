@@ -8,6 +8,8 @@
 #include <system_error>
 #include <utility>
 
+#include "tee/core/log.h"
+#include "tee/device/secret_memory.h"
 #include "tee/host/ta_session.h"
 
 namespace tee {
@@ -52,6 +54,10 @@ std::shared_ptr<ta_host> ta_host::open(const std::string& path) {
     hosts().ended.wait(lock);
   }
   auto host = std::make_shared<ta_host>(key, device::open(key));
+  if (int failure = take_lock_failure()) {
+    log_line(TEE_TRACE_ERROR, "keys can be swapped out: cannot lock memory: %s (see ulimit -l)",
+             std::generic_category().message(failure).c_str());
+  }
   hosts().places.insert({key, {host, host.get()}});
   return host;
 }
