@@ -2,9 +2,11 @@
 #
 # ta_library(NAME SOURCES file... [LIBRARIES target...])
 #   A static library of TA code: no exceptions, no RTTI, no hidden runtime.
-# trusted_application(NAME UUID uuid LIBRARIES target... [SOURCES file...])
+# trusted_application(NAME UUID uuid LIBRARIES target... [SOURCES file...] [LINK_OPTIONS option...]
+#                     [FOLDER folder])
 #   The shared object ta/<uuid>.ta that exports the five TA_ entry points (host builds only). The
-#   uuid is written out or is a name of product/uuids.h.
+#   uuid is written out or is a name of product/uuids.h. With FOLDER it lies there in place of ta/,
+#   below the build tree, and is not installed.
 
 set(TA_COMPILE_OPTIONS
     $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions> $<$<COMPILE_LANGUAGE:CXX>:-fno-rtti>
@@ -50,7 +52,7 @@ function(product_uuid name result)
 endfunction()
 
 function(trusted_application name)
-  cmake_parse_arguments(ARG "" "UUID" "SOURCES;LIBRARIES" ${ARGN})
+  cmake_parse_arguments(ARG "" "UUID;FOLDER" "SOURCES;LIBRARIES;LINK_OPTIONS" ${ARGN})
   if(ARG_UUID MATCHES "^[A-Z_]+$")
     product_uuid(${ARG_UUID} ARG_UUID)
   endif()
@@ -58,10 +60,16 @@ function(trusted_application name)
   target_compile_options(${name} PRIVATE ${TA_COMPILE_OPTIONS})
   target_link_libraries(${name} PRIVATE ${ARG_LIBRARIES} teec ${TA_LINK_LIBRARIES})
   target_link_options(${name} PRIVATE ${TA_LINK_OPTIONS} ${KEYMASTER_NO_UNDEFINED} -Wl,--gc-sections
-                      -Wl,-z,now -Wl,--version-script=${TA_EXPORTS})
+                      -Wl,-z,now -Wl,--version-script=${TA_EXPORTS} ${ARG_LINK_OPTIONS})
   set_target_properties(${name} PROPERTIES
       KEYMASTER_TA ON LINK_DEPENDS ${TA_EXPORTS} PREFIX "" SUFFIX ".ta" OUTPUT_NAME ${ARG_UUID}
       LIBRARY_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/ta
       BUILD_RPATH "$ORIGIN/../lib" INSTALL_RPATH "$ORIGIN/..")
-  install(TARGETS ${name} LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}/tee)
+  if(ARG_FOLDER)
+    set_target_properties(${name} PROPERTIES
+        LIBRARY_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/${ARG_FOLDER}
+        BUILD_RPATH "${PROJECT_BINARY_DIR}/lib")
+  else()
+    install(TARGETS ${name} LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}/tee)
+  endif()
 endfunction()

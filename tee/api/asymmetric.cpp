@@ -70,11 +70,21 @@ void check_digest_length(const char* call, const operation& op, size_t length) {
   if (length != expected) panic(call, "a digest of %zu bytes, not %zu", length, expected);
 }
 
+// To the standard, codes are no lengths.
 tee::crypto::pss_salt salt_of(parameters params) {
+  constexpr uint32_t LONGEST = INT32_MAX;
   for (const TEE_Attribute& given : params) {
-    if (given.attributeID == TEE_ATTR_RSA_PSS_SALT_LENGTH) return given.content.value.a;
+    if (given.attributeID != TEE_ATTR_RSA_PSS_SALT_LENGTH) continue;
+    const uint32_t length = given.content.value.a;
+    if (length < LONGEST || tee::current_profile().extensions) return length;
   }
   return std::nullopt;
+}
+
+// Raw results as the standard's platforms give them: as long as the modulus.
+void widen_raw(const operation& op, tee::secret_bytes* result) {
+  if (op.algorithm.padding != rsa_padding::NONE || tee::current_profile().extensions) return;
+  result->insert(result->begin(), tee::crypto::modulus_length(*op.key) - result->size(), 0);
 }
 
 // The room to ask for before encrypting; 0 where the length is only known afterwards.
@@ -113,6 +123,7 @@ TEE_Result crypt(const char* call, operation& op, parameters params, std::span<c
   auto run = op.mode == TEE_MODE_ENCRYPT ? tee::crypto::rsa_encrypt : tee::crypto::rsa_decrypt;
   tee::secret_bytes result;
   if (TEE_Result res = run(*op.key, op.algorithm, oaep, input, &result)) return res;
+  widen_raw(op, &result);
   tee::require_apart(call, input, output.data(), std::min(result.size(), output.capacity()),
                      tee::same_place::ALLOWED);
   return output.fill(result);

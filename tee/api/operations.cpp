@@ -76,6 +76,19 @@ bool size_fits(const operation& op, uint32_t key_bits) {
   return op.max_bits == 0 || key_bits <= op.max_bits;
 }
 
+bool is_extension(uint32_t algorithm, uint32_t mode) {
+  switch (algorithm) {
+    case TEE_ALG_RSAES_OAEP_PLATFORM_SHA1:
+    case TEE_ALG_RSAES_OAEP_PLATFORM_SHA224:
+    case TEE_ALG_RSAES_OAEP_PLATFORM_SHA256:
+    case TEE_ALG_RSAES_OAEP_PLATFORM_SHA384:
+    case TEE_ALG_RSAES_OAEP_PLATFORM_SHA512:
+      return true;
+    default:
+      return mode == TEE_MODE_EXPORT;
+  }
+}
+
 // The rights that an operation needs of its key.
 uint32_t needed_usage(const operation& op) {
   bool raw_rsa = op.algorithm.id == TEE_ALG_RSA_NOPAD;
@@ -137,7 +150,8 @@ TEE_Result TEE_AllocateOperation(TEE_OperationHandle* operation, uint32_t algori
     *operation = TEE_HANDLE_NULL;
     if (TEE_Result fault = fault_point()) return fault;
     const auto* row = tee::crypto::find_algorithm(algorithm);
-    if (!row || !row->allows(mode) || !size_fits(*row, mode, maxKeySize)) {
+    if (!row || !row->allows(mode) || !size_fits(*row, mode, maxKeySize) ||
+        (!tee::current_profile().extensions && is_extension(algorithm, mode))) {
       return TEE_ERROR_NOT_SUPPORTED;
     }
     *operation = running.operations().emplace(*row, mode, maxKeySize, &running.digests());

@@ -21,6 +21,8 @@ namespace {
 constexpr uint32_t CORE_API_VERSION = 0x01030000;  // major, minor, maintenance, 0
 // How hard it is to tamper with: 100, as hard as for the normal world's own software.
 constexpr uint32_t PROTECTED_BY_REE = 100;
+// The largest number of TEE_BigInt..., in bits: half the modulus of the largest RSA key would do.
+constexpr uint32_t MAX_BIG_INT_BITS = 8192;
 
 // What is the same on every device. Versions in binary are empty: there is none but the text.
 struct fixed_property {
@@ -30,6 +32,7 @@ struct fixed_property {
 constexpr fixed_property FIXED[] = {
     {"gpd.tee.apiversion", "1.3"},
     {"gpd.tee.internalCore.version", CORE_API_VERSION},
+    {"gpd.tee.arith.maxBigIntSize", MAX_BIG_INT_BITS},
     {"gpd.tee.description", "TEE on a general-purpose host"},
     {"gpd.tee.systemTime.protectionLevel", PROTECTED_BY_REE},
     {"gpd.tee.trustedStorage.antiRollback.protectionLevel", PROTECTED_BY_REE},
@@ -146,6 +149,17 @@ TEE_Result TEE_GetPropertyAsString(TEE_PropSetHandle propsetOrEnumerator, const 
         tee::output_buffer text(CALL, "valueBuffer", valueBuffer, valueBufferLen);
         return tee::put_text(tee::property_text(value), text);
       });
+}
+
+TEE_Result TEE_GetPropertyAsU32(TEE_PropSetHandle propsetOrEnumerator, const char* name,
+                                uint32_t* value) {
+  return tee::get_property("TEE_GetPropertyAsU32", propsetOrEnumerator, name, value,
+                           [&](const property_value& property) -> TEE_Result {
+                             auto* number = std::get_if<uint32_t>(&property);
+                             if (!number) return TEE_ERROR_BAD_FORMAT;
+                             *value = *number;
+                             return TEE_SUCCESS;
+                           });
 }
 
 TEE_Result TEE_GetPropertyAsUUID(TEE_PropSetHandle propsetOrEnumerator, const char* name,

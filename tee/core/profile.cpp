@@ -18,7 +18,8 @@ bool names(std::string_view list, std::string_view word) {
 
 profile from_environment() {
   const char* words = secure_getenv("TEE_PROFILE");
-  return {.strict = words != nullptr && names(words, "strict")};
+  if (words == nullptr) return {};
+  return {.strict = names(words, "strict"), .extensions = !names(words, "standard")};
 }
 
 profile& chosen() {

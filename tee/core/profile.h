@@ -11,6 +11,11 @@ struct profile {
   // the trusted application's, no memory for a key. RSA ends at 4096 bits, and memory is zero only
   // where that is promised.
   bool strict = false;
+  // "standard" says no: the platform has no cryptography beyond the standard, neither export of
+  // public keys nor OAEP identifiers and PSS salt codes of its own (codes are taken for no
+  // attribute at all), and results of raw RSA keep their leading zeros. Storage, boot seed and
+  // trace stay.
+  bool extensions = true;
 };
 
 const profile& current_profile();

@@ -26,7 +26,7 @@ using tee::trace_sink;
 
 using tee::live_counts;
 
-// How strict the platform is (profile.h).
+// What kind of platform trusted applications find (profile.h).
 using tee::current_profile;
 using tee::profile;
 using tee::set_profile;

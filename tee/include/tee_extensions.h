@@ -2,7 +2,7 @@
 // key export, PSS salt codes, OAEP identifiers, and trace output.
 #pragma once
 
-#include "tee_internal_api.h"
+#include <tee_internal_api.h>  // the platform's, which need not lie beside this file
 
 #ifdef __cplusplus
 extern "C" {
@@ -10,7 +10,10 @@ extern "C" {
 
 // TEE_STORAGE_RPMB: storage identifier of the replay-protected (RPMB) trusted storage. Same rules
 // as TEE_STORAGE_PRIVATE; TEE_ERROR_ITEM_NOT_FOUND from open when the device has no such storage.
+// A port may have given another value.
+#ifndef TEE_STORAGE_RPMB
 #define TEE_STORAGE_RPMB 0x80000001
+#endif
 
 // TEE_RPMB_MakeFileSystem: makes the replay-protected file system when it does not yet exist;
 // erases nothing and may be called on every start. `state` receives a platform word. TEE_SUCCESS

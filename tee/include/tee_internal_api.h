@@ -166,6 +166,8 @@ void TEE_Free(void* buffer);
 
 TEE_Result TEE_GetPropertyAsString(TEE_PropSetHandle propsetOrEnumerator, const char* name,
                                    char* valueBuffer, size_t* valueBufferLen);
+TEE_Result TEE_GetPropertyAsU32(TEE_PropSetHandle propsetOrEnumerator, const char* name,
+                                uint32_t* value);
 TEE_Result TEE_GetPropertyAsUUID(TEE_PropSetHandle propsetOrEnumerator, const char* name,
                                  TEE_UUID* value);
 TEE_Result TEE_GetPropertyAsIdentity(TEE_PropSetHandle propsetOrEnumerator, const char* name,
@@ -390,6 +392,24 @@ TEE_Result TEE_AsymmetricVerifyDigest(TEE_OperationHandle operation, const TEE_A
                                       const void* signature, size_t signatureLen);
 
 void TEE_GenerateRandom(void* randomBuffer, size_t randomBufferLen);
+
+// Arithmetic. A big integer lies in memory of the application; its words are the platform's.
+
+typedef uint32_t TEE_BigInt;
+
+#define TEE_BigIntSizeInU32(n) ((((n) + 31) / 32) + 2)
+
+void TEE_BigIntInit(TEE_BigInt* bigInt, size_t len);
+TEE_Result TEE_BigIntConvertFromOctetString(TEE_BigInt* dest, const uint8_t* buffer,
+                                            size_t bufferLen, int32_t sign);
+int32_t TEE_BigIntCmp(const TEE_BigInt* op1, const TEE_BigInt* op2);
+int32_t TEE_BigIntCmpS32(const TEE_BigInt* op, int32_t shortVal);
+void TEE_BigIntMod(TEE_BigInt* dest, const TEE_BigInt* op, const TEE_BigInt* n);
+void TEE_BigIntAddMod(TEE_BigInt* dest, const TEE_BigInt* op1, const TEE_BigInt* op2,
+                      const TEE_BigInt* n);
+void TEE_BigIntMulMod(TEE_BigInt* dest, const TEE_BigInt* op1, const TEE_BigInt* op2,
+                      const TEE_BigInt* n);
+int32_t TEE_BigIntIsProbablePrime(const TEE_BigInt* op, uint32_t confidenceLevel);
 
 #ifdef __cplusplus
 }

@@ -4,6 +4,8 @@
 #include <filesystem>
 #include <stdlib.h>
 
+#include "support/ta_folders.h"
+
 namespace keymaster::test {
 namespace {
 
@@ -96,6 +98,7 @@ testing::AssertionResult failed_with(const reply& answer, TEEC_Result res) {
 
 ta_under_test::ta_under_test(const options& wanted)
     : options_(wanted), path_(make_folder()), trace_(wanted.trace_level) {
+  use_own_tas();
   tee::host::clear_fault();
   tee::host::set_clocks(START_SYSTEM_MS, START_REE_MS);
   tee::host::set_block_hook(inspect_freed, this);

@@ -2,6 +2,7 @@
 #include <dlfcn.h>
 
 #include "support/sets.h"
+#include "support/ta_folders.h"
 #include "support/ta_under_test.h"
 #include "tee/core/instance.h"
 
@@ -110,7 +111,7 @@ TEST(EntryPoints, CreateForgetsTheInstanceBefore) {
   const auto device = tee::device::open(ta.path());
   tee::instance instance(KEYMASTER_TA, *device, 1 << 20);
   tee::instance_scope running(instance);
-  void* loaded = dlopen(KEYMASTER_TA_FILE, RTLD_NOW | RTLD_LOCAL);
+  void* loaded = dlopen(keymaster_file().c_str(), RTLD_NOW | RTLD_LOCAL);
   const auto create = reinterpret_cast<TEE_Result (*)()>(dlsym(loaded, "TA_CreateEntryPoint"));
   const auto destroy = reinterpret_cast<void (*)()>(dlsym(loaded, "TA_DestroyEntryPoint"));
   const auto invoke = reinterpret_cast<decltype(&TA_InvokeCommandEntryPoint)>(

@@ -1,9 +1,9 @@
 // Keys of the earlier Keymaster: upgrade_key opens their blobs through that TA and seals them anew.
 #include <filesystem>
-#include <stdlib.h>
 
 #include "support/blob_forge.h"
 #include "support/sets.h"
+#include "support/ta_folders.h"
 #include "support/ta_under_test.h"
 
 namespace keymaster::test {
@@ -24,11 +24,11 @@ class Legacy : public testing::Test {
     plaintext = blob_plaintext(material, set);
   }
 
-  ~Legacy() override { unsetenv("TEE_TA_PATH"); }
+  ~Legacy() override { use_own_tas(); }
 
   // A new instance, with trusted applications from these folders.
   void restart_with(const std::string& folders) {
-    setenv("TEE_TA_PATH", folders.c_str(), 1);
+    use_ta_folders(folders);
     ta.restart();
   }
   // A blob as the factory made them with the earlier TA.
@@ -143,10 +143,9 @@ TEST_F(Legacy, TheEarlierKeymasterIsAskedForUnknownBlobsAlone) {
 }
 
 TEST_F(Legacy, WithoutTheEarlierKeymasterItsSessionFails) {
-  const std::filesystem::path keymaster_file = KEYMASTER_TA_FILE;
   const std::filesystem::path folder = ta.path() + "/ta";
   std::filesystem::create_directory(folder);
-  std::filesystem::create_symlink(keymaster_file, folder / keymaster_file.filename());
+  std::filesystem::create_symlink(keymaster_file(), folder / keymaster_file().filename());
   restart_with(folder);
   expect_refused(bytes(200, 1), TEEC_ERROR_ITEM_NOT_FOUND,
                  "open_v1_key: OpenTASession failed with 0xffff0008");

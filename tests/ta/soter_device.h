@@ -1,11 +1,10 @@
 // Devices that the factory prepared for SOTER, and those whose siblings misbehave.
 #pragma once
 
-#include <stdlib.h>
-
 #include "keymaster/client/soter.h"
 #include "keymaster/client/vault.h"
 #include "support/sets.h"
+#include "support/ta_folders.h"
 #include "ta/fake_sibling/fake_sibling.h"
 #include "ta/pkey.h"
 
@@ -69,12 +68,12 @@ class soter_device : public testing::Test {
 class fake_device : public testing::Test {
  protected:
   fake_device() {
-    setenv("TEE_TA_PATH", TEST_TA_PATH, 1);
+    use_ta_folders(TEST_TA_PATH);
     restart();
   }
   ~fake_device() override {
     siblings.reset();
-    unsetenv("TEE_TA_PATH");
+    use_own_tas();
   }
 
   // New instances of all.
