@@ -1,0 +1,2 @@
+# The trusted application's own code comes as one object (LDADD); the kit compiles its header.
+global-incdirs-y += .
