@@ -13,11 +13,11 @@ namespace tee {
 
 namespace {
 
-constexpr char IDENTITY_FILE[] = "identity";
-constexpr char SETTINGS_FILE[] = "device.json";
+constexpr char MADE_IDENTITY[] = "identity";
+constexpr char EARLIER_SETTINGS[] = "device.json";
 constexpr char EARLIER_TABLE[] = "rpmb";
 constexpr char EARLIER_LOCK[] = "lock";
-constexpr size_t FILE_LIMIT = 16 * 1024 * 1024;
+constexpr size_t EARLIER_LIMIT = 16 * 1024 * 1024;
 
 [[noreturn]] void throw_damaged(const device_folder& folder, const std::string& name,
                                 const char* how) {
@@ -53,7 +53,7 @@ class earlier_form {
   // "KMRT", u32 form (1), u64 counter, u32 count, count entries, u32 number of pending entries (0
   // or 1), that entry, HMAC-SHA256 of all before. Entry: TA, u8 id length, id, u64 generation.
   void read_table() {
-    auto file = folder_.read(EARLIER_TABLE, FILE_LIMIT);
+    auto file = folder_.read(EARLIER_TABLE, EARLIER_LIMIT);
     if (!file) return;
     has_table_ = true;
     const std::span<const uint8_t> bytes = *file;
@@ -108,21 +108,21 @@ class earlier_form {
 };
 
 bool is_earlier_form(const device_folder& folder) {
-  auto key = folder.read(KEY_FILE, FILE_LIMIT);
+  auto key = folder.read(KEY_FILE, EARLIER_LIMIT);
   return key && key->size() == DEVICE_KEY_LENGTH;
 }
 
 device_secrets earlier_secrets(const device_folder& folder) {
   auto key = folder.read(KEY_FILE, DEVICE_KEY_LENGTH);
   if (!key) throw_damaged(folder, KEY_FILE, " is missing");
-  if (folder.contains(IDENTITY_FILE)) return load_identity(folder, std::move(*key));
-  const std::string path = folder.path_of(SETTINGS_FILE);
-  auto text = folder.read(SETTINGS_FILE, FILE_LIMIT);
-  if (!text) throw_damaged(folder, SETTINGS_FILE, " is missing");
+  if (folder.contains(MADE_IDENTITY)) return load_identity(folder, std::move(*key));
+  const std::string path = folder.path_of(EARLIER_SETTINGS);
+  auto text = folder.read(EARLIER_SETTINGS, EARLIER_LIMIT);
+  if (!text) throw_damaged(folder, EARLIER_SETTINGS, " is missing");
   json document = parse_json({reinterpret_cast<const char*>(text->data()), text->size()}, path);
   TEE_UUID identity{};
   if (!parse_uuid(json_text(document, "id", path), &identity)) {
-    throw_damaged(folder, SETTINGS_FILE, ": id is not a UUID");
+    throw_damaged(folder, EARLIER_SETTINGS, ": id is not a UUID");
   }
   device_secrets secrets = new_secrets(identity, json_flag(document, "rpmb", path));
   secrets.key = std::move(*key);

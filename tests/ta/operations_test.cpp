@@ -1,6 +1,7 @@
 // begin, update, finish and _abort: what each refuses, and what ends an operation.
 #include "support/blob_forge.h"
 #include "support/sets.h"
+#include "support/ta_folders.h"
 #include "support/ta_under_test.h"
 
 namespace keymaster::test {
@@ -133,10 +134,12 @@ TEST_F(Operations, OutliveAnotherTrustedApplicationThatDies) {
   constexpr uint32_t PANIC = 3;
   const uint32_t handle = begun();
   client::parameter_slots slots{};
+  use_ta_folders(TEST_TA_PATH);
   tee::host::end_process_on_panic(false);
   client::connection other(client::context(ta.path()), FAULTY);
   EXPECT_EQ(other.invoke(PANIC, TEEC_VALUE_INPUT, &slots).tee, TEEC_ERROR_TARGET_DEAD);
   tee::host::end_process_on_panic(true);
+  use_own_tas();
   EXPECT_TRUE(succeeded(ta.finish(handle, as_bytes("Hi There"))));
 }
 
