@@ -14,11 +14,6 @@ set(TA_COMPILE_OPTIONS
     -fno-asynchronous-unwind-tables -fno-math-errno -fno-stack-protector
     $<$<CXX_COMPILER_ID:GNU>:-fno-gnu-unique>  # loaders of TEEs refuse files that are marked as GNU's
     -ffunction-sections -fdata-sections ${KEYMASTER_LTO_COMPILE})
-# Data of the standard library's headers is merged across a process otherwise, by a mark that makes
-# an ELF file GNU's own: loaders of TEEs refuse such.
-if(KEYMASTER_PORT)
-  list(APPEND TA_COMPILE_OPTIONS $<$<COMPILE_LANGUAGE:CXX>:-fno-gnu-unique>)
-endif()
 
 # A TA links the platform, the C library's few memory and text functions, and nothing else: no C++
 # runtime and no start files, so what it imports is what a device's TEE must offer. Sanitizers bring

@@ -14,7 +14,7 @@ constinit thread_local border_state at_border;
 namespace {
 
 struct crossing {
-  std::jmp_buf back;
+  std::jmp_buf back{};
   volatile int cause = 0;
 };
 

@@ -29,6 +29,7 @@ struct panic_in_host {};
 // TEE_ERROR_OUT_OF_MEMORY where the body returns a result; whatever else the body throws, and lack
 // of memory in a call that cannot report it, is a panic, and so is a stack with no room left.
 template <typename Body>
+// NOLINTNEXTLINE(bugprone-exception-escape): what is no std::exception may end the process
 auto guarded(const char* call, Body&& body) noexcept -> decltype(body()) {
   if (!host_scope::has_stack()) [[unlikely]]
     panic(call, "the stack is exhausted");

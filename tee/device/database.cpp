@@ -36,8 +36,8 @@ const char* plain_paths() {
     };
     return made;
   }();
-  static const int registered = sqlite3_vfs_register(&vfs, 0);
-  return registered == SQLITE_OK ? vfs.zName : nullptr;
+  static const int REGISTERED = sqlite3_vfs_register(&vfs, 0);
+  return REGISTERED == SQLITE_OK ? vfs.zName : nullptr;
 }
 
 }  // namespace

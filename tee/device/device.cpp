@@ -176,7 +176,7 @@ void device::restore(const std::string& file, const std::string& path) {
     const device_key key = read_backup(file, draft);
     const device_secrets secrets = load_secrets(draft);
     parse_settings(draft, secrets);
-    object_store(draft, key, secrets.rpmb);
+    const object_store whole(draft, key, secrets.rpmb);  // or throws
     start_boot(draft);
   });
 }

@@ -33,7 +33,8 @@ std::optional<std::pair<object_name, replay_entry>> read_entry(table_reader* rea
   auto has_next = reader->number<uint8_t>();
   auto next = reader->number<uint64_t>();
   if (!name || !current || !has_next || !next) return std::nullopt;
-  return {{std::move(*name), {*current, *has_next != 0 ? next : std::nullopt}}};
+  const replay_entry entry{*current, *has_next != 0 ? next : std::nullopt};
+  return std::pair(std::move(*name), entry);
 }
 
 [[noreturn]] void throw_damaged(const device_folder& folder, const char* how) {

@@ -98,7 +98,7 @@ TEE_Result read_record(block* record) {
 
 // An identifier of the platform in its text form, with its terminating zero byte.
 struct id_text {
-  char text[37];
+  char text[37] = {};
 
   TEE_Result read(const char* property) {
     size_t size = sizeof(text);
