@@ -44,6 +44,7 @@ TEE_Result TA_CreateEntryPoint() {
 void TA_DestroyEntryPoint() {
   authorization_destroy();
   soter_deinit();
+  key_store_destroy();
 }
 
 TEE_Result TA_OpenSessionEntryPoint(uint32_t, TEE_Param*, void**) {

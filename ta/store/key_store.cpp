@@ -13,8 +13,8 @@ constexpr uint32_t KSK_BITS = KSK_SIZE * 8;
 constexpr char KSK_OBJECT_ID[] = "Keymaster KSK";
 static_assert(sizeof(KSK_OBJECT_ID) == 14);
 
-// Plain handles: nothing frees them before the instance ends, and a new instance overwrites
-// whatever an earlier one left here.
+// Plain handles, freed when the instance ends; a new instance overwrites whatever an earlier one
+// left here.
 TEE_ObjectHandle rpmb_ksk_handle;
 TEE_ObjectHandle derived_ksk_handle;
 
@@ -136,6 +136,12 @@ TEE_Result key_store_init() {
     return fail(res, "Init RPMB KSK failed with 0x%08x", res);
   }
   return TEE_SUCCESS;
+}
+
+void key_store_destroy() {
+  for (TEE_ObjectHandle* ksk : {&rpmb_ksk_handle, &derived_ksk_handle}) {
+    TEE_FreeTransientObject(std::exchange(*ksk, TEE_ObjectHandle{}));  // null is legal
+  }
 }
 
 TEE_ObjectHandle rpmb_ksk() {

@@ -23,6 +23,9 @@ constexpr TEE_Result KEY_STORE_ERROR_KSK_MISSING = 0xF0100003;
 // the platform's code, or KEY_STORE_ERROR_KSK_DELETED (the next creation makes a new KSK).
 [[nodiscard]] TEE_Result key_store_init();
 
+// key_store_destroy: frees both keys.
+void key_store_destroy();
+
 // The two keys, as HMAC-SHA256 objects of 256 bits. The RPMB one is null on a device without RPMB.
 TEE_ObjectHandle rpmb_ksk();
 TEE_ObjectHandle derived_ksk();
