@@ -22,38 +22,32 @@ imp_table<client_memory>& client_memories() {
 
 namespace {
 
-struct flight_list {
-  std::mutex mutex;
-  std::multimap<const TEEC_Operation*, cancellation*> calls;
-};
-
-flight_list& flights() {
-  static auto& list = *new flight_list;
-  return list;
-}
+// Calls in flight are few: a list of them, chained through themselves, takes no memory.
+std::mutex flights_mutex;
+operation_in_flight* last_flight = nullptr;
 
 }  // namespace
 
 operation_in_flight::operation_in_flight(const TEEC_Operation* operation) : operation_(operation) {
   if (operation_ == nullptr) return;
-  std::lock_guard lock(flights().mutex);
-  flights().calls.emplace(operation_, &asked_);
+  std::lock_guard lock(flights_mutex);
+  before_ = last_flight;
+  if (before_ != nullptr) before_->after_ = this;
+  last_flight = this;
 }
 
 operation_in_flight::~operation_in_flight() {
   if (operation_ == nullptr) return;
-  std::lock_guard lock(flights().mutex);
-  auto [call, end] = flights().calls.equal_range(operation_);
-  while (call != end && call->second != &asked_)
-    ++call;
-  flights().calls.erase(call);
+  std::lock_guard lock(flights_mutex);
+  if (before_ != nullptr) before_->after_ = after_;
+  (after_ != nullptr ? after_->before_ : last_flight) = before_;
 }
 
 void operation_in_flight::cancel(const TEEC_Operation* operation) {
-  std::lock_guard lock(flights().mutex);
-  auto [call, end] = flights().calls.equal_range(operation);
-  for (; call != end; ++call)
-    call->second->request();
+  std::lock_guard lock(flights_mutex);
+  for (operation_in_flight* call = last_flight; call != nullptr; call = call->before_) {
+    if (call->operation_ == operation) call->asked_.request();
+  }
 }
 
 TEEC_Result trace_failure(const char* what) noexcept {

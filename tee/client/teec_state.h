@@ -97,6 +97,8 @@ class operation_in_flight {
  private:
   const TEEC_Operation* operation_;
   cancellation asked_;
+  operation_in_flight* before_ = nullptr;  // the list of them all
+  operation_in_flight* after_ = nullptr;
 };
 
 // The tables of the process. Never destroyed: a program may end its contexts as late as it likes,

@@ -22,19 +22,16 @@ profile from_environment() {
   return {.strict = names(words, "strict"), .extensions = !names(words, "standard")};
 }
 
-profile& chosen() {
-  static profile of_process = from_environment();
-  return of_process;
-}
+profile of_process = from_environment();
 
 }  // namespace
 
 const profile& current_profile() {
-  return chosen();
+  return of_process;
 }
 
 void set_profile(const profile& wanted) {
-  chosen() = wanted;
+  of_process = wanted;
 }
 
 }  // namespace tee

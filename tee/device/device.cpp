@@ -19,6 +19,7 @@
 #include "tee/device/identity.h"
 #include "tee/device/json_file.h"
 #include "tee/device/object_store.h"
+#include "tee/device/process_mark.h"
 #include "tee/device/uuid.h"
 
 namespace tee {
@@ -131,6 +132,7 @@ struct device::state {
   }
 
   const pid_t process = getpid();
+  const process_mark opened_in;
   device_folder folder;
   device_secrets secrets;
   device_settings settings;
@@ -201,7 +203,7 @@ const std::string& device::path() const {
   return state_->folder.path();
 }
 bool device::in_own_process() const {
-  return state_->process == getpid();
+  return state_->opened_in.at_home();
 }
 void device::require_at(const std::string& path) const {
   if (!in_own_process()) {

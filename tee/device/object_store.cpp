@@ -6,7 +6,6 @@
 #include <cerrno>
 #include <new>
 #include <set>
-#include <unistd.h>
 
 namespace tee {
 
@@ -25,14 +24,14 @@ void object_store::create(const device_folder& folder, const device_key& key) {
 }
 
 object_store::object_store(const device_folder& folder, const device_key& key, bool has_rpmb)
-    : process_(getpid()), has_rpmb_(has_rpmb), rows_(folder, key), replay_(folder, key) {
+    : has_rpmb_(has_rpmb), rows_(folder, key), replay_(folder, key) {
   rows_.connect();
 }
 
 // Runs a call's work with the store to itself, connected, and lets only storage_error out.
 template <typename F>
 auto object_store::guarded(F action) {
-  if (getpid() != process_) {
+  if (!opened_in_.at_home()) {
     throw storage_error(TEE_ERROR_STORAGE_NOT_AVAILABLE,
                         "object store: a forked process has no part in the device");
   }

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "tee/device/object_rows.h"
+#include "tee/device/process_mark.h"
 #include "tee/device/replay_table.h"
 
 namespace tee {
@@ -57,7 +58,7 @@ class object_store {
   void change(const object_name& name, bool present, F write);
 
   std::mutex mutex_;
-  const int process_;  // that opened it; one that was forked from it is not the device's user
+  const process_mark opened_in_;  // a process that was forked from it is not the device's user
   const bool has_rpmb_;
   object_rows rows_;
   replay_table replay_;
