@@ -1,6 +1,8 @@
 // Key blobs. The first byte chooses: the rest is a blob as it is, or what lies sealed in one, so
 // that the parsing behind the authentication is reached. Every command that opens blobs takes it;
 // none leaves anything alive (the harness sees to that), and what is answered is in its form.
+#include <algorithm>
+
 #include "support/blob_forge.h"
 #include "support/ta_under_test.h"
 

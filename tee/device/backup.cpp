@@ -1,6 +1,7 @@
 // Backups of a device.
 #include "tee/device/backup.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <unistd.h>
 

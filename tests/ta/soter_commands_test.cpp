@@ -1,5 +1,7 @@
 // The SOTER commands: the ATTK, the device's identifier, reports of fingerprints; and vaults that
 // misbehave.
+#include <algorithm>
+
 #include "ta/soter_device.h"
 
 namespace keymaster::test {

@@ -1,6 +1,7 @@
 // The object store under attack, in trouble and after power cuts.
 #include "tee_extensions.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <functional>
 #include <gtest/gtest.h>
