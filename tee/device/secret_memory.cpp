@@ -90,7 +90,7 @@ arena& secrets() {
 }
 
 size_t class_of(size_t size) {
-  return size <= SMALLEST ? 0 : std::bit_width((size - 1) / SMALLEST);
+  return size <= SMALLEST ? 0 : static_cast<size_t>(std::bit_width((size - 1) / SMALLEST));
 }
 
 }  // namespace
