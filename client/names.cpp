@@ -210,7 +210,7 @@ std::string format_date(uint64_t milliseconds) {
 
 uint32_t digest_bits(uint64_t digest) {
   constexpr std::array<uint32_t, 7> BITS = {0, 128, 160, 224, 256, 384, 512};
-  return digest < BITS.size() ? BITS[digest] : 0;
+  return digest < BITS.size() ? BITS[static_cast<size_t>(digest)] : 0;
 }
 
 }  // namespace keymaster::client

@@ -32,7 +32,8 @@ function(ta_library name)
   add_library(${name} STATIC ${ARG_SOURCES})
   target_compile_options(${name} PRIVATE ${TA_COMPILE_OPTIONS})
   set_target_properties(${name} PROPERTIES KEYMASTER_TA ON)
-  target_link_libraries(${name} PUBLIC ${ARG_LIBRARIES})
+  # The compiler's own functions, division of long numbers for one, come behind who calls them.
+  target_link_libraries(${name} PUBLIC ${ARG_LIBRARIES} ${TA_LINK_LIBRARIES})
 endfunction()
 
 # The text of a UUID that product/uuids.h defines under `name`, from the numbers that it gives there.

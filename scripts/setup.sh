@@ -6,7 +6,7 @@ set -euo pipefail
 
 build=(g++ cmake ninja-build pkg-config libssl-dev libsqlite3-dev libcli11-dev nlohmann-json3-dev
        openssl)
-tests=(libgtest-dev googletest sqlite3 python3 g++-arm-linux-gnueabihf g++-aarch64-linux-gnu
+tests=(libgtest-dev sqlite3 python3 g++-arm-linux-gnueabihf g++-aarch64-linux-gnu
        qemu-user)
 bench=(libbenchmark-dev)
 checks=(git python3 binutils clang-14 libclang-rt-14-dev clang-format-14 clang-tidy-14)

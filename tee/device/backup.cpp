@@ -68,7 +68,8 @@ device_key read_backup(const std::string& file, const device_folder& folder) {
   }
   for (const char* name : FILES) {
     const auto length = reader.number<uint64_t>();
-    const auto bytes = length ? reader.bytes(*length) : std::nullopt;
+    const bool fits = length && *length <= content->size();
+    const auto bytes = fits ? reader.bytes(static_cast<size_t>(*length)) : std::nullopt;
     if (!bytes) throw_damaged(file, " is cut off");
     folder.write(name, *bytes);
   }

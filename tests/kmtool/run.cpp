@@ -26,7 +26,7 @@ call_result sandbox::run(const words& arguments, const std::string& input) const
   write(".in", input);
   std::string line =
       "env -u TEE_TA_PATH TEE_TRACE_LEVEL=0 KEYMASTER_DEVICE=\"$PWD/device\" "
-      "timeout 60 " KMTOOL_PROGRAM;
+      "timeout 300 " KMTOOL_PROGRAM;
   for (const std::string& argument : arguments)
     line += " '" + argument + "'";
   const int exit_code = shell(line + " <.in >.out 2>.err");

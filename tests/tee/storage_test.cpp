@@ -3,12 +3,12 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <dlfcn.h>
 #include <functional>
 #include <gtest/gtest.h>
 #include <map>
 #include <signal.h>
 #include <sqlite3.h>
-#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -24,44 +24,44 @@ int calls_until_cut = 0;
 int calls_until_full = 0;
 bool disk_full = false;
 
-long changing_call(long number, long a = 0, long b = 0, long c = 0, long d = 0) {
+// Whether a change is still made; `needs_room`: it takes space.
+bool goes_on(bool needs_room = false) {
   if (calls_until_cut > 0 && --calls_until_cut == 0) kill(getpid(), SIGKILL);
   if (calls_until_full > 0 && --calls_until_full == 0) disk_full = true;
-  if (disk_full && (number == SYS_write || number == SYS_pwrite64)) {
-    errno = ENOSPC;
-    return -1;
-  }
-  return syscall(number, a, b, c, d);
+  if (!disk_full || !needs_room) return true;
+  errno = ENOSPC;
+  return false;
 }
 
-long as_long(const void* pointer) {
-  return reinterpret_cast<intptr_t>(pointer);
+// The C library's own function of that name.
+template <typename Function>
+Function* real(Function*, const char* name) {
+  return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, name));
 }
 
 }  // namespace
 
 extern "C" {
 int fsync(int fd) {
-  return static_cast<int>(changing_call(SYS_fsync, fd));
+  return goes_on() ? real(fsync, "fsync")(fd) : -1;
 }
 int fdatasync(int fd) {
-  return static_cast<int>(changing_call(SYS_fdatasync, fd));
+  return goes_on() ? real(fdatasync, "fdatasync")(fd) : -1;
 }
 int ftruncate64(int fd, off64_t size) noexcept {
-  return static_cast<int>(changing_call(SYS_ftruncate, fd, size));
+  return goes_on() ? real(ftruncate64, "ftruncate64")(fd, size) : -1;
 }
 int unlinkat(int folder, const char* path, int flags) noexcept {
-  return static_cast<int>(changing_call(SYS_unlinkat, folder, as_long(path), flags));
+  return goes_on() ? real(unlinkat, "unlinkat")(folder, path, flags) : -1;
 }
 int renameat(int from_folder, const char* from, int to_folder, const char* to) noexcept {
-  return static_cast<int>(
-      changing_call(SYS_renameat, from_folder, as_long(from), to_folder, as_long(to)));
+  return goes_on() ? real(renameat, "renameat")(from_folder, from, to_folder, to) : -1;
 }
 ssize_t write(int fd, const void* data, size_t size) {
-  return changing_call(SYS_write, fd, as_long(data), static_cast<long>(size));
+  return goes_on(true) ? real(write, "write")(fd, data, size) : -1;
 }
 ssize_t pwrite64(int fd, const void* data, size_t size, off64_t offset) {
-  return changing_call(SYS_pwrite64, fd, as_long(data), static_cast<long>(size), offset);
+  return goes_on(true) ? real(pwrite64, "pwrite64")(fd, data, size, offset) : -1;
 }
 }
 
