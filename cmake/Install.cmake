@@ -1,11 +1,11 @@
-# What an installation holds: the three TEE headers, the client library with its headers, libteec,
-# the trusted applications and kmtool (each installed where its target is made), and the two ways to
-# find them, pkg-config and a CMake package. Every path in it is relative to the file that names it,
-# so the tree can be moved.
+# What an installation holds: the three TEE headers, the client library with its headers, libteec
+# and the TEE that it loads, the trusted applications and kmtool (each installed where its target is
+# made), and the two ways to find them, pkg-config and a CMake package. Every path in it is relative
+# to the file that names it, so the tree can be moved.
 include(CMakePackageConfigHelpers)
 
 install(DIRECTORY tee/include/ DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} FILES_MATCHING PATTERN "*.h")
-install(TARGETS teec EXPORT keymaster LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
+install(TARGETS teec tee EXPORT keymaster LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
 install(TARGETS keymaster_client EXPORT keymaster ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR})
 
 # The numbers are links in the tree, to what the trusted application and the product own.

@@ -59,7 +59,7 @@ function(trusted_application name)
   endif()
   add_library(${name} MODULE ${ARG_SOURCES})
   target_compile_options(${name} PRIVATE ${TA_COMPILE_OPTIONS})
-  target_link_libraries(${name} PRIVATE ${ARG_LIBRARIES} teec ${TA_LINK_LIBRARIES})
+  target_link_libraries(${name} PRIVATE ${ARG_LIBRARIES} tee ${TA_LINK_LIBRARIES})
   target_link_options(${name} PRIVATE ${TA_LINK_OPTIONS} ${KEYMASTER_NO_UNDEFINED} -Wl,--gc-sections
                       -Wl,-z,now -Wl,--version-script=${TA_EXPORTS} ${ARG_LINK_OPTIONS})
   set_target_properties(${name} PROPERTIES

@@ -1,14 +1,12 @@
 // TEE Client API 1.0: shared memory.
-#include "tee_client_api.h"
-
 #include <algorithm>
 #include <memory>
 #include <utility>
 
+#include "tee/client/in_process.h"
 #include "tee/client/teec_state.h"
 
-namespace tee {
-
+namespace tee::in_process {
 namespace {
 
 constexpr uint32_t ALL_DIRECTIONS = TEEC_MEM_INPUT | TEEC_MEM_OUTPUT;
@@ -23,46 +21,43 @@ TEEC_Result check(const TEEC_Context* context, const TEEC_SharedMemory* memory) 
 }
 
 }  // namespace
-}  // namespace tee
 
-using tee::client_call;
-using tee::client_memory;
-using tee::secret_bytes;
-
-TEEC_Result TEEC_RegisterSharedMemory(TEEC_Context* context, TEEC_SharedMemory* sharedMem) {
+TEEC_Result register_shared_memory(TEEC_Context* context, TEEC_SharedMemory* memory) {
   return client_call([&]() -> TEEC_Result {
-    if (TEEC_Result res = tee::check(context, sharedMem)) return res;
-    if (sharedMem->buffer == nullptr) return TEEC_ERROR_BAD_PARAMETERS;
-    auto* buffer = static_cast<uint8_t*>(sharedMem->buffer);
-    auto memory = std::make_shared<client_memory>(
-        client_memory{context->imp, {}, buffer, sharedMem->size, sharedMem->flags});
-    sharedMem->imp = tee::client_memories().add(std::move(memory));
+    if (TEEC_Result res = check(context, memory)) return res;
+    if (memory->buffer == nullptr) return TEEC_ERROR_BAD_PARAMETERS;
+    auto* buffer = static_cast<uint8_t*>(memory->buffer);
+    auto kept = std::make_shared<client_memory>(
+        client_memory{context->imp, {}, buffer, memory->size, memory->flags});
+    memory->imp = client_memories().add(std::move(kept));
     return TEEC_SUCCESS;
   });
 }
 
-TEEC_Result TEEC_AllocateSharedMemory(TEEC_Context* context, TEEC_SharedMemory* sharedMem) {
+TEEC_Result allocate_shared_memory(TEEC_Context* context, TEEC_SharedMemory* memory) {
   return client_call([&]() -> TEEC_Result {
-    if (TEEC_Result res = tee::check(context, sharedMem)) return res;
+    if (TEEC_Result res = check(context, memory)) return res;
     // At least one byte, so that the buffer is an address even when nothing fits in it.
-    secret_bytes bytes(std::max<size_t>(sharedMem->size, 1));
+    secret_bytes bytes(std::max<size_t>(memory->size, 1));
     uint8_t* buffer = bytes.data();
-    auto memory = std::make_shared<client_memory>(
-        client_memory{context->imp, std::move(bytes), buffer, sharedMem->size, sharedMem->flags});
-    sharedMem->imp = tee::client_memories().add(std::move(memory));
-    sharedMem->buffer = buffer;
+    auto kept = std::make_shared<client_memory>(
+        client_memory{context->imp, std::move(bytes), buffer, memory->size, memory->flags});
+    memory->imp = client_memories().add(std::move(kept));
+    memory->buffer = buffer;
     return TEEC_SUCCESS;
   });
 }
 
-void TEEC_ReleaseSharedMemory(TEEC_SharedMemory* sharedMemory) {
-  if (sharedMemory == nullptr) return;
+void release_shared_memory(TEEC_SharedMemory* memory) {
+  if (memory == nullptr) return;
   client_call([&]() -> TEEC_Result {
-    auto memory = tee::client_memories().take(sharedMemory->imp);
-    sharedMemory->imp = nullptr;
-    if (!memory || memory->own.empty()) return TEEC_SUCCESS;
-    sharedMemory->buffer = nullptr;
-    sharedMemory->size = 0;
+    auto kept = client_memories().take(memory->imp);
+    memory->imp = nullptr;
+    if (!kept || kept->own.empty()) return TEEC_SUCCESS;
+    memory->buffer = nullptr;
+    memory->size = 0;
     return TEEC_SUCCESS;
   });
 }
+
+}  // namespace tee::in_process

@@ -21,9 +21,9 @@
 #include "keymaster/client/session.h"
 #include "product/uuids.h"
 #include "support/trace_capture.h"
+#include "tee/controls/host_control.h"
 #include "tee/device/device.h"
 #include "tee/device/object_name.h"
-#include "tee/host/host_control.h"
 
 namespace keymaster::test {
 

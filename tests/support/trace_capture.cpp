@@ -4,7 +4,7 @@
 
 #include <algorithm>
 
-#include "tee/host/host_control.h"
+#include "tee/controls/host_control.h"
 
 namespace keymaster::test {
 namespace {

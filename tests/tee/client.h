@@ -9,7 +9,7 @@
 #include <stdlib.h>
 #include <string>
 
-#include "tee/host/host_control.h"
+#include "tee/controls/host_control.h"
 #include "tests/tee/temp_device.h"
 
 namespace tee::test {

@@ -3,7 +3,7 @@
 #include <cstring>
 
 #include "support.h"
-#include "tee/host/host_control.h"
+#include "tee/controls/host_control.h"
 
 namespace tee::test {
 namespace {

@@ -4,11 +4,11 @@
 #include <gtest/gtest.h>
 #include <string>
 
+#include "tee/controls/host_control.h"
 #include "tee/core/instance.h"
 #include "tee/core/stored_object.h"
 #include "tee/device/object_store.h"
 #include "tee/device/uuid.h"
-#include "tee/host/host_control.h"
 #include "tests/tee/support.h"
 #include "tests/tee/temp_device.h"
 

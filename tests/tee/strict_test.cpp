@@ -3,8 +3,8 @@
 #include <functional>
 
 #include "support.h"
+#include "tee/controls/host_control.h"
 #include "tee/core/session.h"
-#include "tee/host/host_control.h"
 
 namespace tee::test {
 namespace {

@@ -1,5 +1,5 @@
 // Control of the host TEE by the process it runs in.
-#include "tee/host/host_control.h"
+#include "tee/controls/host_control.h"
 
 #include <memory>
 

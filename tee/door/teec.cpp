@@ -1,0 +1,98 @@
+// libteec: the TEE Client API 1.0 as programs link it. It holds no TEE and no secret: the TEE is a
+// library of its own, which is loaded with the first context.
+#include "tee_client_api.h"
+
+#include <atomic>
+#include <cstdio>
+#include <cstring>
+#include <dlfcn.h>
+
+#include "tee/client/client_api.h"
+
+namespace {
+
+constexpr const char* TEE_LIBRARY = "libtee.so.1";  // found beside this one
+constexpr char IN_PROCESS[] = "local:";
+
+using tee::client_api;
+
+// Null until a context was asked for. The library stays until the process ends: threads may be in
+// it.
+std::atomic<const client_api*> loaded{nullptr};
+
+const client_api* load() {
+  if (const client_api* api = loaded.load(std::memory_order_acquire)) return api;
+  void* library = dlopen(TEE_LIBRARY, RTLD_NOW | RTLD_LOCAL);
+  void* table = library != nullptr ? dlsym(library, "tee_client_api_in_process") : nullptr;
+  if (table == nullptr) {
+    fprintf(stderr, "[TEE] %s\n", dlerror());
+    return nullptr;
+  }
+  loaded.store(static_cast<const client_api*>(table), std::memory_order_release);
+  return loaded;
+}
+
+// What is behind a structure of the client's: without a context there can be nothing.
+const client_api* api_of(const void* structure) {
+  return structure != nullptr ? loaded.load(std::memory_order_acquire) : nullptr;
+}
+
+TEEC_Result refuse(uint32_t* return_origin) {
+  if (return_origin != nullptr) *return_origin = TEEC_ORIGIN_API;
+  return TEEC_ERROR_BAD_PARAMETERS;
+}
+
+}  // namespace
+
+TEEC_Result TEEC_InitializeContext(const char* name, TEEC_Context* context) {
+  if (context == nullptr) return TEEC_ERROR_BAD_PARAMETERS;
+  context->imp = nullptr;
+  constexpr size_t prefix = sizeof(IN_PROCESS) - 1;
+  if (name != nullptr && strncmp(name, IN_PROCESS, prefix) == 0) name += prefix;
+  const client_api* api = load();
+  return api != nullptr ? api->initialize_context(name, context) : TEEC_ERROR_COMMUNICATION;
+}
+
+void TEEC_FinalizeContext(TEEC_Context* context) {
+  if (const client_api* api = api_of(context)) api->finalize_context(context);
+}
+
+TEEC_Result TEEC_RegisterSharedMemory(TEEC_Context* context, TEEC_SharedMemory* sharedMem) {
+  const client_api* api = api_of(context);
+  return api != nullptr ? api->register_shared_memory(context, sharedMem) : refuse(nullptr);
+}
+
+TEEC_Result TEEC_AllocateSharedMemory(TEEC_Context* context, TEEC_SharedMemory* sharedMem) {
+  const client_api* api = api_of(context);
+  return api != nullptr ? api->allocate_shared_memory(context, sharedMem) : refuse(nullptr);
+}
+
+void TEEC_ReleaseSharedMemory(TEEC_SharedMemory* sharedMemory) {
+  if (const client_api* api = api_of(sharedMemory)) api->release_shared_memory(sharedMemory);
+}
+
+TEEC_Result TEEC_OpenSession(TEEC_Context* context, TEEC_Session* session,
+                             const TEEC_UUID* destination, uint32_t connectionMethod,
+                             const void* connectionData, TEEC_Operation* operation,
+                             uint32_t* returnOrigin) {
+  if (session != nullptr) session->imp = nullptr;
+  const client_api* api = api_of(context);
+  if (api == nullptr) return refuse(returnOrigin);
+  return api->open_session(context, session, destination, connectionMethod, connectionData,
+                           operation, returnOrigin);
+}
+
+void TEEC_CloseSession(TEEC_Session* session) {
+  if (const client_api* api = api_of(session)) api->close_session(session);
+}
+
+TEEC_Result TEEC_InvokeCommand(TEEC_Session* session, uint32_t commandID, TEEC_Operation* operation,
+                               uint32_t* returnOrigin) {
+  const client_api* api = api_of(session);
+  if (api == nullptr) return refuse(returnOrigin);
+  return api->invoke_command(session, commandID, operation, returnOrigin);
+}
+
+void TEEC_RequestCancellation(TEEC_Operation* operation) {
+  if (const client_api* api = api_of(operation)) api->request_cancellation(operation);
+}
