@@ -63,7 +63,8 @@ TEST(device, is_never_made_over_something) {
   EXPECT_EQ(content_of(made.file("device.key")), before);
   EXPECT_EQ(error_of([&] { device::create(made.file("device.json/x"), {}); }).first, kind::IO);
   EXPECT_EQ(error_of([&] { device::open(made.path() + "/.."); }).first, kind::NOT_FOUND);
-  EXPECT_THROW(device::create(made.path() + "2", {.manufacturer = "a\nb"}), std::invalid_argument);
+  for (const std::string& name : {std::string("a\nb"), std::string("\x7f"), std::string(129, 'm')})
+    EXPECT_THROW(device::create(made.path() + "2", {.manufacturer = name}), std::invalid_argument);
   EXPECT_EQ(std::distance(std::filesystem::directory_iterator(made.path() + "/.."), {}), 1);
 }
 
@@ -91,12 +92,18 @@ TEST(device, a_boot_lasts_over_processes_and_ends_with_the_machine) {
   size_t digits = boot.find("boot_ms\": ") + 10;
   uint64_t began = std::stoull(boot.substr(digits));
   uint64_t hour = std::min<uint64_t>(began, 3600'000);
-  set_content(made.file("boot.json"),
-              boot.substr(0, digits) + std::to_string(began - hour) + "\n}\n");
+  const auto set_boot_ms = [&](uint64_t ms) {
+    set_content(made.file("boot.json"), boot.substr(0, digits) + std::to_string(ms) + "\n}\n");
+  };
+  set_boot_ms(began - hour);
   auto dev = made.open();
   EXPECT_GE(dev->system_ms(), hour);
   EXPECT_LT(dev->system_ms(), hour + 60'000);
   EXPECT_GT(dev->ree_ms(), 1'600'000'000'000u);
+  dev.reset();
+  // And one that has not begun yet: that was another machine start.
+  set_boot_ms(began + 3600'000);
+  EXPECT_NE(seed(), first);
 }
 
 TEST(device, belongs_to_one_process_at_a_time) {
@@ -143,6 +150,9 @@ TEST(device, damaged_files_are_told_and_never_a_crash) {
       {"boot.json", R"({"boot_seed":")" + id + R"("})"},
       {"boot.json", R"({"boot_seed":"g)" + id.substr(1) + R"(","machine_boot_id":"","boot_ms":0})"},
       {"boot.json", R"({"boot_seed":")" + id + R"(","machine_boot_id":"","boot_ms":-1})"},
+      {"replay", ""},
+      {"replay", "r"},
+      {"replay", std::string(31, 'r')},
       {"replay", std::string(80, 'r')},
       {"replay", content_of(other.file("replay"))},
       {"storage.db", ""},

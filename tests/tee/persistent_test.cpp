@@ -6,6 +6,7 @@
 
 #include "tee/controls/host_control.h"
 #include "tee/core/instance.h"
+#include "tee/core/persistent_stream.h"
 #include "tee/core/stored_object.h"
 #include "tee/device/object_store.h"
 #include "tee/device/uuid.h"
@@ -63,6 +64,13 @@ TEST_F(persistent, flags_of_two_handles_agree_or_conflict) {
       {READ | SHARE_R, WRITE | SHARE_R, false},
       {READ | SHARE_R | SHARE_W, WRITE | SHARE_R | SHARE_W, true},
       {META | SHARE_R | SHARE_W, READ | SHARE_R | SHARE_W, false},
+      {READ | SHARE_R, READ | SHARE_R | SHARE_W, false},
+      {READ | SHARE_R | SHARE_W, SHARE_W, false},
+      {READ | SHARE_W, READ | SHARE_W, false},
+      {READ | SHARE_W, SHARE_W, false},
+      {WRITE | SHARE_R, SHARE_R, false},
+      {WRITE | SHARE_W, WRITE | SHARE_W, true},
+      {SHARE_R, SHARE_W, false},
       {0, 0, false},
       {SHARE_R, SHARE_R, true},
       {0, META, false},
@@ -83,6 +91,60 @@ TEST_F(persistent, flags_of_two_handles_agree_or_conflict) {
     }
   }
   EXPECT_EQ(owner.objects().size(), 0u);
+}
+
+TEST_F(persistent, an_object_is_shared_until_its_last_handle_closes) {
+  constexpr uint32_t FLAGS = READ | SHARE_R;
+  ASSERT_EQ(create_object(FLAGS, "data", &object), TEE_SUCCESS);
+  TEE_ObjectHandle third = nullptr;
+  ASSERT_EQ(open_object(FLAGS, &second), TEE_SUCCESS);
+  ASSERT_EQ(open_object(FLAGS, &third), TEE_SUCCESS);
+  for (TEE_ObjectHandle each : {second, object, third}) {
+    EXPECT_EQ(create_object(OVERWRITE, "other", nullptr), TEE_ERROR_ACCESS_CONFLICT);
+    TEE_CloseObject(each);
+  }
+  EXPECT_EQ(create_object(OVERWRITE, "other", nullptr), TEE_SUCCESS);
+}
+
+TEST_F(persistent, positions_and_writes_have_limits) {
+  constexpr intmax_t LIMIT = STREAM_LIMIT;
+  constexpr intmax_t LAST = TEE_DATA_MAX_POSITION;
+  ASSERT_EQ(create_object(READ | WRITE, "0123456789", &object), TEE_SUCCESS);
+  // A seek from position 4, its result, and the position then.
+  const std::tuple<intmax_t, TEE_Whence, TEE_Result, intmax_t> seeks[] = {
+      {0, TEE_DATA_SEEK_CUR, TEE_SUCCESS, 4},
+      {-4, TEE_DATA_SEEK_CUR, TEE_SUCCESS, 0},
+      {-5, TEE_DATA_SEEK_CUR, TEE_SUCCESS, 0},
+      {-3, TEE_DATA_SEEK_END, TEE_SUCCESS, 7},
+      {-11, TEE_DATA_SEEK_END, TEE_SUCCESS, 0},
+      {INTMAX_MIN, TEE_DATA_SEEK_END, TEE_SUCCESS, 0},
+      {LIMIT + 1, TEE_DATA_SEEK_SET, TEE_SUCCESS, LIMIT + 1},
+      {LAST, TEE_DATA_SEEK_SET, TEE_SUCCESS, LAST},
+      {LAST - 4, TEE_DATA_SEEK_CUR, TEE_SUCCESS, LAST},
+      {LAST - 3, TEE_DATA_SEEK_CUR, TEE_ERROR_OVERFLOW, 4},
+      {LAST - 9, TEE_DATA_SEEK_END, TEE_ERROR_OVERFLOW, 4},
+      {INTMAX_MAX, TEE_DATA_SEEK_SET, TEE_ERROR_OVERFLOW, 4},
+  };
+  TEE_ObjectInfo info{};
+  for (const auto& [offset, whence, result, position] : seeks) {
+    ASSERT_EQ(TEE_SeekObjectData(object, 4, TEE_DATA_SEEK_SET), TEE_SUCCESS);
+    EXPECT_EQ(TEE_SeekObjectData(object, offset, whence), result) << offset;
+    ASSERT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
+    EXPECT_EQ(static_cast<intmax_t>(info.dataPosition), position) << offset;
+  }
+  // Where two bytes are written, the result, and the length then.
+  for (const auto& [position, result, length] : {std::tuple(intmax_t{3}, TEE_SUCCESS, size_t{10}),
+                                                 {9, TEE_SUCCESS, 11},
+                                                 {13, TEE_SUCCESS, 15},
+                                                 {LIMIT - 1, TEE_ERROR_STORAGE_NO_SPACE, 15},
+                                                 {LAST, TEE_ERROR_OVERFLOW, 15}}) {
+    ASSERT_EQ(TEE_SeekObjectData(object, position, TEE_DATA_SEEK_SET), TEE_SUCCESS);
+    EXPECT_EQ(TEE_WriteObjectData(object, "xy", 2), result) << position;
+    ASSERT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
+    EXPECT_EQ(info.dataSize, length);
+  }
+  ASSERT_EQ(TEE_SeekObjectData(object, 0, TEE_DATA_SEEK_SET), TEE_SUCCESS);
+  EXPECT_EQ(read_all(object), std::string("012xy5678xy\0\0xy", 15));
 }
 
 TEST_F(persistent, an_object_can_be_stored_without_a_handle) {
@@ -176,6 +238,22 @@ TEST_F(persistent, stored_attributes_that_make_no_key_are_corrupt) {
     EXPECT_EQ(open_object(READ, &object), TEE_ERROR_CORRUPT_OBJECT) << type;
   }
   EXPECT_EQ(owner.objects().size(), 0u);
+}
+
+TEST_F(persistent, content_of_another_form_is_no_object) {
+  stored_object content;
+  content.type = TEE_TYPE_AES;
+  content.attributes = {{TEE_ATTR_SECRET_VALUE, secret_bytes(16)}};
+  const secret_bytes good = encode(content);
+  ASSERT_TRUE(decode(good));
+  for (size_t length = 0; length < good.size(); length++)
+    EXPECT_FALSE(decode(std::span(good).first(length))) << length;
+  // The version, the number of attributes, the secret's length.
+  for (size_t place : {size_t{0}, size_t{16}, good.size() - 20, good.size() - 17}) {
+    secret_bytes lying = good;
+    lying[place] += 1;
+    EXPECT_FALSE(decode(lying)) << place;
+  }
 }
 
 using persistent_death = persistent;
