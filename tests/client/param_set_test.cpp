@@ -26,6 +26,23 @@ TEST(ParamSet, RefusesMalformedBytes) {
     EXPECT_THROW(param_set::parse(from_hex(hex)), format_error) << hex;
 }
 
+TEST(ParamSet, HoldsWhatItsTagsCan) {
+  EXPECT_THROW(param_set().add(KM_TAG_KEY_SIZE, uint64_t{1} << 32), std::invalid_argument);
+  EXPECT_THROW(param_set().add(KM_TAG_APPLICATION_ID, 1), std::invalid_argument);
+  EXPECT_THROW(param_set().add_bytes(KM_TAG_KEY_SIZE, {}), std::invalid_argument);
+  // A writer may have left something in the upper half of a number of 32 bits.
+  EXPECT_EQ(param_set::parse(from_hex("010000000300003000000000000100000a0000000000000000000000")),
+            param_set().add(KM_TAG_KEY_SIZE, 256));
+}
+
+TEST(Bytes, FailedReadsMoveNothing) {
+  const bytes cut = from_hex("05000000aabbccdd");
+  field_reader in(cut);
+  EXPECT_THROW(in.field(), format_error);
+  EXPECT_EQ(in.left(), cut.size());
+  EXPECT_THROW(from_hex("abc"), std::invalid_argument);
+}
+
 TEST(Names, ParseWhatPeopleWrite) {
   const std::tuple<keymaster_tag_t, const char*, std::optional<uint32_t>> cases[] = {
       {KM_TAG_DIGEST, "sha256", KM_DIGEST_SHA_2_256},

@@ -122,6 +122,9 @@ const begin_case BEGINS[] = {
     {-24, NOT_YET, signer(ACTIVE, NOW + 1)},
     {0, "", signer(ORIGINATION, NOW)},
     {-25, EXPIRED, signer(ORIGINATION, NOW - 1)},
+    {-25, EXPIRED, aes_key(KM_MODE_CBC, one(ORIGINATION, NOW - 1)), CBC, ENCRYPT},
+    {0, "", aes_key(KM_MODE_CBC, one(ORIGINATION, 1).add(KM_TAG_PURPOSE, DECRYPT)), OWN_NONCE,
+     DECRYPT},
     {0, "", signer(ORIGINATION, 1), sign_request(), VERIFY},
     {0, "", signer(USAGE, NOW), sign_request(), VERIFY},
     {-25, EXPIRED, signer(USAGE, NOW - 1), sign_request(), VERIFY},
@@ -166,14 +169,16 @@ TEST_F(auth, begin_is_granted_or_refused_for_what_the_key_says) {
 }
 
 TEST_F(auth, clock_follows_system_time_alone) {
-  const bytes until = ta.generate(signer(KM_TAG_ORIGINATION_EXPIRE_DATETIME, NOW + 850));
-  const bytes from = ta.generate(signer(KM_TAG_ACTIVE_DATETIME, NOW + 850));
-  // The system clock's milliseconds are then fewer than at the start.
-  for (const uint64_t elapsed : {849, 850, 851}) {
-    SCOPED_TRACE(elapsed);
-    tee::host::set_clocks(START_SYSTEM_MS + elapsed, NOW + 1'000'000'000);
-    expect_sign(until, elapsed == 851 ? -25 : 0, elapsed == 851 ? EXPIRED : "");
-    expect_sign(from, elapsed == 849 ? -24 : 0, elapsed == 849 ? NOT_YET : "");
+  // The system clock's milliseconds are then the most there are, and fewer than at the start.
+  for (const uint64_t turn : {749, 850}) {
+    const bytes until = ta.generate(signer(KM_TAG_ORIGINATION_EXPIRE_DATETIME, NOW + turn));
+    const bytes from = ta.generate(signer(KM_TAG_ACTIVE_DATETIME, NOW + turn));
+    for (const uint64_t elapsed : {turn - 1, turn, turn + 1}) {
+      SCOPED_TRACE(elapsed);
+      tee::host::set_clocks(START_SYSTEM_MS + elapsed, NOW + 1'000'000'000);
+      expect_sign(until, elapsed > turn ? -25 : 0, elapsed > turn ? EXPIRED : "");
+      expect_sign(from, elapsed < turn ? -24 : 0, elapsed < turn ? NOT_YET : "");
+    }
   }
 }
 

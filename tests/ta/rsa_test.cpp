@@ -180,14 +180,22 @@ TEST_F(Rsa, RawResultsHaveTheKeysLength) {
   const bytes front = block;
   block.resize(256);
   EXPECT_TRUE(succeeded(verify(blob, RAW, front, KEY_2048.sign(RAW, block))));
+  // What the signature comes to must be all of the block, not what it begins with.
+  for (const bytes& power : {bytes(256), right_aligned(bytes{1}, 256)}) {
+    EXPECT_TRUE(refused(verify(blob, RAW, bytes{0, 1}, power), -30));
+    EXPECT_EQ(ta.run(ENCRYPT, blob, use(RAW), power), power);
+  }
   EXPECT_EQ(ta.run(ENCRYPT, blob, use(RAW), {}), bytes(256));
 }
 
 TEST_F(Rsa, PssSaltsAreAsLongAsTheDigestOrAsFits) {
+  const pkey key_520 = pkey::rsa(520), key_528 = pkey::rsa(528);
   for (const auto& [key, digest, salt] : {std::tuple(&KEY_2048, KM_DIGEST_SHA_2_256, 32),
                                           {&KEY_2048, KM_DIGEST_SHA_2_512, 64},
                                           {&KEY_1024, KM_DIGEST_SHA_2_384, 48},
                                           {&KEY_1024, KM_DIGEST_SHA_2_512, 62},
+                                          {&key_528, KM_DIGEST_SHA_2_256, 32},
+                                          {&key_520, KM_DIGEST_SHA_2_256, 31},
                                           {&KEY_512, KM_DIGEST_SHA_2_256, 30}}) {
     const scheme how = {KM_PAD_RSA_PSS, digest};
     const bytes blob = imported(*key);
@@ -355,6 +363,7 @@ TEST_F(Rsa, ImportsTellTheirSizeAndExponent) {
     EXPECT_EQ(found.number(KM_TAG_ORIGIN), KM_ORIGIN_IMPORTED);
     EXPECT_FALSE(found.contains(KM_TAG_CREATION_DATETIME));
   }
+  ta.import(ANY_USE, altered(EXPONENT, bytes(8, 1)));
   ta.import(with_exponent(0x100000001), altered(EXPONENT, {1, 0, 0, 0, 1}));
   const bytes dated = ta.import(with(ANY_USE, KM_TAG_CREATION_DATETIME, {77}), good);
   EXPECT_EQ(ta.characteristics(dated).number(KM_TAG_CREATION_DATETIME), 77U);

@@ -108,6 +108,9 @@ TEST_F(SoterDocument, HoldsWhatTheDeviceKnows) {
   ta.restart();
   load();
   expect_signed(blob, "x", R"("raw":"x","counter":7,"uid":0,)");
+  // Nor is there one just after a boot.
+  tee::host::set_clocks(0, START_REE_MS);
+  expect_signed(blob, "x", R"("raw":"x","counter":8,"uid":0,)");
 }
 
 TEST_F(SoterDocument, IsSignedWithEverySchemeOfTheKey) {

@@ -56,6 +56,7 @@ TEST_F(asymmetric, rsa_signatures_keep_their_leading_zero) {
   EXPECT_EQ(verify(verifier, digest, signature), TEE_SUCCESS);
   signature.erase(signature.begin());
   EXPECT_EQ(verify(verifier, digest, signature), TEE_ERROR_SIGNATURE_INVALID);
+  EXPECT_DEATH(sign(signer, bytes(19)), "panic: .*: a digest of 19 bytes, not 20");
   TEE_FreeOperation(signer);
   TEE_FreeOperation(verifier);
 }
@@ -107,14 +108,25 @@ TEST_F(asymmetric, oaep_heeds_label_and_mask_digest) {
 TEST_F(asymmetric, wrong_pkcs1_padding_is_refused) {
   auto [encrypter, decrypter] =
       on_new_key(TEE_TYPE_RSA_KEYPAIR, 512, TEE_ALG_RSAES_PKCS1_V1_5, {}, CRYPTS);
-  for (uint8_t fill = 1; fill < 8; ++fill) {
-    const bytes rubbish(64, fill);
+  const auto opens = [op = decrypter](const bytes& sealed) {
     bytes opened(64);
     size_t length = opened.size();
-    EXPECT_EQ(TEE_AsymmetricDecrypt(decrypter, nullptr, 0, rubbish.data(), rubbish.size(),
-                                    opened.data(), &length),
-              TEE_ERROR_BAD_PARAMETERS);
+    return TEE_AsymmetricDecrypt(op, nullptr, 0, sealed.data(), sealed.size(), opened.data(),
+                                 &length);
+  };
+  for (uint8_t fill = 1; fill < 8; ++fill)
+    EXPECT_EQ(opens(bytes(64, fill)), TEE_ERROR_BAD_PARAMETERS);
+  // A ciphertext is as long as the modulus, also where the same number has fewer bytes.
+  bytes sealed(64, 1);
+  for (int tries = 0; tries < 10000 && sealed[0] != 0; ++tries) {
+    size_t length = sealed.size();
+    ASSERT_EQ(TEE_AsymmetricEncrypt(encrypter, nullptr, 0, "x", 1, sealed.data(), &length),
+              TEE_SUCCESS);
   }
+  EXPECT_EQ(opens(sealed), TEE_SUCCESS);
+  EXPECT_EQ(opens(bytes(sealed.begin() + 1, sealed.end())), TEE_ERROR_BAD_PARAMETERS);
+  sealed.insert(sealed.begin(), 0);
+  EXPECT_EQ(opens(sealed), TEE_ERROR_BAD_PARAMETERS);
   TEE_FreeOperation(encrypter);
   TEE_FreeOperation(decrypter);
 }

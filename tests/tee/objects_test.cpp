@@ -121,6 +121,7 @@ TEST_F(objects, numbers_of_a_key_belong_together) {
     TEE_ObjectInfo info;
     EXPECT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
     EXPECT_EQ(info.objectUsage, 0xFFFFFFFF);
+    EXPECT_EQ(info.maxObjectSize, row.bits);
     TEE_FreeTransientObject(object);
   }
 }

@@ -20,6 +20,17 @@ TEST_F(operations_death, calls_that_do_not_fit_panic) {
   auto digest = operation(TEE_ALG_SHA256, TEE_MODE_DIGEST, 0, nullptr);
   auto keyless = operation(TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 128, nullptr);
   auto initial = operation(TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 128, aes());
+  const bytes modulus(64, 0xFF), exponent = {3};
+  const TEE_Attribute numbers[] = {ref(TEE_ATTR_RSA_MODULUS, modulus),
+                                   ref(TEE_ATTR_RSA_PUBLIC_EXPONENT, exponent)};
+  TEE_ObjectHandle half = nullptr;
+  ASSERT_EQ(TEE_AllocateTransientObject(TEE_TYPE_RSA_PUBLIC_KEY, 512, &half), TEE_SUCCESS);
+  ASSERT_EQ(TEE_PopulateTransientObject(half, numbers, 2), TEE_SUCCESS);
+  auto encrypter = operation(TEE_ALG_RSA_NOPAD, TEE_MODE_ENCRYPT, 512, nullptr);
+  ASSERT_EQ(TEE_SetOperationKey(encrypter, half), TEE_SUCCESS);
+  auto decrypter = operation(TEE_ALG_RSA_NOPAD, TEE_MODE_DECRYPT, 512, nullptr);
+  auto dropped = operation(TEE_ALG_AES_CBC_NOPAD, TEE_MODE_ENCRYPT, 128, aes());
+  ASSERT_EQ(TEE_SetOperationKey(dropped, nullptr), TEE_SUCCESS);
   auto running = operation(TEE_ALG_AES_ECB_NOPAD, TEE_MODE_ENCRYPT, 128, aes());
   TEE_CipherInit(running, nullptr, 0);
   auto sealing = operation(TEE_ALG_AES_GCM, TEE_MODE_ENCRYPT, 128, aes());
@@ -30,6 +41,9 @@ TEST_F(operations_death, calls_that_do_not_fit_panic) {
       {"SetOperationKey: key is not an initialised", [&] { TEE_SetOperationKey(keyless, empty); }},
       {"SetOperationKey: key of type", [&] { TEE_SetOperationKey(keyless, mac_key); }},
       {"SetOperationKey: key of 256 bits", [&] { TEE_SetOperationKey(keyless, big_key); }},
+      {"SetOperationKey: key of type", [&] { TEE_SetOperationKey(decrypter, half); }},
+      {"SetOperationKey: key of type", [&] { TEE_SetOperationKey(encrypter, mac_key); }},
+      {"CipherInit: operation has no key", [&] { TEE_CipherInit(dropped, block.data(), 16); }},
       {"DigestUpdate: operation of algorithm", [&] { TEE_DigestUpdate(initial, out, 1); }},
       {"DigestUpdate: chunk is null with length 1", [&] { TEE_DigestUpdate(digest, nullptr, 1); }},
       {"CipherInit: operation has no key", [&] { TEE_CipherInit(keyless, block.data(), 16); }},

@@ -1,6 +1,7 @@
 // MACs and ciphers in what no trusted application of ours asks for: queries, overlapping buffers,
 // tags of every length. That the values are the published ones is shown at the command level.
 #include <algorithm>
+#include <map>
 
 #include "support.h"
 
@@ -49,9 +50,13 @@ TEST_F(symmetric, cipher_buffers_may_overlap) {
     TEE_OperationHandle op =
         operation(algorithm, TEE_MODE_ENCRYPT, 128, secret_key(TEE_TYPE_AES, bytes(16, 5)));
     const auto run = [&](size_t held, ptrdiff_t distance) {
-      TEE_CipherInit(op, iv.data(), iv.size());
       bytes result(16);
       size_t length = result.size();
+      // A message that is given up leaves nothing to the next one.
+      TEE_CipherInit(op, iv.data(), iv.size());
+      EXPECT_EQ(TEE_CipherUpdate(op, plain.data(), 3, result.data(), &length), TEE_SUCCESS);
+      TEE_CipherInit(op, iv.data(), iv.size());
+      length = result.size();
       EXPECT_EQ(TEE_CipherUpdate(op, plain.data(), held, result.data(), &length), TEE_SUCCESS);
       result.resize(length);
       bytes room(plain.size() + 2 * REACH);
@@ -112,6 +117,45 @@ TEST_F(symmetric, gcm_tags_of_every_length) {
     EXPECT_EQ(TEE_AEUpdate(op, &byte, length, &byte, &length), TEE_ERROR_EXCESS_DATA);
   }
   TEE_FreeOperation(op);
+}
+
+// Nonces of every length count as a whole, one after the other and in operations that share a key;
+// and what opens under a wrong tag, or one that is cut short, is not seen.
+TEST_F(symmetric, gcm_nonces_and_tags_count_as_a_whole) {
+  const bytes nonce(20, 7);
+  const bytes plain(20, 0x3C);
+  const auto prepared = [&](uint32_t mode, size_t nonce_length) {
+    auto op = operation(TEE_ALG_AES_GCM, mode, 128, secret_key(TEE_TYPE_AES, bytes(16, 9)));
+    EXPECT_EQ(TEE_AEInit(op, nonce.data(), nonce_length, 128, 0, 0), TEE_SUCCESS);
+    return op;
+  };
+  std::map<size_t, bytes> sealed;
+  for (size_t nonce_length : {12, 8, 16, 12, 1, 20, 12, 16, 8}) {
+    auto op = prepared(TEE_MODE_ENCRYPT, nonce_length);
+    bytes made(36);
+    size_t length = 20, tag_length = 16;
+    EXPECT_EQ(
+        TEE_AEEncryptFinal(op, plain.data(), 20, made.data(), &length, &made[20], &tag_length),
+        TEE_SUCCESS);
+    EXPECT_EQ(sealed.try_emplace(nonce_length, made).first->second, made) << nonce_length;
+    TEE_FreeOperation(op);
+    for (size_t other : {8, 12, 16}) {
+      EXPECT_EQ(sealed.contains(other) && sealed[other] == made, other == nonce_length);
+    }
+  }
+  for (size_t tag_length : {12, 15, 16}) {
+    auto op = prepared(TEE_MODE_DECRYPT, 12);
+    bytes input = sealed[12];
+    if (tag_length == 16) input.back() ^= 1;
+    bytes opened(20, 0xEE);
+    size_t length = opened.size();
+    EXPECT_EQ(
+        TEE_AEDecryptFinal(op, input.data(), 20, opened.data(), &length, &input[20], tag_length),
+        TEE_ERROR_MAC_INVALID);
+    EXPECT_EQ(length, 0U);
+    EXPECT_EQ(opened, bytes(20));
+    TEE_FreeOperation(op);
+  }
 }
 
 }  // namespace
