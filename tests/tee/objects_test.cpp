@@ -39,6 +39,11 @@ TEST_F(objects, a_secret_comes_back_as_it_went_in) {
   size_t length = 0;
   EXPECT_EQ(TEE_GetObjectBufferAttribute(object, TEE_ATTR_RSA_MODULUS, nullptr, &length),
             TEE_ERROR_ITEM_NOT_FOUND);
+  TEE_ObjectInfo info;
+  EXPECT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
+  EXPECT_EQ(info.objectSize, 128U);
+  EXPECT_EQ(info.maxObjectSize, 256U);
+  EXPECT_EQ(info.objectUsage, 0xFFFFFFFF);
   TEE_CloseObject(object);
 }
 
@@ -61,69 +66,6 @@ TEST_F(objects, keys_are_found_again) {
     key_of(TEE_TYPE_AES, fill);
   }
   EXPECT_NE(key_of(TEE_TYPE_AES, 0), first);
-}
-
-// The attributes of a new key pair, in the order given.
-std::vector<bytes> numbers_of_new(uint32_t type, uint32_t bits, const TEE_Attribute* curve,
-                                  std::span<const uint32_t> ids) {
-  TEE_ObjectHandle key = allocate(type, bits);
-  EXPECT_EQ(TEE_GenerateKey(key, bits, curve, curve ? 1 : 0), TEE_SUCCESS);
-  std::vector<bytes> numbers;
-  for (uint32_t id : ids) {
-    size_t length = 66;
-    bytes number(length);
-    EXPECT_EQ(TEE_GetObjectBufferAttribute(key, id, number.data(), &length), TEE_SUCCESS);
-    number.resize(length);
-    numbers.push_back(number);
-  }
-  TEE_FreeTransientObject(key);
-  return numbers;
-}
-
-// Numbers that are a key together are none when any of them is another key's, or is off by 2.
-TEST_F(objects, numbers_of_a_key_belong_together) {
-  constexpr uint32_t RSA[] = {TEE_ATTR_RSA_MODULUS,          TEE_ATTR_RSA_PUBLIC_EXPONENT,
-                              TEE_ATTR_RSA_PRIVATE_EXPONENT, TEE_ATTR_RSA_PRIME1,
-                              TEE_ATTR_RSA_PRIME2,           TEE_ATTR_RSA_EXPONENT1,
-                              TEE_ATTR_RSA_EXPONENT2,        TEE_ATTR_RSA_COEFFICIENT};
-  constexpr uint32_t EC[] = {TEE_ATTR_ECC_PUBLIC_VALUE_X, TEE_ATTR_ECC_PUBLIC_VALUE_Y,
-                             TEE_ATTR_ECC_PRIVATE_VALUE};
-  TEE_Attribute p256;
-  TEE_InitValueAttribute(&p256, TEE_ATTR_ECC_CURVE, TEE_ECC_CURVE_NIST_P256, 0);
-  struct {
-    uint32_t type, bits;
-    const TEE_Attribute* curve;
-    std::span<const uint32_t> ids;
-  } const rows[] = {{TEE_TYPE_RSA_KEYPAIR, 512, nullptr, std::span(RSA).first(3)},
-                    {TEE_TYPE_RSA_KEYPAIR, 512, nullptr, RSA},
-                    {TEE_TYPE_ECDSA_KEYPAIR, 256, &p256, EC}};
-  for (const auto& row : rows) {
-    const auto good = numbers_of_new(row.type, row.bits, row.curve, row.ids);
-    const auto other = numbers_of_new(row.type, row.bits, row.curve, row.ids);
-    TEE_ObjectHandle object = allocate(row.type, row.bits);
-    const auto populate = [&](const std::vector<bytes>& numbers) {
-      std::vector<TEE_Attribute> attributes;
-      if (row.curve) attributes.push_back(*row.curve);
-      for (size_t i = 0; i < numbers.size(); ++i)
-        attributes.push_back(ref(row.ids[i], numbers[i]));
-      return TEE_PopulateTransientObject(object, attributes.data(),
-                                         static_cast<uint32_t>(attributes.size()));
-    };
-    for (size_t i = 0; i < good.size(); ++i) {
-      auto numbers = good;
-      numbers[i].back() ^= 2;
-      EXPECT_EQ(populate(numbers), TEE_ERROR_BAD_PARAMETERS) << row.type << " number " << i;
-      numbers[i] = other[i];
-      if (other[i] == good[i]) continue;  // the usual public exponent
-      EXPECT_EQ(populate(numbers), TEE_ERROR_BAD_PARAMETERS) << row.type << " number " << i;
-    }
-    EXPECT_EQ(populate(good), TEE_SUCCESS);
-    TEE_ObjectInfo info;
-    EXPECT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
-    EXPECT_EQ(info.objectUsage, 0xFFFFFFFF);
-    EXPECT_EQ(info.maxObjectSize, row.bits);
-    TEE_FreeTransientObject(object);
-  }
 }
 
 TEST_F(objects_death, programming_errors_panic) {

@@ -97,6 +97,15 @@ void save(device& dev, uint32_t storage, const std::string& id, const std::strin
   dev.objects().save(name_of(storage, id), bytes_of(content));
 }
 
+// How a process that does this ends, as waitpid says; it exits with what is returned.
+int run_apart(const std::function<int()>& action) {
+  const pid_t child = fork();
+  if (child == 0) _exit(action());
+  int status = 1;
+  waitpid(child, &status, 0);
+  return status;
+}
+
 // Whether the power went.
 bool was_cut(int status) {
   return WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL;
@@ -252,19 +261,16 @@ TEST_P(storage, a_power_cut_or_a_full_disk_leaves_the_old_object_or_the_new_one)
         if (before == std::string("old")) save(*dev, GetParam(), "a", before);
         save(*dev, GetParam(), "b", "bystander");
       }
-      pid_t child = fork();
-      if (child == 0) {
+      const int status = run_apart([&, &change = change] {
         auto dev = made.open();
         armed = cuts + 1;
         try {
           change(*dev);
         } catch (const storage_error& error) {
-          _exit(error.result() == TEE_ERROR_STORAGE_NO_SPACE ? NO_SPACE : OTHER);
+          return error.result() == TEE_ERROR_STORAGE_NO_SPACE ? NO_SPACE : OTHER;
         }
-        _exit(DONE);
-      }
-      int status = 0;
-      waitpid(child, &status, 0);
+        return DONE;
+      });
       cut = was_cut(status) || WEXITSTATUS(status) == NO_SPACE;
       EXPECT_TRUE(cut || status == DONE) << "cut " << cuts;
       // Twice, since the first look settles what the cut left open.
@@ -286,16 +292,12 @@ TEST_P(storage, an_old_copy_does_not_settle_a_change) {
   save(*made.open(), GetParam(), "a", "first");
   const std::string first = content_of(db);
   save(*made.open(), GetParam(), "a", "second");
-  pid_t child = fork();
-  if (child == 0) {
+  ASSERT_TRUE(was_cut(run_apart([&] {
     auto dev = made.open();
     calls_until_cut = 12;
     save(*dev, GetParam(), "a", "third");
-    _exit(0);
-  }
-  int status = 0;
-  waitpid(child, &status, 0);
-  ASSERT_TRUE(was_cut(status));
+    return 0;
+  })));
   const std::string cut = content_of(db);
   set_content(db, first);
   expect_refused("first");
@@ -340,18 +342,11 @@ TEST(storage_of_a_device, is_not_shared_with_a_forked_process) {
   temp_device made;
   auto dev = made.open();
   save(*dev, PRIVATE, "a", "1");
-  pid_t child = fork();
-  if (child == 0) {
-    bool refused = state_of(*dev, PRIVATE, "a") == "unavailable";
-    try {
-      save(*dev, PRIVATE, "a", "2");
-      refused = false;
-    } catch (const storage_error&) {  // as it must be
-    }
-    _exit(refused ? 0 : 1);
-  }
-  int status = 1;
-  waitpid(child, &status, 0);
+  const int status = run_apart([&] {
+    EXPECT_EQ(state_of(*dev, PRIVATE, "a"), "unavailable");
+    EXPECT_THROW(save(*dev, PRIVATE, "a", "2"), storage_error);
+    return HasFailure() ? 1 : 0;
+  });
   EXPECT_EQ(status, 0);
   EXPECT_EQ(state_of(*dev, PRIVATE, "a"), "1");
 }
@@ -391,13 +386,11 @@ class earlier_folder : public ::testing::Test {
 TEST_F(earlier_folder, is_brought_over_wherever_the_power_goes) {
   for (int cuts = 1, status = 1; status != 0; cuts++) {
     put();
-    pid_t child = fork();
-    if (child == 0) {
+    status = run_apart([&] {
       calls_until_cut = cuts;
       made.open();
-      _exit(0);
-    }
-    waitpid(child, &status, 0);
+      return 0;
+    });
     EXPECT_TRUE(status == 0 || was_cut(status)) << cuts;
     EXPECT_TRUE(status != 0 || cuts > 20);
     auto dev = made.open();
