@@ -157,6 +157,31 @@ bool is_swept(size_t at, size_t size) {
   return at < 8 || size - at < 150 || at % 7 == 0;
 }
 
+// What a lack of memory is answered with, by the first of these that is traced; what is not here
+// hands the code of the platform on or says that memory or something unknown was missing.
+constexpr struct {
+  const char* trace;
+  TEEC_Result res;
+  int32_t km_error;
+} ANSWERS[] = {
+    {"update: Unmarshal failed", TEEC_SUCCESS, -38},
+    {"ec_verify_finish: Decode signature failed", TEEC_SUCCESS, -30},
+    {"upgrade_key: Open V1 key failed", TEEC_ERROR_ITEM_NOT_FOUND, 0},
+    {"open_key: ", TEEC_SUCCESS, -62},
+    {": Unmarshal failed", TEEC_ERROR_BAD_PARAMETERS, 0},
+    {"save_key: ", FAULT, 0},
+    {"resolve_key_data: ", TEEC_SUCCESS, -1000},
+};
+
+bool is_right_answer(const reply& answer, const std::string& errors) {
+  for (const auto& [trace, res, km_error] : ANSWERS) {
+    if (errors.find(trace) == std::string::npos) continue;
+    return answer.res == res && answer.km_error == km_error;
+  }
+  if (answer.res == FAULT) return answer.km_error == 0 || answer.km_error == -1000;
+  return answer.res == TEEC_SUCCESS && (answer.km_error == -41 || answer.km_error == -1000);
+}
+
 TEST_F(Sweep, EveryFailedPlatformCallIsReported) {
   for (const good_request& row : good) {
     SCOPED_TRACE(row.name);
@@ -166,8 +191,10 @@ TEST_F(Sweep, EveryFailedPlatformCallIsReported) {
       return what = row.make();
     };
     ta.fail_each_call(FAULT, make, [&](const reply& answer, bool fired) {
-      EXPECT_EQ(answer.ok(), !fired);
-      EXPECT_EQ(ta.trace().errors().empty(), answer.ok());
+      const std::string errors = ta.trace().errors();
+      EXPECT_EQ(errors.empty(), !fired);
+      EXPECT_TRUE(fired ? is_right_answer(answer, errors) : answer.ok())
+          << answer.res << ", " << answer.km_error << ": " << errors;
       abandon(what, answer);
     });
   }

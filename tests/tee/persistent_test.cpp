@@ -142,6 +142,7 @@ TEST_F(persistent, positions_and_writes_have_limits) {
     EXPECT_EQ(TEE_WriteObjectData(object, "xy", 2), result) << position;
     ASSERT_EQ(TEE_GetObjectInfo1(object, &info), TEE_SUCCESS);
     EXPECT_EQ(info.dataSize, length);
+    EXPECT_EQ(static_cast<intmax_t>(info.dataPosition), position + (result == TEE_SUCCESS ? 2 : 0));
   }
   ASSERT_EQ(TEE_SeekObjectData(object, 0, TEE_DATA_SEEK_SET), TEE_SUCCESS);
   EXPECT_EQ(read_all(object), std::string("012xy5678xy\0\0xy", 15));
