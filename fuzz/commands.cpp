@@ -6,8 +6,10 @@
 #include <functional>
 #include <set>
 
+#include "keymaster/client/vault.h"
 #include "support/sets.h"
 #include "support/ta_under_test.h"
+#include "ta/pkey.h"
 
 using namespace keymaster;
 using namespace keymaster::test;
@@ -56,12 +58,46 @@ const param_set USER_KEY = hmac_key(256)
                                .add(KM_TAG_MIN_SECONDS_BETWEEN_OPS, 0)
                                .add_bytes(KM_TAG_APPLICATION_ID, client::as_bytes("id"));
 
+const param_set RSA_KEY =
+    with(any_use(KM_ALGORITHM_RSA), KM_TAG_KEY_SIZE, {512}).add(KM_TAG_RSA_PUBLIC_EXPONENT, 65537);
+const param_set EC_KEY = with(any_use(KM_ALGORITHM_EC), KM_TAG_KEY_SIZE, {256});
+const param_set SOTER_KEY = param_set(RSA_KEY).add_flag(KM_TAG_SOTER_KEY);
+
+param_set padded(uint32_t padding, uint32_t digest = KM_DIGEST_NONE) {
+  return use({padding, digest});
+}
+const param_set RSA_PSS = padded(KM_PAD_RSA_PSS, KM_DIGEST_SHA1);
+const param_set RSA_SIGN = padded(KM_PAD_RSA_PKCS1_1_5_SIGN, KM_DIGEST_SHA_2_256);
+const param_set EC_SHA256 = one(KM_TAG_DIGEST, KM_DIGEST_SHA_2_256);
+const param_set EC_RAW = one(KM_TAG_DIGEST, KM_DIGEST_NONE);
+const param_set CHALLENGE =
+    param_set().add_bytes(KM_TAG_ATTESTATION_CHALLENGE, client::as_bytes("challenge"));
+
+// What the factory and a start of the system do for SOTER.
+bool prepare_soter(ta_under_test* ta) {
+  client::vault(client::context(ta->path()))
+      .provision({.attk = client::read_rsa_numbers(pkey::rsa(1024).import_data()),
+                  .fingerprint_name = "s",
+                  .fingerprint_version = "2",
+                  .cpu_id = "c",
+                  .device_id = "0123456789abcdef",
+                  .ta_data = {}});
+  ta->expect_loading();
+  return succeeded(ta->send({.id = 0xFF00}));
+}
+
 struct world {
   ta_under_test ta{{.trace_level = TEE_TRACE_DEBUG}};
+  const bool is_soter_ready = prepare_soter(&ta);
   const bytes mac_key = ta.generate(hmac_key(256));
   const bytes cipher_key = ta.generate(AES_KEY);
   const bytes user_key = ta.generate(USER_KEY);
+  const bytes rsa_key = ta.generate(RSA_KEY);
+  const bytes ec_key = ta.generate(EC_KEY);
+  const bytes soter_key = ta.generate(SOTER_KEY);
   const bytes data = bytes(48, 0x77);
+  const bytes rsa_signature = ta.run(KM_PURPOSE_SIGN, rsa_key, RSA_SIGN, data);
+  const bytes ec_signature = ta.run(KM_PURPOSE_SIGN, ec_key, EC_SHA256, data);
   std::set<uint32_t> live;
 
   // The good requests, for an operation where they want one.
@@ -86,6 +122,32 @@ struct world {
       [&](uint32_t handle) { return step_request(command::UPDATE, handle, {}, associated, 64); },
       [&](uint32_t handle) { return step_request(command::FINISH, handle, data, {}, 128); },
       [](uint32_t handle) { return abort_request(handle); },
+      [](auto) { return generate_request(EC_KEY, 2048); },
+      [&](auto) { return begin_request(KM_PURPOSE_SIGN, rsa_key, RSA_SIGN, 64); },
+      [&](auto) { return begin_request(KM_PURPOSE_SIGN, rsa_key, RSA_PSS, 64); },
+      [&](auto) { return begin_request(KM_PURPOSE_VERIFY, rsa_key, RSA_SIGN, 64); },
+      [&](auto) {
+        return begin_request(KM_PURPOSE_ENCRYPT, rsa_key, padded(KM_PAD_RSA_PKCS1_1_5_ENCRYPT), 64);
+      },
+      [&](auto) { return begin_request(KM_PURPOSE_DECRYPT, rsa_key, padded(KM_PAD_NONE), 64); },
+      [&](auto) { return begin_request(KM_PURPOSE_SIGN, ec_key, EC_SHA256, 64); },
+      [&](auto) { return begin_request(KM_PURPOSE_SIGN, ec_key, EC_RAW, 64); },
+      [&](auto) { return begin_request(KM_PURPOSE_VERIFY, ec_key, EC_SHA256, 64); },
+      [&](uint32_t handle) {
+        return step_request(command::FINISH, handle, rsa_signature, {}, 128);
+      },
+      [&](uint32_t handle) { return step_request(command::FINISH, handle, ec_signature, {}, 128); },
+      [&](uint32_t handle) { return step_request(command::FINISH, handle, {}, {}, 128); },
+      [&](auto) { return key_request(command::EXPORT_KEY, rsa_key, {}, 512); },
+      [&](auto) { return key_request(command::EXPORT_KEY, ec_key, {}, 512); },
+      [&](auto) { return attest_request(rsa_key, CHALLENGE, 4096); },
+      [&](auto) { return attest_request(ec_key, CHALLENGE, 4096); },
+      [&](auto) { return begin_request(KM_PURPOSE_SIGN, soter_key, RSA_SIGN, 64); },
+      [&](uint32_t handle) { return step_request(command::FINISH, handle, {}, {}, 1024); },
+      [&](auto) { return key_request(command::EXPORT_KEY, soter_key, {}, 1024); },
+      [](auto) { return request{.id = 0xFF01}; },
+      [](auto) { return request{.id = 0xFF02, .capacity = 1024}; },
+      [](auto) { return request{.id = 0xFF03, .capacity = 64}; },
   };
 
   request next(stream* in) const {
@@ -101,7 +163,12 @@ struct world {
       what = good[chosen](handle);
     } else {
       const uint32_t types = in->u16() & 0x7777;
-      what = {.id = in->u8() % 40u, .a = in->u8(), .input = data, .capacity = 64, .b = in->u8()};
+      const uint32_t id = in->u8();
+      what = {.id = id < 0xF0 ? id % 40 : 0xFF00 | id % 16,
+              .a = in->u8(),
+              .input = data,
+              .capacity = 64,
+              .b = in->u8()};
       if (types % 2 == 1) what.types = types;
     }
     if (room != 0 && what.capacity != 0) what.capacity = room;
@@ -132,6 +199,7 @@ struct world {
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   GTEST_FLAG_SET(break_on_failure, true);
   static world all;
+  EXPECT_TRUE(all.is_soter_ready);
   all.ta.configure(OS_VERSION, OS_PATCHLEVEL);
   stream in(data, size);
   while (!in.empty())

@@ -90,6 +90,7 @@ TEST_F(adapter, RsaNumbersThatDoNotBelongTogetherAreRefused) {
     EXPECT_EQ(answer(good), TEE_SUCCESS);
     EXPECT_EQ(answer(good), TEE_SUCCESS);  // remembered
     EXPECT_EQ(answer(numbers(good.begin(), good.begin() + 3)), TEE_SUCCESS);
+    EXPECT_EQ(answer({good[N], {1}, {1}}), TEE_ERROR_BAD_PARAMETERS);  // 1 undoes 1, but is no key
     EXPECT_EQ(answer({good[N], good[E], good[D], good[P], good[Q], {}, {}, {}}),
               TEE_ERROR_BAD_PARAMETERS);
     for (size_t which : {N, E, D, P, Q, DP, DQ, QINV}) {
