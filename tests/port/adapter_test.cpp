@@ -179,26 +179,5 @@ TEST_F(adapter, ExportsThePublicKey) {
   }
 }
 
-TEST_F(adapter, RawResultsHaveNoLeadingZeros) {
-  const rsa_key& key = key_of(1024);
-  const auto encryption = rsa_operation(TEE_ALG_RSA_NOPAD, TEE_MODE_ENCRYPT, key.all);
-  const auto decryption = rsa_operation(TEE_ALG_RSA_NOPAD, TEE_MODE_DECRYPT, key.all);
-  for (const bytes& number : {bytes{0}, bytes{1}, bytes{5, 6, 7}}) {
-    bytes hidden(128), found(128);
-    size_t size = hidden.size();
-    ASSERT_EQ(TEE_AsymmetricEncrypt(encryption, nullptr, 0, number.data(), number.size(),
-                                    hidden.data(), &size),
-              TEE_SUCCESS);
-    size_t found_size = found.size();
-    ASSERT_EQ(TEE_AsymmetricDecrypt(decryption, nullptr, 0, hidden.data(), size, found.data(),
-                                    &found_size),
-              TEE_SUCCESS);
-    found.resize(found_size);
-    EXPECT_EQ(found, number);
-  }
-  TEE_FreeOperation(encryption);
-  TEE_FreeOperation(decryption);
-}
-
 }  // namespace
 }  // namespace tee::test
