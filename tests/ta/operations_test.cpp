@@ -60,7 +60,13 @@ TEST_F(Operations, BeginLeavesNoOperationWhenItFails) {
       expect_gone(answer.b);
     }
   }
-  EXPECT_EQ(ta.send(key_request(command::EXPORT_KEY, none)).km_error, -38);
+  // Keys of no algorithm, or of one that nothing knows, are not exported or attested, either.
+  ta.expect_refused(key_request(command::EXPORT_KEY, none), -38,
+                    "export_key: No or too many KM_TAG_ALGORITHM");
+  ta.expect_refused(key_request(command::EXPORT_KEY, unknown), -4,
+                    "export_key: Unsupported algorithm");
+  ta.expect_refused(attest_request(none), -1000, "attest_key: No KM_TAG_ALGORITHM");
+  ta.expect_refused(attest_request(unknown), -4, "attest_key: Algorithm 2 not implemented");
 }
 
 TEST_F(Operations, UnknownHandlesAreRefused) {

@@ -124,6 +124,23 @@ TEST_F(teec, a_context_that_ends_takes_its_sessions_along) {
   EXPECT_NE(made.open(), nullptr);
 }
 
+// Files that are no library; the last one is a program.
+TEST_F(teec, applications_that_do_not_load) {
+  constexpr TEE_UUID BROKEN = {0xb0, 0, 0, {}};
+  const std::string file = made.path() + "/../000000b0-0000-0000-0000-000000000000.ta";
+  setenv("TEE_TA_PATH", (made.path() + "/..").c_str(), 1);
+  host::set_trace_level(0);
+  for (const std::string& content :
+       {std::string(), std::string("no library"), content_of("/proc/self/exe")}) {
+    set_content(file, content);
+    EXPECT_EQ(user.open_session(BROKEN), TEEC_ERROR_BAD_FORMAT);
+    EXPECT_EQ(user.origin, uint32_t{TEEC_ORIGIN_TEE});
+  }
+  host::set_trace_level(TEE_TRACE_ERROR);
+  setenv("TEE_TA_PATH", TEST_TA_PATH, 1);
+  EXPECT_EQ(user.open_session(echo::SECOND), TEEC_SUCCESS);
+}
+
 TEST_F(teec, contexts_that_cannot_be) {
   host::set_trace_level(0);
   TEEC_Context context{};
