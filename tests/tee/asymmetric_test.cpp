@@ -104,6 +104,20 @@ TEST_F(asymmetric, oaep_heeds_label_and_mask_digest) {
   TEE_FreeOperation(decrypter);
 }
 
+// Of the forms in which a public key could go out there is one.
+TEST_F(asymmetric, keys_are_exported_in_one_form) {
+  auto [exporter, other] = on_new_key(TEE_TYPE_RSA_KEYPAIR, 512, TEE_ALG_RSA_NOPAD, {},
+                                      {TEE_MODE_EXPORT, TEE_MODE_ENCRYPT});
+  bytes der(200);
+  for (uint32_t format = 0; format < 9; format++) {
+    size_t length = der.size();
+    EXPECT_EQ(TEE_AsymmetricExport(exporter, format, der.data(), &length),
+              format == TEE_EXPORT_FORMAT_SPKI ? TEE_SUCCESS : TEE_ERROR_NOT_SUPPORTED);
+  }
+  TEE_FreeOperation(exporter);
+  TEE_FreeOperation(other);
+}
+
 // Whatever libcrypto likes to answer: wrong padding is refused.
 TEST_F(asymmetric, wrong_pkcs1_padding_is_refused) {
   auto [encrypter, decrypter] =
