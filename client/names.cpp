@@ -116,6 +116,14 @@ std::string tag_name(keymaster_tag_t tag) {
   return text;
 }
 
+std::vector<keymaster_tag_t> all_tags() {
+  std::vector<keymaster_tag_t> tags;
+  for (const tag_row& row : TAGS) {
+    if (row.tag != KM_TAG_INVALID) tags.push_back(row.tag);
+  }
+  return tags;
+}
+
 std::optional<keymaster_tag_t> parse_tag(std::string_view text) {
   std::string wanted = squash(text);
   for (const tag_row& row : TAGS) {

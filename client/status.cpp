@@ -41,7 +41,7 @@ constexpr advice_row ADVICE[] = {
     {KM_ERROR_UNSUPPORTED_ALGORITHM, "The device does not offer this algorithm."},
     {KM_ERROR_UNSUPPORTED_KEY_SIZE,
      "The algorithm has no keys of this size. HMAC takes 8 to 1024 bits in whole bytes, AES 128, "
-     "192 or 256 bits."},
+     "192 or 256 bits, RSA whole bytes up to 8192 bits, EC 224, 256, 384 or 521 bits."},
     {KM_ERROR_UNSUPPORTED_BLOCK_MODE, "The algorithm has no such block mode."},
     {KM_ERROR_INCOMPATIBLE_BLOCK_MODE,
      "The key does not allow this block mode. Ask for one that its characteristics list."},
@@ -97,11 +97,11 @@ constexpr advice_row ADVICE[] = {
     {KM_ERROR_KEYMASTER_NOT_CONFIGURED,
      "Configure the OS version and patch level before any other command."},
     {KM_ERROR_UNIMPLEMENTED, "This device does not offer the command."},
-    {KM_ERROR_UNKNOWN_ERROR, "The trace on standard error tells what failed."},
+    {KM_ERROR_UNKNOWN_ERROR, "The trusted application's trace tells what failed."},
 };
 
 constexpr tee_row TEE_CODES[] = {
-    {TEEC_ERROR_GENERIC, "TEE_ERROR_GENERIC", "The trace on standard error tells what failed."},
+    {TEEC_ERROR_GENERIC, "TEE_ERROR_GENERIC", "The trusted application's trace tells what failed."},
     {TEEC_ERROR_ACCESS_DENIED, "TEE_ERROR_ACCESS_DENIED", ""},
     {TEEC_ERROR_CANCEL, "TEE_ERROR_CANCEL", ""},
     {TEEC_ERROR_ACCESS_CONFLICT, "TEE_ERROR_ACCESS_CONFLICT", "An object is in use."},

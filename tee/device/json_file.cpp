@@ -21,8 +21,8 @@ const json& member(const json& document, const char* name, const std::string& pa
 json parse_json(std::string_view text, const std::string& path) {
   try {
     return json::parse(text);
-  } catch (const json::exception& error) {
-    throw_damaged(path, error.what());
+  } catch (const json::parse_error& error) {
+    throw_damaged(path, "is no JSON from byte " + std::to_string(error.byte) + " on");
   }
 }
 

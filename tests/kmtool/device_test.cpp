@@ -142,7 +142,7 @@ TEST_F(KmtoolDevice, IsCheckedAndRepaired) {
   write("device/storage.db", before);
   expect({"device", "repair", "--forget"}, DONE, "every key");
   expect({"device", "check"}, DONE, "pass their checks");
-  expect({"show", "k"}, REFUSED, "(-62)");
+  expect({"show", "k"}, REFUSED, "no key of this device");
   expect_done({"generate", "hmac", "-o", "again"});
 }
 

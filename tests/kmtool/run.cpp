@@ -22,14 +22,18 @@ int sandbox::shell(const std::string& line) const {
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 
-call_result sandbox::run(const words& arguments, const std::string& input) const {
-  write(".in", input);
+std::string sandbox::command(const words& arguments) {
   std::string line =
       "env -u TEE_TA_PATH TEE_TRACE_LEVEL=0 KEYMASTER_DEVICE=\"$PWD/device\" "
       "timeout 300 " KMTOOL_PROGRAM;
   for (const std::string& argument : arguments)
     line += " '" + argument + "'";
-  const int exit_code = shell(line + " <.in >.out 2>.err");
+  return line;
+}
+
+call_result sandbox::run(const words& arguments, const std::string& input) const {
+  write(".in", input);
+  const int exit_code = shell(command(arguments) + " <.in >.out 2>.err");
   return {exit_code, read(".out"), read(".err")};
 }
 

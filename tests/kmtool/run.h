@@ -32,8 +32,9 @@ class sandbox : public testing::Test {
   // shell: the exit code of a shell's line in the sandbox.
   int shell(const std::string& line) const;
 
-  // run: kmtool with these arguments, none with a single quote in it; the default device is the
-  // sandbox's folder "device".
+  // command: kmtool with these arguments as a line of the shell, none with a single quote in it;
+  // the default device is the sandbox's folder "device".
+  static std::string command(const words& arguments);
   call_result run(const words& arguments, const std::string& input = "") const;
   std::string out_of(const words& arguments, const std::string& input = "") const {
     return run(arguments, input).out;

@@ -10,6 +10,7 @@
 #include "keymaster/client/names.h"
 #include "keymaster_device.h"
 #include "listing.h"
+#include "operands.h"
 #include "tool.h"
 
 namespace kmtool {
@@ -176,8 +177,14 @@ verb_result inspect(const std::string& path) try {
                 "It takes certificates in PEM, or one in DER.");
 }
 
+constexpr size_t MAX_CHALLENGE = 128;
+
 bytes parse_challenge(const std::string& text) try {
-  return client::from_hex(text);
+  bytes challenge = client::from_hex(text);
+  if (challenge.size() <= MAX_CHALLENGE) return challenge;
+  throw failure(WRONG_USAGE, "--challenge: it has " + std::to_string(challenge.size()) +
+                                 " bytes, and at most " + std::to_string(MAX_CHALLENGE) +
+                                 " are taken");
 } catch (const std::invalid_argument& error) {
   throw failure(WRONG_USAGE, "cannot read the challenge: " + std::string(error.what()));
 }
@@ -185,7 +192,7 @@ bytes parse_challenge(const std::string& text) try {
 struct attest_options {
   std::string key;
   std::string challenge;
-  std::string output = "-";
+  std::string output;  // empty: printed
 };
 
 verb_result attest(const std::string& folder, const attest_options& options) {
@@ -200,15 +207,17 @@ verb_result attest(const std::string& folder, const attest_options& options) {
     pem += to_pem(link.get());
   verb_result result;
   result.object = {{"key", options.key}, {"certificates", made.value}};
-  if (options.output == "-") {
+  if (options.output.empty()) {
     result.object["chain"] = pem;
     result.text = pem;
   } else {
     write_file(options.output, {reinterpret_cast<const uint8_t*>(pem.data()), pem.size()},
                access::NORMAL);
     result.object["output"] = options.output;
-    result.text = "Wrote a chain of " + std::to_string(made.value) + " certificates to " +
-                  options.output + "\n";
+    if (options.output != "-") {
+      result.text = "Wrote a chain of " + std::to_string(made.value) + " certificates to " +
+                    options.output + "\n";
+    }
   }
   return result;
 }
@@ -218,18 +227,17 @@ verb_result attest(const std::string& folder, const attest_options& options) {
 void add_attest_verbs(CLI::App* app, command_line* line) {
   CLI::App* verb = app->add_subcommand("attest", "Have a key attested with a certificate chain");
   auto options = std::make_shared<attest_options>();
-  verb->add_option("KEY", options->key, "File that holds the key blob")->required();
+  add_input(verb, "KEY", &options->key, "File that holds the key blob")->required();
   verb->add_option("--challenge", options->challenge, "What the relying party asked for")
       ->required()
       ->type_name("HEX");
-  // Not --output: with --json the chain is a member of the object.
-  verb->add_option("-o", options->output, "File for the chain in PEM (default: standard output)")
-      ->type_name("FILE");
+  add_output(verb, "-o,--output", &options->output,
+             "File for the chain in PEM; without it, it is printed");
   verb->callback([=] { line->action = [=] { return attest(line->device_folder(), *options); }; });
 
   verb = app->add_subcommand("inspect", "Show what an attestation certificate says");
   auto path = std::make_shared<std::string>();
-  verb->add_option("FILE", *path, "Certificates in PEM, or one in DER (- for standard input)")
+  add_input(verb, "FILE", path.get(), "Certificates in PEM, or one in DER (- for standard input)")
       ->required();
   verb->callback([=] { line->action = [=] { return inspect(*path); }; });
 }

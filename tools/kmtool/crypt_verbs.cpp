@@ -1,5 +1,6 @@
 // kmtool encrypt | decrypt
 #include "keymaster/client/names.h"
+#include "operands.h"
 #include "operation_run.h"
 #include "output_file.h"
 
@@ -11,6 +12,7 @@ using client::param_set;
 namespace {
 
 constexpr uint32_t DEFAULT_TAG_BITS = 128;
+constexpr uint32_t MAX_TAG_BITS = 128;
 constexpr size_t GCM_NONCE_SIZE = 12;
 constexpr size_t BLOCK_NONCE_SIZE = 16;
 constexpr size_t MAX_AAD_FILE = 16 * 1024 * 1024;
@@ -40,6 +42,7 @@ crypt_plan plan_aes(const crypt_options& options, const param_set& key) {
   if (padding) plan.params.add(KM_TAG_PADDING, *padding);
   plan.authenticated = *mode == KM_MODE_GCM;
   if (plan.authenticated) {
+    check_mac(options.mac_bits, MAX_TAG_BITS);
     plan.params.add(KM_TAG_MAC_LENGTH, options.mac_bits.value_or(DEFAULT_TAG_BITS));
   } else if (options.mac_bits) {
     throw failure(WRONG_USAGE, "--mac: only GCM has a tag");
@@ -130,11 +133,11 @@ using stream_function = void (*)(keymaster_device*, const crypt_options&, const 
 // The output appears only when everything has succeeded: what GCM decrypts is not authenticated
 // before its end.
 verb_result crypt(const std::string& folder, const crypt_options& options, stream_function stream,
-                  const std::string& done) {
+                  access made, const std::string& done) {
   keymaster_device keymaster(folder);
   const opened_key key = open_key(&keymaster, options);
   input_file input(options.input);
-  output_file output(options.output);
+  output_file output(options.output, made);
   stream(&keymaster, options, key, &input, &output);
   output.commit();
   verb_result result;
@@ -150,31 +153,32 @@ verb_result crypt(const std::string& folder, const crypt_options& options, strea
 }
 
 void add_crypt_verb(CLI::App* app, command_line* line, const char* name, const char* help,
-                    stream_function stream, const char* done) {
+                    stream_function stream, access made, const char* done) {
   CLI::App* verb = app->add_subcommand(name, help);
   auto options = std::make_shared<crypt_options>();
   options->output = "-";
   options->add_key_and_input_to(verb, std::string("What to ") + name);
-  verb->add_option("-o,--output", options->output, "File for the result (default: - for output)")
-      ->type_name("FILE");
+  add_output(verb, "-o,--output", &options->output, "File for the result, - for standard output");
   add_name(verb, "--mode", KM_TAG_BLOCK_MODE, &options->mode, "Block mode (default: the key's)");
   verb->add_option("--nonce", options->nonce,
                    "Nonce; without it, it stands in front of the "
                    "ciphertext")
       ->type_name("HEX");
-  verb->add_option("--aad", options->aad_file, "Data that GCM authenticates, too")
-      ->type_name("FILE");
+  add_input(verb, "--aad", &options->aad_file, "Data that GCM authenticates, too");
   options->add_mac_to(verb, "GCM tag length in bits (default: 128)");
   options->add_choices_to(verb);
-  verb->callback(
-      [=] { line->action = [=] { return crypt(line->device_folder(), *options, stream, done); }; });
+  verb->callback([=] {
+    line->action = [=] { return crypt(line->device_folder(), *options, stream, made, done); };
+  });
 }
 
 }  // namespace
 
 void add_crypt_verbs(CLI::App* app, command_line* line) {
-  add_crypt_verb(app, line, "encrypt", "Encrypt a file", encrypt_stream, "Encrypted");
-  add_crypt_verb(app, line, "decrypt", "Decrypt a file", decrypt_stream, "Decrypted");
+  add_crypt_verb(app, line, "encrypt", "Encrypt a file", encrypt_stream, access::NORMAL,
+                 "Encrypted");
+  add_crypt_verb(app, line, "decrypt", "Decrypt a file", decrypt_stream, access::PRIVATE,
+                 "Decrypted");
 }
 
 }  // namespace kmtool

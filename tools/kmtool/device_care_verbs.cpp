@@ -2,6 +2,7 @@
 #include <algorithm>
 
 #include "listing.h"
+#include "operands.h"
 #include "product/uuids.h"
 #include "tee/device/device.h"
 #include "tee/device/uuid.h"
@@ -144,13 +145,13 @@ void add_device_care_verbs(CLI::App* device_verb, command_line* line) {
   auto file = std::make_shared<std::string>();
   CLI::App* backup =
       device_verb->add_subcommand("backup", "Write all that the device is to a new file");
-  backup->add_option("file", *file, "The backup, as secret as the device")->required();
+  add_output(backup, "file", file.get(), "The backup, as secret as the device")->required();
   backup->callback(
       [=] { line->action = [=] { return back_up_device(line->device_folder(), *file); }; });
 
   CLI::App* restore =
       device_verb->add_subcommand("restore", "Make a device's folder of such a file");
-  restore->add_option("file", *file, "The backup")->required();
+  add_input(restore, "file", file.get(), "The backup")->required();
   restore->callback(
       [=] { line->action = [=] { return restore_device(line->device_folder(), *file); }; });
 }

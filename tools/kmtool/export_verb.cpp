@@ -3,6 +3,7 @@
 #include "key_formats.h"
 #include "keymaster/client/names.h"
 #include "keymaster_device.h"
+#include "operands.h"
 #include "options.h"
 #include "tool.h"
 
@@ -14,7 +15,7 @@ namespace {
 
 struct export_options {
   std::string key;
-  std::string output = "-";
+  std::string output;  // empty: printed
   bool der = false;
   application_options application;
 };
@@ -23,7 +24,7 @@ verb_result export_public(const std::string& folder, const export_options& optio
   const bytes blob = read_file(options.key);
   keymaster_device keymaster(folder);
   auto key = keymaster->get_key_characteristics(blob, options.application.get());
-  require(key, "cannot open the key");
+  require_opened(keymaster.session(), options.key, blob, options.application.get(), key);
   if (key.characteristics.contains(KM_TAG_SOTER_KEY)) {
     throw failure(WRONG_USAGE, options.key + " is a SOTER key",
                   "'kmtool soter export' gives the signed document with its public key.");
@@ -36,13 +37,14 @@ verb_result export_public(const std::string& folder, const export_options& optio
   const byte_view text(reinterpret_cast<const uint8_t*>(pem.data()), pem.size());
   verb_result result;
   result.object = {{"key", options.key}, {"public_key", pem}};
-  if (options.output != "-" || options.der) {
-    write_file(options.output, options.der ? byte_view(der) : text, access::NORMAL);
-    result.object["output"] = options.output;
-    if (options.output != "-") result.text = "Wrote the public key to " + options.output + "\n";
-  } else {
+  if (options.output.empty()) {
+    if (options.der) throw failure(WRONG_USAGE, "--der: give -o FILE, or -o - for standard output");
     result.text = pem;
+    return result;
   }
+  write_file(options.output, options.der ? byte_view(der) : text, access::NORMAL);
+  result.object["output"] = options.output;
+  if (options.output != "-") result.text = "Wrote the public key to " + options.output + "\n";
   return result;
 }
 
@@ -51,9 +53,9 @@ verb_result export_public(const std::string& folder, const export_options& optio
 void add_export_verb(CLI::App* app, command_line* line) {
   CLI::App* verb = app->add_subcommand("export", "Export the public key of an RSA or EC key");
   auto options = std::make_shared<export_options>();
-  verb->add_option("KEY", options->key, "File that holds the key blob")->required();
-  verb->add_option("-o", options->output, "File for the public key (default: standard output)")
-      ->type_name("FILE");
+  add_input(verb, "KEY", &options->key, "File that holds the key blob")->required();
+  add_output(verb, "-o,--output", &options->output,
+             "File for the public key; without it, it is printed");
   verb->add_flag("--der", options->der, "DER SubjectPublicKeyInfo instead of PEM");
   options->application.add_to(verb);
   verb->callback(

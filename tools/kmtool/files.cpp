@@ -25,6 +25,14 @@ constexpr char STANDARD_STREAM[] = "-";
 
 }  // namespace
 
+void open_standard_streams() {
+  for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd) {
+    if (fcntl(fd, F_GETFD) >= 0) continue;
+    const int flags = fd == STDIN_FILENO ? O_WRONLY : O_RDONLY;
+    if (open("/dev/null", flags) < 0) _exit(TEE_FAILED);
+  }
+}
+
 input_file::input_file(const std::string& path)
     : path_(path == STANDARD_STREAM ? "standard input" : path),
       fd_(path == STANDARD_STREAM ? dup(STDIN_FILENO) : open(path.c_str(), O_RDONLY | O_CLOEXEC)) {

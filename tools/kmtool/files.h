@@ -15,6 +15,10 @@ namespace kmtool {
 using keymaster::client::byte_view;
 using keymaster::client::bytes;
 
+// open_standard_streams: puts something in place of standard streams that the caller closed, whose
+// numbers would go to the next files that are opened. It can neither be read nor written.
+void open_standard_streams();
+
 // input_file: a file that is read from its start to its end.
 class input_file {
  public:

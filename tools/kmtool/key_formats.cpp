@@ -1,8 +1,12 @@
 // Asymmetric keys in files: libcrypto reads and writes the public formats.
 #include "key_formats.h"
 
+#include <algorithm>
+#include <cctype>
 #include <openssl/core_names.h>
+#include <openssl/ec.h>
 #include <openssl/err.h>
+#include <openssl/objects.h>
 #include <openssl/param_build.h>
 #include <openssl/pem.h>
 #include <openssl/rsa.h>
@@ -29,6 +33,11 @@ int no_passphrase(char*, size_t, size_t*, const OSSL_PARAM*, void* asked) {
   return 0;
 }
 
+// Behind a key there may be the end of a line; a file can begin with text, but not end with some.
+bool only_blanks(byte_view rest) {
+  return std::ranges::all_of(rest, [](uint8_t byte) { return isspace(byte) != 0; });
+}
+
 owned<EVP_PKEY> decode(const char* type, const std::string& path, byte_view content) {
   EVP_PKEY* key = nullptr;
   bool encrypted = false;
@@ -49,7 +58,24 @@ owned<EVP_PKEY> decode(const char* type, const std::string& path, byte_view cont
     throw failure(WRONG_USAGE, path + " holds no " + type + " private key",
                   "It takes PEM or DER: PKCS #8, PKCS #1 (RSA) or SEC 1 (EC).");
   }
+  if (!only_blanks({at, length})) {
+    throw failure(WRONG_USAGE,
+                  path + " holds more than one key: " + std::to_string(length) + " bytes follow it",
+                  "It takes one private key.");
+  }
   return found;
+}
+
+// What libcrypto's decoder lets pass: numbers that do not belong together, a private value out of
+// range, a point that is not the private value's or not on the curve.
+void require_sound(EVP_PKEY* key, const std::string& path) {
+  const owned<EVP_PKEY_CTX> context(EVP_PKEY_CTX_new(key, nullptr));
+  if (!context) throw std::bad_alloc();
+  const int sound = EVP_PKEY_check(context.get());
+  ERR_clear_error();
+  if (sound != 1) {
+    throw failure(WRONG_USAGE, path + " holds a key whose numbers do not belong together");
+  }
 }
 
 owned<BIGNUM> number_of(const EVP_PKEY* key, const char* name, const std::string& path) {
@@ -69,7 +95,19 @@ void append_number(const BIGNUM* number, size_t size, client::field_writer* writ
   OPENSSL_cleanse(content.data(), content.size());
 }
 
+bool has_third_prime(const EVP_PKEY* key) {
+  BIGNUM* prime = nullptr;
+  const bool found = EVP_PKEY_get_bn_param(key, OSSL_PKEY_PARAM_RSA_FACTOR3, &prime) == 1;
+  BN_clear_free(prime);
+  ERR_clear_error();
+  return found;
+}
+
 bytes raw_rsa(const EVP_PKEY* key, const std::string& path) {
+  if (has_third_prime(key)) {
+    throw failure(WRONG_USAGE, path + " holds an RSA key of more than two primes",
+                  "Keys of two primes are taken.");
+  }
   client::field_writer writer;
   for (const char* name :
        {OSSL_PKEY_PARAM_RSA_N, OSSL_PKEY_PARAM_RSA_E, OSSL_PKEY_PARAM_RSA_D,
@@ -81,8 +119,19 @@ bytes raw_rsa(const EVP_PKEY* key, const std::string& path) {
   return writer.take();
 }
 
+const curve* curve_of(const EVP_PKEY* key, const std::string& path) {
+  char name[80] = "parameters of its own";
+  EVP_PKEY_get_group_name(key, name, sizeof(name), nullptr);
+  ERR_clear_error();
+  for (const curve& row : CURVES) {
+    if (EC_curve_nist2nid(row.group) == OBJ_sn2nid(name)) return &row;
+  }
+  throw failure(WRONG_USAGE, path + " holds a key on the curve " + name,
+                "Keys on P-224, P-256, P-384 and P-521 are taken.");
+}
+
 bytes raw_ec(const EVP_PKEY* key, const std::string& path) {
-  const uint32_t bits = static_cast<uint32_t>(EVP_PKEY_get_bits(key));
+  const uint32_t bits = curve_of(key, path)->bits;
   const size_t size = (bits + 7) / 8;
   client::field_writer writer;
   writer.u32(bits);
@@ -134,9 +183,13 @@ owned<EVP_PKEY> ec_key(byte_view exported) {
 bytes raw_key_data(uint32_t algorithm, const std::string& path, byte_view content) {
   switch (algorithm) {
     case KM_ALGORITHM_RSA:
-      return raw_rsa(decode("RSA", path, content).get(), path);
-    case KM_ALGORITHM_EC:
-      return raw_ec(decode("EC", path, content).get(), path);
+    case KM_ALGORITHM_EC: {
+      const bool rsa = algorithm == KM_ALGORITHM_RSA;
+      const owned<EVP_PKEY> key = decode(rsa ? "RSA" : "EC", path, content);
+      bytes raw = rsa ? raw_rsa(key.get(), path) : raw_ec(key.get(), path);
+      require_sound(key.get(), path);
+      return raw;
+    }
     default:
       return client::copy_of(content);
   }

@@ -100,6 +100,15 @@ failure bad_param(const std::string& text, const std::string& reason) {
   return {WRONG_USAGE, "--param " + text + ": " + reason};
 }
 
+failure unknown_tag(const std::string& text, const std::string& name) {
+  std::vector<std::string> known;
+  for (const keymaster_tag_t tag : client::all_tags())
+    known.push_back(client::tag_name(tag));
+  const std::string meant = meant_instead(name, known);
+  return {WRONG_USAGE, "--param " + text + ": there is no tag '" + name + "'",
+          meant.empty() ? "'kmtool help tags' lists them." : meant};
+}
+
 client::bytes parse_bytes(const std::string& text, const std::string& value) try {
   if (value.starts_with("hex:")) return client::from_hex(value.substr(4));
   return client::copy_of(client::as_bytes(value));
@@ -152,7 +161,7 @@ param_set parse_param(const std::string& text) {
   size_t equals = text.find('=');
   if (equals == std::string::npos) throw bad_param(text, "has the form TAG=VALUE");
   std::optional<keymaster_tag_t> tag = client::parse_tag(text.substr(0, equals));
-  if (!tag) throw bad_param(text, "there is no tag '" + text.substr(0, equals) + "'");
+  if (!tag) throw unknown_tag(text, text.substr(0, equals));
   std::string value = text.substr(equals + 1);
   param_set set;
   try {

@@ -1,5 +1,4 @@
 // kmtool generate | import | show | upgrade | delete
-#include <cstdlib>
 #include <filesystem>
 
 #include "files.h"
@@ -8,6 +7,7 @@
 #include "keymaster/client/names.h"
 #include "keymaster_device.h"
 #include "listing.h"
+#include "operands.h"
 #include "tool.h"
 
 namespace kmtool {
@@ -25,10 +25,10 @@ struct key_verb_options {
   application_options application;
 
   void add_key_to(CLI::App* verb) {
-    verb->add_option("KEY", key, "File that holds the key blob")->required();
+    add_input(verb, "KEY", &key, "File that holds the key blob")->required();
   }
   void add_output_to(CLI::App* verb) {
-    verb->add_option("-o,--output", output, "File for the key blob")->required()->type_name("KEY");
+    add_output(verb, "-o,--output", &output, "File for the key blob")->required();
     verb->add_flag("--force", force, "Overwrite a file that is there");
   }
   void add_description_to(CLI::App* verb) {
@@ -85,7 +85,7 @@ verb_result show(const std::string& folder, const key_verb_options& options) {
   bytes blob = read_file(options.key);
   keymaster_device keymaster(folder);
   auto asked = keymaster->get_key_characteristics(blob, options.application.get());
-  require(asked, "cannot open the key");
+  require_opened(keymaster.session(), options.key, blob, options.application.get(), asked);
   verb_result result;
   result.object = {{"key", options.key},
                    {"blob_bytes", blob.size()},
@@ -101,11 +101,7 @@ verb_result upgrade(const std::string& folder, const key_verb_options& options) 
   options.application.get().bind(&params);
   keymaster_device keymaster(folder);
   client::key_result made = keymaster->upgrade_key(blob, params);
-  if (made.tee != TEEC_SUCCESS) {
-    throw failure("cannot upgrade the key", made,
-                  "It opens neither here nor with the earlier Keymaster: it is damaged or belongs "
-                  "to another device.");
-  }
+  require_own(options.key, made);
   require(made, "cannot upgrade the key");
   verb_result result = stored("Upgraded the key", options.output, made.blob);
   result.object["os_version"] = keymaster.settings().os_version;
@@ -129,8 +125,6 @@ void require_own_key(client::session* keymaster, const key_verb_options& options
 }
 
 verb_result remove(const std::string& folder, const key_verb_options& options) {
-  // Whether a blob opens is asked in ways that may be refused; their trace lines would mislead.
-  setenv("TEE_TRACE_LEVEL", "0", 0);
   bytes blob = read_file(options.key);
   keymaster_device keymaster(folder);
   if (!options.force) require_own_key(keymaster.session(), options, blob);
@@ -171,8 +165,8 @@ void add_key_verbs(CLI::App* app, command_line* line) {
   {
     auto [verb, options] = add_verb(app, line, "import", "Import a key", import);
     options->add_description_to(verb);
-    verb->add_option("FILE", options->key,
-                     "The key: raw bytes (hmac, aes), PEM or DER (rsa, ec); - for standard input")
+    add_input(verb, "FILE", &options->key,
+              "The key: raw bytes (hmac, aes), PEM or DER (rsa, ec); - for standard input")
         ->required();
     options->add_output_to(verb);
   }
@@ -185,7 +179,9 @@ void add_key_verbs(CLI::App* app, command_line* line) {
     auto [verb, options] =
         add_verb(app, line, "upgrade", "Bring a key up to the device's OS version", upgrade);
     options->add_key_to(verb);
-    options->add_output_to(verb);
+    add_replacement(verb, "-o,--output", &options->output, "File for the key blob; KEY itself does")
+        ->required();
+    verb->add_flag("--force", options->force, "Overwrite another file that is there");
     options->application.add_to(verb);
   }
   {

@@ -17,6 +17,8 @@ failure session_failure(const std::string& application, const client::open_error
 
 namespace {
 
+constexpr TEEC_Result MAC_INVALID = 0xFFFF3071;  // no code of the client API
+
 client::session open_keymaster(const client::context& tee) try {
   return client::session(tee);
 } catch (const client::open_error& error) {
@@ -47,6 +49,24 @@ void report_fingerprint(const keymaster_device& keymaster, uint32_t fid) try {
           "the fingerprint was not accepted");
 } catch (const client::open_error& error) {
   throw session_failure("fingerprint application", error);
+}
+
+void require_own(const std::string& path, const client::status& upgraded) {
+  const bool foreign = upgraded.tee == TEEC_ERROR_ITEM_NOT_FOUND ||
+                       upgraded.tee == TEEC_ERROR_BAD_FORMAT || upgraded.tee == MAC_INVALID;
+  if (!foreign) return;
+  throw failure(REFUSED, path + " is no key of this device",
+                "It is damaged, belongs to another device, or is another kind of file.");
+}
+
+void require_opened(client::session* keymaster, const std::string& path, client::byte_view blob,
+                    const client::application& application, const client::status& asked) {
+  if (asked.error == keymaster::KM_ERROR_KEY_REQUIRES_UPGRADE) {
+    client::param_set params;
+    application.bind(&params);
+    require_own(path, keymaster->upgrade_key(blob, params));
+  }
+  require(asked, "cannot open the key");
 }
 
 keymaster_device::keymaster_device(const std::string& folder)

@@ -40,6 +40,17 @@ class keymaster_device {
   keymaster::client::session session_;
 };
 
+// require_opened: throws failure unless the blob from the file `path` opened, as `asked` tells. One
+// that does not open after an upgrade either is no key of this device; whether it would is tried.
+void require_opened(keymaster::client::session* keymaster, const std::string& path,
+                    keymaster::client::byte_view blob,
+                    const keymaster::client::application& application,
+                    const keymaster::client::status& asked);
+
+// require_own: throws failure when an upgrade of the blob from the file `path` ended as that of
+// something that neither this Keymaster nor the earlier one opens.
+void require_own(const std::string& path, const keymaster::client::status& upgraded);
+
 // report_fingerprint: has the device's fingerprint application report a match to this Keymaster.
 // Throws failure.
 void report_fingerprint(const keymaster_device& keymaster, uint32_t fid);

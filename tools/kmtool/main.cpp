@@ -1,11 +1,15 @@
 // kmtool: creates devices, makes keys and uses them. The one place where results and failures are
 // printed and become exit codes.
+#include <algorithm>
 #include <cstdlib>
 #include <exception>
 #include <iostream>
 #include <new>
 #include <utility>
+#include <vector>
 
+#include "files.h"
+#include "operands.h"
 #include "options.h"
 #include "tee/device/device.h"
 #include "tool.h"
@@ -23,6 +27,11 @@ failure::failure(const std::string& action, const client::status& outcome,
       code_(outcome.tee == TEEC_SUCCESS ? REFUSED : TEE_FAILED),
       advice_(advice.empty() ? std::string(outcome.advice()) : advice),
       outcome_(outcome) {}
+
+failure failure::answering(json object) && {
+  answer_ = std::move(object);
+  return std::move(*this);
+}
 
 std::string command_line::device_folder() const {
   return device.empty() ? tee::device::default_path() : device;
@@ -47,10 +56,21 @@ json to_json(const failure& error) {
   return {{"error", std::move(object)}};
 }
 
+// Of these the trace alone tells what happened.
+bool is_nameless(const client::status& outcome) {
+  return outcome.tee != TEEC_SUCCESS || outcome.error == keymaster::KM_ERROR_UNKNOWN_ERROR;
+}
+
+bool traces_nothing() {
+  return std::string(getenv("TEE_TRACE_LEVEL")) == "0";
+}
+
 int report(const failure& error, bool as_json) {
-  if (as_json) print_json(to_json(error));
+  if (as_json) print_json(error.answer() ? *error.answer() : to_json(error));
   std::cerr << "kmtool: " << error.what() << "\n";
   if (!error.advice().empty()) std::cerr << error.advice() << "\n";
+  if (error.outcome() && is_nameless(*error.outcome()) && traces_nothing())
+    std::cerr << "With -v the device's trace tells more.\n";
   return error.code();
 }
 
@@ -61,6 +81,10 @@ failure from_device_error(const tee::device_error& error) {
       return {WRONG_USAGE, error.what(), "Make one with 'kmtool device create'."};
     case kind::EXISTS:
       return {WRONG_USAGE, error.what()};
+    case kind::DAMAGED:
+      return {TEE_FAILED, error.what(),
+              "Put the right file back, or make the device anew from a backup with 'kmtool device "
+              "restore'."};
     default:
       return {TEE_FAILED, error.what()};
   }
@@ -91,33 +115,49 @@ void print_result(const verb_result& result, bool as_json) {
   if (!std::cout) throw failure(WRONG_USAGE, "cannot write standard output");
 }
 
+void set_trace(const std::string& level) {
+  setenv("TEE_TRACE_LEVEL", level.c_str(), 1);
+}
+
 void add_global_options(CLI::App* app, command_line* line) {
   app->add_option("--device", line->device,
                   "Folder of the device (default: $KEYMASTER_DEVICE, else below "
                   "$XDG_STATE_HOME or ~/.local/state)")
-      ->type_name("DIR");
+      ->type_name("DIR")
+      ->check([](const std::string& path) -> std::string {
+        return path.empty() ? "the path is empty" : "";
+      });
   app->add_flag("--json", line->as_json, "Print one JSON object on standard output");
   app->add_option_function<std::string>(
-         "--trace", [](const std::string& level) { setenv("TEE_TRACE_LEVEL", level.c_str(), 1); },
-         "Trace to standard error: 0 none, 1 errors (default), 2 info, 3 debug, 4 flow")
+         "--trace", set_trace,
+         "Trace to standard error: 0 none (default), 1 errors, 2 info, 3 debug, 4 flow")
       ->check(CLI::IsMember({"0", "1", "2", "3", "4"}))
       ->type_name("LEVEL");
+  app->add_flag_callback(
+      "-v,--verbose", [] { set_trace("1"); }, "Trace errors, as --trace 1");
+  app->set_version_flag("--version", "kmtool " KMTOOL_VERSION);
 }
 
-bool wants_standard_output(const CLI::App& verb, const char* option) {
-  const CLI::Option* output = verb.get_option_no_throw(option);
-  return output != nullptr && output->count() > 0 && output->as<std::string>() == "-";
-}
-
-// With --json the object takes standard output; no verb may write there, too.
-void check_outputs(const CLI::App& app, const command_line& line) {
-  if (!line.as_json) return;
-  for (const CLI::App* verb : app.get_subcommands()) {
-    if (wants_standard_output(*verb, "--output") || wants_standard_output(*verb, "--signature")) {
-      throw failure(WRONG_USAGE, "--json and -o - both want standard output");
-    }
-    check_outputs(*verb, line);
+// The first word that was left over where a verb was wanted.
+std::optional<failure> first_unknown(const CLI::App& app) {
+  const CLI::App* verb = &app;
+  while (!verb->get_subcommands().empty())
+    verb = verb->get_subcommands().front();
+  const bool has_verbs = !verb->get_subcommands([](const CLI::App*) { return true; }).empty();
+  for (const std::string& word : app.remaining(true)) {
+    if (has_verbs && !word.starts_with('-')) return unknown_verb(*verb, word);
   }
+  return std::nullopt;
+}
+
+// The command line, last word first, as the parser wants it. Verbs behind "help" are not to be run.
+std::vector<std::string> words_of(int argc, char** argv) {
+  std::vector<std::string> words(argv + 1, argv + argc);
+  const auto verb =
+      std::ranges::find_if(words, [](const std::string& word) { return !word.starts_with('-'); });
+  if (verb != words.end() && *verb == "help") words.insert(verb + 1, "--");
+  std::ranges::reverse(words);
+  return words;
 }
 
 int run_command_line(int argc, char** argv) {
@@ -125,6 +165,8 @@ int run_command_line(int argc, char** argv) {
                "kmtool");
   command_line line;
   app.fallthrough();
+  app.option_defaults()->always_capture_default();
+  setenv("TEE_TRACE_LEVEL", "0", 0);  // a program's TEE tells errors, the tool tells them itself
   add_global_options(&app, &line);
   add_device_verbs(&app, &line);
   add_key_verbs(&app, &line);
@@ -135,15 +177,17 @@ int run_command_line(int argc, char** argv) {
   add_attest_verbs(&app, &line);
   add_soter_verbs(&app, &line);
   add_demo_verb(&app, &line);
+  add_help_verb(&app, &line);
   try {
-    app.parse(argc, argv);
+    app.parse(words_of(argc, argv));
     if (!line.action) throw failure(WRONG_USAGE, "no verb is given", "'kmtool --help' lists them.");
-    check_outputs(app, line);
+    check_operands(app, line.as_json);
     const verb_result result = run(line);
     print_result(result, line.as_json);
     return result.code;
   } catch (const CLI::ParseError& error) {
     if (error.get_exit_code() == 0) return app.exit(error);  // help
+    if (const auto unknown = first_unknown(app)) return report(*unknown, line.as_json);
     return report({WRONG_USAGE, error.what(), "'kmtool VERB --help' tells what it takes."},
                   line.as_json);
   } catch (const failure& error) {
@@ -155,6 +199,8 @@ int run_command_line(int argc, char** argv) {
 }  // namespace kmtool
 
 int main(int argc, char** argv) try {
+  kmtool::open_standard_streams();
+  kmtool::leave_nothing_behind();
   return kmtool::run_command_line(argc, argv);
 } catch (const std::exception& error) {
   // What failed while a failure was reported.

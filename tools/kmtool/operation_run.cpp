@@ -4,6 +4,7 @@
 #include <algorithm>
 
 #include "keymaster/client/names.h"
+#include "operands.h"
 #include "progress.h"
 
 namespace kmtool {
@@ -17,7 +18,7 @@ constexpr size_t CHUNK = 64 * 1024;
 
 constexpr char DOCUMENT_ADVICE[] =
     "A SOTER key signs UTF-8 text without zero bytes, with a digest, on a device that has its "
-    "SOTER data ('kmtool soter check-attk'). The trace on standard error tells what failed.";
+    "SOTER data ('kmtool soter check-attk').";
 
 // Who authenticates for the operation, as --authenticate says.
 client::token_request parse_user(const std::string& text) {
@@ -37,6 +38,15 @@ client::token_request parse_user(const std::string& text) {
   return request;
 }
 
+// What a failure of an operation means that the TA has no code for; empty: nothing more is known.
+std::string advice_on_failure(const opened_key& key, uint32_t purpose) {
+  if (key.characteristics.contains(KM_TAG_SOTER_KEY)) return DOCUMENT_ADVICE;
+  if (key.algorithm() != KM_ALGORITHM_RSA) return "";
+  return purpose == KM_PURPOSE_DECRYPT
+             ? "The input is no ciphertext of this key, or was made with another padding or digest."
+             : "The input is too long for the key and its padding, or its number too large.";
+}
+
 param_set set_of(const bytes& token) {
   param_set params;
   if (!token.empty()) params.add_bytes(KM_TAG_AUTH_TOKEN, token);
@@ -46,16 +56,14 @@ param_set set_of(const bytes& token) {
 }  // namespace
 
 void operation_options::add_key_and_input_to(CLI::App* verb, const std::string& input_help) {
-  verb->add_option("KEY", key, "File that holds the key blob")->required();
-  verb->add_option("-i,--input", input, input_help + " (default: - for standard input)")
-      ->type_name("FILE");
+  add_input(verb, "KEY", &key, "File that holds the key blob")->required();
+  add_input(verb, "-i,--input", &input, input_help + ", - for standard input");
 }
 
 void operation_options::add_choices_to(CLI::App* verb) {
   add_name(verb, "--digest", KM_TAG_DIGEST, &digest, "Digest (default: the key's)");
   add_name(verb, "--padding", KM_TAG_PADDING, &padding, "Padding (default: the key's)");
-  auto* token = verb->add_option("--token", token_file, "Authentication token to show");
-  token->type_name("FILE");
+  auto* token = add_input(verb, "--token", &token_file, "Authentication token to show");
   verb->add_option("--authenticate", authenticate,
                    "Have the device's authenticator vouch for this user, for this operation")
       ->type_name("USER_ID[:TYPE]")
@@ -105,7 +113,7 @@ opened_key open_key(keymaster_device* keymaster, const operation_options& option
   opened_key key;
   key.blob = read_file(options.key);
   auto asked = (*keymaster)->get_key_characteristics(key.blob, options.application.get());
-  require(asked, "cannot open the key");
+  require_opened(keymaster->session(), options.key, key.blob, options.application.get(), asked);
   key.characteristics = std::move(asked.characteristics);
   return key;
 }
@@ -121,11 +129,18 @@ std::optional<uint64_t> choose(const std::optional<uint32_t>& asked, const param
   return key.number(tag);
 }
 
+void check_mac(const std::optional<uint32_t>& bits, uint32_t longest) {
+  if (!bits || (*bits % 8 == 0 && *bits > 0 && *bits <= longest)) return;
+  throw failure(WRONG_USAGE, "--mac " + std::to_string(*bits) + ": it is a multiple of 8 up to " +
+                                 std::to_string(longest) + " here");
+}
+
 operation_run::operation_run(keymaster_device* keymaster, const operation_options& options,
                              const opened_key& key, uint32_t purpose, param_set params,
                              const std::string& action)
     : action_("cannot " + action),
       tokens_(options, key.characteristics),
+      advice_(advice_on_failure(key, purpose)),
       puts_out_document_(key.characteristics.contains(KM_TAG_SOTER_KEY)) {
   options.application.get().bind(&params);
   params.append(tokens_.for_begin(keymaster->context()));
@@ -141,10 +156,8 @@ void operation_run::require(const client::status& outcome) const {
   if (outcome.error == KM_ERROR_KEY_USER_NOT_AUTHENTICATED) {
     throw failure(action_, outcome, tokens_.advice());
   }
-  if (puts_out_document_ && outcome.error == KM_ERROR_UNKNOWN_ERROR) {
-    throw failure(action_, outcome, DOCUMENT_ADVICE);
-  }
-  throw failure(action_, outcome);
+  const bool nameless = outcome.error == KM_ERROR_UNKNOWN_ERROR;
+  throw failure(action_, outcome, nameless ? advice_ : "");
 }
 
 void operation_run::feed(byte_view data, const sink& to, const param_set& extra) {

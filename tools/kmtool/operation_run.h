@@ -68,6 +68,10 @@ std::optional<uint64_t> choose(const std::optional<uint32_t>& asked,
                                keymaster::keymaster_tag_t tag,
                                std::initializer_list<uint32_t> preferred = {});
 
+// check_mac: throws failure (WRONG_USAGE) unless --mac was left out or asks for whole bytes of at
+// most `longest` bits.
+void check_mac(const std::optional<uint32_t>& bits, uint32_t longest);
+
 using sink = std::function<void(byte_view)>;
 
 // operation_run: an operation in progress. `action` ("sign") stands in messages.
@@ -93,6 +97,7 @@ class operation_run {
   operation_tokens tokens_;
   keymaster::client::param_set begun_;
   std::unique_ptr<keymaster::client::operation> operation_;
+  std::string advice_;      // on a failure without a name of its own
   bool puts_out_document_;  // which holds the whole message, escaped
   size_t fed_ = 0;          // bytes
   keymaster::client::param_set token_;

@@ -2,6 +2,8 @@
 #include "output_file.h"
 
 #include <cerrno>
+#include <climits>
+#include <csignal>
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
@@ -46,10 +48,78 @@ void sync_folder_of(const std::string& path) {
   ::close(fd);
 }
 
+// Temporary files that exist now. A call has few outputs; a path that is too long to be noted here
+// cannot be made either.
+class leftover_list {
+ public:
+  void add(const std::string& path) {
+    for (auto& slot : paths_) {
+      if (slot[0] != 0 || path.size() >= sizeof(slot)) continue;
+      memcpy(slot, path.c_str(), path.size() + 1);
+      return;
+    }
+  }
+
+  void remove(const std::string& path) {
+    for (auto& slot : paths_) {
+      if (path == slot) slot[0] = 0;
+    }
+  }
+
+  // For a signal handler.
+  void unlink_all() {
+    for (const auto& slot : paths_) {
+      if (slot[0] != 0) unlink(slot);
+    }
+  }
+
+ private:
+  char paths_[4][PATH_MAX] = {};
+};
+leftover_list leftovers;
+
+constexpr int ENDING[] = {SIGHUP, SIGINT, SIGTERM, SIGPIPE};
+
+// Keeps the signals that end the tool away while it changes what they would have to remove.
+class signals_held {
+ public:
+  signals_held() {
+    sigset_t ending;
+    sigemptyset(&ending);
+    for (const int signal : ENDING)
+      sigaddset(&ending, signal);
+    sigprocmask(SIG_BLOCK, &ending, &before_);
+  }
+  signals_held(const signals_held&) = delete;
+  signals_held& operator=(const signals_held&) = delete;
+  ~signals_held() { sigprocmask(SIG_SETMASK, &before_, nullptr); }
+
+ private:
+  sigset_t before_{};
+};
+
+// Reset to its default by now: the signal ends the tool as if nobody had looked.
+void end_without_leftovers(int signal) {
+  leftovers.unlink_all();
+  raise(signal);
+}
+
 }  // namespace
 
+void leave_nothing_behind() {
+  struct sigaction action {};
+  action.sa_handler = end_without_leftovers;
+  action.sa_flags = static_cast<int>(SA_RESETHAND);
+  for (const int signal : ENDING) {
+    struct sigaction before {};
+    if (sigaction(signal, nullptr, &before) == 0 && before.sa_handler != SIG_IGN) {
+      sigaction(signal, &action, nullptr);
+    }
+  }
+}
+
 output_file::output_file(const std::string& path, access mode)
-    : name_(path == "-" ? "standard output" : path), mode_(mode) {
+    : name_(path == "-" ? "standard output" : path), mode_(mode_of(mode)) {
   struct stat status {};
   if (path == "-") {
     fd_ = dup(STDOUT_FILENO);
@@ -58,15 +128,25 @@ output_file::output_file(const std::string& path, access mode)
     fd_ = open(path.c_str(), O_WRONLY | O_CLOEXEC);
   } else {
     target_ = target_of(path);
+    if (stat(target_.c_str(), &status) == 0) {
+      mode_ = status.st_mode & 07777;
+      owner_ = status.st_uid;
+      group_ = status.st_gid;
+    }
     temporary_ = target_ + ".XXXXXX";
+    const signals_held held;
     fd_ = mkostemp(temporary_.data(), O_CLOEXEC);
+    if (fd_ >= 0) leftovers.add(temporary_);
   }
   if (fd_ < 0) fail_errno(name_);
 }
 
 output_file::~output_file() {
   if (fd_ >= 0) ::close(fd_);
-  if (!temporary_.empty()) unlink(temporary_.c_str());
+  if (target_.empty() || temporary_.empty()) return;
+  const signals_held held;
+  unlink(temporary_.c_str());
+  leftovers.remove(temporary_);
 }
 
 void output_file::write(keymaster::client::byte_view data) {
@@ -79,12 +159,26 @@ void output_file::write(keymaster::client::byte_view data) {
   }
 }
 
+// A group that the user is not in cannot be given; the owner is what counts.
+void output_file::keep_owner() {
+  if (!owner_ || fchown(fd_, *owner_, group_) == 0) return;
+  if (*owner_ == geteuid() || fchown(fd_, *owner_, static_cast<gid_t>(-1)) == 0) {
+    mode_ &= ~static_cast<mode_t>(S_IRWXG | S_ISUID | S_ISGID);
+    return;
+  }
+  throw failure(WRONG_USAGE, name_ + " belongs to another user, and would not any more",
+                "Choose another file, or remove that one first.");
+}
+
 void output_file::commit() {
   if (target_.empty()) return;
-  if (fchmod(fd_, mode_of(mode_)) != 0 || fsync(fd_) != 0 ||
+  keep_owner();
+  const signals_held held;
+  if (fchmod(fd_, mode_) != 0 || fsync(fd_) != 0 ||
       rename(temporary_.c_str(), target_.c_str()) != 0) {
     fail_errno(name_);
   }
+  leftovers.remove(temporary_);
   temporary_.clear();
   sync_folder_of(target_);
 }

@@ -1,5 +1,8 @@
 // kmtool sign | verify
+#include <openssl/crypto.h>
+
 #include "keymaster/client/names.h"
+#include "operands.h"
 #include "operation_run.h"
 #include "soter_document.h"
 
@@ -10,18 +13,27 @@ using client::param_set;
 
 namespace {
 
+std::optional<uint64_t> digest_for(const operation_options& options, const opened_key& key) {
+  return choose(options.digest, key.characteristics, KM_TAG_DIGEST, {KM_DIGEST_SHA_2_256});
+}
+
+// Length in bits of an HMAC key's MAC that nobody shortened.
+uint32_t whole_mac(const operation_options& options, const opened_key& key) {
+  return client::digest_bits(digest_for(options, key).value_or(KM_DIGEST_NONE));
+}
+
 // The begin parameters: what was asked for, else what the key allows. Of several, SHA-256 and PSS.
 param_set begin_params(const operation_options& options, const opened_key& key) {
   param_set params;
-  const std::optional<uint64_t> digest =
-      choose(options.digest, key.characteristics, KM_TAG_DIGEST, {KM_DIGEST_SHA_2_256});
+  const std::optional<uint64_t> digest = digest_for(options, key);
   if (digest) params.add(KM_TAG_DIGEST, *digest);
   const std::optional<uint64_t> padding =
       choose(options.padding, key.characteristics, KM_TAG_PADDING,
              {KM_PAD_RSA_PSS, KM_PAD_RSA_PKCS1_1_5_SIGN, KM_PAD_NONE});
   if (padding) params.add(KM_TAG_PADDING, *padding);
   if (key.algorithm() == KM_ALGORITHM_HMAC) {
-    const uint32_t whole = client::digest_bits(digest.value_or(KM_DIGEST_NONE));
+    const uint32_t whole = whole_mac(options, key);
+    check_mac(options.mac_bits, whole);
     params.add(KM_TAG_MAC_LENGTH, options.mac_bits.value_or(whole));
   } else if (options.mac_bits) {
     throw failure(WRONG_USAGE, "--mac: only HMAC keys sign with a MAC length");
@@ -50,7 +62,7 @@ struct soter_sign_options {
 verb_result sign_document(keymaster_device* keymaster, const operation_options& options,
                           const soter_sign_options& soter, const opened_key& key) {
   const document_files files = {options.output, soter.signature_file};
-  files.check();
+  files.check(options.key);
   if (soter.fid) report_fingerprint(*keymaster, *soter.fid);
   const bytes output = sign_input(keymaster, options, key);
   verb_result result = deliver(client::parse_signed_document(output), files);
@@ -93,8 +105,12 @@ bool verify_input(keymaster_device* keymaster, const operation_options& options,
                   const opened_key& key, const bytes& signature) {
   if (key.algorithm() == KM_ALGORITHM_HMAC) {
     operation_options again = options;
-    again.mac_bits = static_cast<uint32_t>(signature.size() * 8);
-    return sign_input(keymaster, again, key) == signature;
+    const size_t bits = signature.size() * 8;
+    if (bits > whole_mac(options, key)) return false;
+    again.mac_bits = static_cast<uint32_t>(bits);
+    const bytes mac = sign_input(keymaster, again, key);
+    return mac.size() == signature.size() &&
+           CRYPTO_memcmp(mac.data(), signature.data(), mac.size()) == 0;
   }
   input_file input(options.input);
   const sink nowhere = [](byte_view) {};
@@ -115,7 +131,8 @@ verb_result verify(const std::string& folder, const operation_options& options,
   if (!verify_input(&keymaster, options, key, signature)) {
     throw failure(
         "the signature is not this key's over this input",
-        client::status{TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, KM_ERROR_VERIFICATION_FAILED});
+        client::status{TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, KM_ERROR_VERIFICATION_FAILED})
+        .answering({{"key", options.key}, {"input", options.input}, {"verified", false}});
   }
   verb_result result;
   result.object = {{"key", options.key}, {"input", options.input}, {"verified", true}};
@@ -130,13 +147,11 @@ void add_sign_verb(CLI::App* app, command_line* line) {
   auto options = std::make_shared<operation_options>();
   auto soter = std::make_shared<soter_sign_options>();
   options->add_key_and_input_to(verb, "What to sign");
-  verb->add_option("-o,--output", options->output,
-                   "File for the signature's bytes (- for standard output); without it the "
-                   "signature is printed in hexadecimal. A SOTER key writes its document there")
-      ->type_name("FILE");
-  verb->add_option("--signature", soter->signature_file,
-                   "File for the signature over a SOTER key's document (default: FILE.sig)")
-      ->type_name("FILE");
+  add_output(verb, "-o,--output", &options->output,
+             "File for the signature's bytes (- for standard output); without it the signature is "
+             "printed in hexadecimal. A SOTER key writes its document there");
+  add_output(verb, "--signature", &soter->signature_file,
+             "File for the signature over a SOTER key's document (default: FILE.sig)");
   add_number(verb, "--fingerprint", &soter->fid,
              "Report this fingerprint first, so that a SOTER key's document names it");
   options->add_mac_to(verb, "MAC length in bits (default: the digest's)");
@@ -148,9 +163,7 @@ void add_sign_verb(CLI::App* app, command_line* line) {
   auto checked = std::make_shared<operation_options>();
   auto signature = std::make_shared<std::string>();
   checked->add_key_and_input_to(verb, "What was signed");
-  verb->add_option("--signature", *signature, "File with the signature's bytes")
-      ->required()
-      ->type_name("FILE");
+  add_input(verb, "--signature", signature.get(), "File with the signature's bytes")->required();
   checked->add_choices_to(verb);
   verb->callback(
       [=] { line->action = [=] { return verify(line->device_folder(), *checked, *signature); }; });

@@ -8,6 +8,7 @@
 
 #include "files.h"
 #include "libcrypto.h"
+#include "operands.h"
 
 namespace kmtool {
 
@@ -72,18 +73,20 @@ bool verifies(EVP_PKEY* key, int rsa_padding, const EVP_MD* digest, byte_view da
 }  // namespace
 
 void document_files::add_to(CLI::App* verb, const std::string& document_help) {
-  verb->add_option("-o,--output", document, document_help)->type_name("FILE");
-  verb->add_option("--signature", signature,
-                   "File for the document's signature (default: FILE.sig)")
-      ->type_name("FILE");
+  add_output(verb, "-o,--output", &document, document_help);
+  add_output(verb, "--signature", &signature,
+             "File for the document's signature (default: FILE.sig)");
 }
 
-void document_files::check() const {
+void document_files::check(const std::string& key) const {
   if (document.empty() && !signature.empty()) {
     throw failure(WRONG_USAGE, "--signature: there is no -o for the document");
   }
   if (document == "-" && (signature.empty() || signature == "-")) {
     throw failure(WRONG_USAGE, "-o -: give --signature FILE for the signature");
+  }
+  if (signature.empty() && same_file(document + ".sig", key)) {
+    throw failure(WRONG_USAGE, "the signature would go over the key: give --signature FILE");
   }
 }
 

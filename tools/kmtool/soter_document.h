@@ -20,8 +20,8 @@ struct document_files {
 
   // The options -o and --signature.
   void add_to(CLI::App* verb, const std::string& document_help);
-  // Throws failure when the options do not go together.
-  void check() const;
+  // Throws failure when the options do not go together, or the signature would go over `key`.
+  void check(const std::string& key) const;
 };
 
 // deliver: writes the parts of `made` to their files, or into the result: members "document" (the

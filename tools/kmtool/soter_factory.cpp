@@ -6,6 +6,7 @@
 #include "files.h"
 #include "key_formats.h"
 #include "keymaster_device.h"
+#include "operands.h"
 #include "tee/device/uuid.h"
 
 namespace kmtool {
@@ -41,10 +42,8 @@ client::rsa_numbers read_attk(const std::string& path) {
 }  // namespace
 
 void factory_options::add_to(CLI::App* verb) {
-  verb->add_option("--attk", attk_file,
-                   "Device key for SOTER, an RSA-2048 private key in PEM or DER (default: a fresh "
-                   "one)")
-      ->type_name("FILE");
+  add_input(verb, "--attk", &attk_file,
+            "Device key for SOTER, an RSA-2048 private key in PEM or DER (default: a fresh one)");
   add_text(verb, "--fp-name", &fingerprint_name, MAX_SENSOR_TEXT, "Name of the fingerprint sensor");
   add_text(verb, "--fp-version", &fingerprint_version, MAX_SENSOR_TEXT, "Version of the sensor");
   add_text(verb, "--cpu-id", &cpu_id, MAX_CPU_ID,

@@ -1,6 +1,7 @@
 // kmtool soter check-attk | export-attk | device-id | fingerprint | export | verify
 #include "files.h"
 #include "keymaster_device.h"
+#include "operands.h"
 #include "options.h"
 #include "soter_document.h"
 
@@ -85,12 +86,12 @@ struct document_export_options {
 };
 
 verb_result export_document(const std::string& folder, const document_export_options& options) {
-  options.files.check();
+  options.files.check(options.key);
   const bytes blob = read_file(options.key);
   keymaster_device keymaster(folder);
   const client::application app = options.application.get();
   auto key = keymaster->get_key_characteristics(blob, app);
-  require(key, "cannot open the key");
+  require_opened(keymaster.session(), options.key, blob, app, key);
   if (!key.characteristics.contains(KM_TAG_SOTER_KEY)) {
     throw failure(WRONG_USAGE, options.key + " is no SOTER key",
                   "'kmtool export' gives its public key.");
@@ -102,7 +103,7 @@ verb_result export_document(const std::string& folder, const document_export_opt
     throw failure(REFUSED, "the key's document could not be made or signed",
                   "What signs it is chosen with generate's --export-sign: the ATTK, which the "
                   "device must have ('kmtool soter check-attk'), or an RSA key of 2048 bits at "
-                  "most. --trace 1 tells what failed.");
+                  "most. -v tells what failed.");
   }
   const client::signed_document made = client::parse_signed_document(exported.data);
   if (!options.public_key.empty()) {
@@ -134,7 +135,8 @@ verb_result verify_document(const document_verify_options& options) {
                                    "missing here.";
     throw failure(
         "the signature is not this key's over this document",
-        client::status{TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, KM_ERROR_VERIFICATION_FAILED}, hint);
+        client::status{TEEC_SUCCESS, TEEC_ORIGIN_TRUSTED_APP, KM_ERROR_VERIFICATION_FAILED}, hint)
+        .answering({{"verified", false}});
   }
   std::string text = as_text(document);
   if (text.back() == 0) text.pop_back();
@@ -150,8 +152,7 @@ void add_plain_verbs(CLI::App* soter, command_line* line) {
 
   CLI::App* verb = soter->add_subcommand("export-attk", "Export the ATTK's public key as PEM");
   auto output = std::make_shared<std::string>();
-  verb->add_option("-o,--output", *output, "File for the key (default: standard output)")
-      ->type_name("FILE");
+  add_output(verb, "-o,--output", output.get(), "File for the key; without it, it is printed");
   verb->callback(
       [=] { line->action = [=] { return export_attk(line->device_folder(), *output); }; });
 
@@ -169,23 +170,20 @@ void add_document_verbs(CLI::App* soter, command_line* line) {
   CLI::App* verb =
       soter->add_subcommand("export", "Export a SOTER key's public key in a signed document");
   auto exported = std::make_shared<document_export_options>();
-  verb->add_option("KEY", exported->key, "File that holds the key blob")->required();
+  add_input(verb, "KEY", &exported->key, "File that holds the key blob")->required();
   exported->files.add_to(verb, "File for the document (default: both are printed)");
-  verb->add_option("--public-key", exported->public_key,
-                   "File for the public key alone, in PEM, as the document has it")
-      ->type_name("FILE");
+  add_output(verb, "--public-key", &exported->public_key,
+             "File for the public key alone, in PEM, as the document has it");
   exported->application.add_to(verb);
   verb->callback(
       [=] { line->action = [=] { return export_document(line->device_folder(), *exported); }; });
 
   verb = soter->add_subcommand("verify", "Verify a document's signature and print the document");
   auto checked = std::make_shared<document_verify_options>();
-  verb->add_option("DOCUMENT", checked->document, "The document with its zero byte, as stored")
+  add_input(verb, "DOCUMENT", &checked->document, "The document with its zero byte, as stored")
       ->required();
-  verb->add_option("SIGNATURE", checked->signature, "The signature's bytes")->required();
-  verb->add_option("--key", checked->key, "Public key of the signer, PEM or DER")
-      ->required()
-      ->type_name("FILE");
+  add_input(verb, "SIGNATURE", &checked->signature, "The signature's bytes")->required();
+  add_input(verb, "--key", &checked->key, "Public key of the signer, PEM or DER")->required();
   add_name(verb, "--digest", KM_TAG_DIGEST, &checked->digest, "Digest (default: sha256)");
   verb->callback([=] { line->action = [=] { return verify_document(*checked); }; });
 }

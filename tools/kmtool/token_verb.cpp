@@ -1,6 +1,7 @@
 // kmtool token
 #include "files.h"
 #include "keymaster_device.h"
+#include "operands.h"
 #include "options.h"
 #include "tool.h"
 
@@ -43,9 +44,7 @@ void add_token_verb(CLI::App* app, command_line* line) {
   add_number(verb, "--authenticator-id", &options->authenticator_id, "By which authenticator");
   add_name(verb, "--type", KM_TAG_USER_AUTH_TYPE, &options->type, "How (default: password)");
   add_number(verb, "--challenge", &options->challenge, "For which operation (default: 0, none)");
-  verb->add_option("-o,--output", options->output, "File for the token")
-      ->required()
-      ->type_name("FILE");
+  add_output(verb, "-o,--output", &options->output, "File for the token")->required();
   verb->callback(
       [=] { line->action = [=] { return make_token(line->device_folder(), *options); }; });
 }

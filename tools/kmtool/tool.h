@@ -7,6 +7,7 @@
 #include <optional>
 #include <stdexcept>
 #include <string>
+#include <vector>
 
 #include "keymaster/client/status.h"
 
@@ -26,6 +27,10 @@ class failure : public std::runtime_error {
   failure(const std::string& action, const keymaster::client::status& outcome,
           const std::string& advice = "");
 
+  // answering: what --json prints in place of an error object, where the failure is the answer.
+  failure answering(json object) &&;
+
+  const std::optional<json>& answer() const { return answer_; }
   exit_code code() const { return code_; }
   const std::string& advice() const { return advice_; }
   const std::optional<keymaster::client::status>& outcome() const { return outcome_; }
@@ -34,6 +39,7 @@ class failure : public std::runtime_error {
   exit_code code_;
   std::string advice_;
   std::optional<keymaster::client::status> outcome_;
+  std::optional<json> answer_;
 };
 
 // require: throws failure unless the outcome is ok.
@@ -70,5 +76,12 @@ void add_token_verb(CLI::App* app, command_line* line);
 void add_attest_verbs(CLI::App* app, command_line* line);
 void add_soter_verbs(CLI::App* app, command_line* line);
 void add_demo_verb(CLI::App* app, command_line* line);
+void add_help_verb(CLI::App* app, command_line* line);
+
+// unknown_verb: that `app` has no verb of that name, with the one that was probably meant.
+failure unknown_verb(const CLI::App& app, const std::string& word);
+
+// meant_instead: "Did you mean '...'?" when a known name is close to `word`; else empty.
+std::string meant_instead(const std::string& word, const std::vector<std::string>& known);
 
 }  // namespace kmtool

@@ -13,6 +13,9 @@ namespace keymaster::client {
 // tag_name: "key_size" for KM_TAG_KEY_SIZE; "0x30001234" for a tag without a name.
 std::string tag_name(keymaster_tag_t tag);
 
+// all_tags: every tag with a name, in the order of the numbers' list.
+std::vector<keymaster_tag_t> all_tags();
+
 // parse_tag: the tag with that name: "key_size", "KEY_SIZE", "KM_TAG_KEY_SIZE" or its number
 // ("0x30000003"); nothing for another text.
 std::optional<keymaster_tag_t> parse_tag(std::string_view text);
