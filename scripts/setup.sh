@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
 # Installs the Debian packages that building needs and that are not there yet.
 #   scripts/setup.sh [--tests] [--bench] [--checks] [--all]
-# With nothing missing it changes nothing, asks nobody and needs no network.
+# With nothing missing it changes nothing, asks nobody and needs no network. KEYMASTER_NO_SETUP=1
+# leaves everything to whoever runs it.
 set -euo pipefail
 
 build=(g++ cmake ninja-build pkg-config libssl-dev libsqlite3-dev libcli11-dev nlohmann-json3-dev
@@ -9,10 +10,10 @@ build=(g++ cmake ninja-build pkg-config libssl-dev libsqlite3-dev libcli11-dev n
 tests=(libgtest-dev sqlite3 python3 g++-arm-linux-gnueabihf g++-aarch64-linux-gnu
        qemu-user)
 bench=(libbenchmark-dev)
-checks=(git python3 binutils clang-14 libclang-rt-14-dev clang-format-14 clang-tidy-14)
+checks=(git python3 binutils clang libclang-rt-dev clang-format clang-tidy)
 
 usage() {
-  sed -n '2,4s/^# \{0,1\}//p' "$0"
+  sed -n '2,5s/^# \{0,1\}//p' "$0"
 }
 
 wanted=("${build[@]}")
@@ -27,9 +28,12 @@ for option in "$@"; do
   esac
 done
 
+if [[ ${KEYMASTER_NO_SETUP:-} == 1 ]]; then
+  exit 0
+fi
 if ! command -v dpkg-query >/dev/null || ! command -v apt-get >/dev/null; then
-  echo "setup: not a Debian system; install by hand what these packages hold: ${wanted[*]}" >&2
-  exit 1
+  echo "setup: no apt here; what is installed is used. Debian's names for it: ${wanted[*]}" >&2
+  exit 0
 fi
 
 missing=()
