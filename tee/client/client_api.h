@@ -26,4 +26,5 @@ struct client_api {
 }  // namespace tee
 
 // The one symbol by which the two libraries know each other: they are built and installed together.
-extern "C" __attribute__((visibility("default"))) const tee::client_api tee_client_api_in_process;
+extern "C" __attribute__((visibility("default"))) const tee::client_api*
+tee_client_api_in_process();

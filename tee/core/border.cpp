@@ -13,8 +13,8 @@ constinit thread_local border_state at_border;
 
 namespace {
 
-struct crossing {
-  std::jmp_buf back;  // NOLINT(*-member-init): 200 bytes that _setjmp fills
+struct crossing {     // NOLINT(*-member-init)
+  std::jmp_buf back;  // 200 bytes that _setjmp fills
   volatile int cause = 0;
 };
 

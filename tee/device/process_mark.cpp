@@ -29,12 +29,12 @@ mark* map_page() {
 
 // This process's mark: never 0, never that of a process it was forked from.
 uint64_t own_mark() {
-  static mark* const page = map_page();
+  static mark* const PAGE = map_page();
   static mark last = 0;  // goes on counting in forked processes
-  uint64_t own = page->load(std::memory_order_relaxed);
+  uint64_t own = PAGE->load(std::memory_order_relaxed);
   if (own != 0) return own;
   const uint64_t fresh = last.fetch_add(1) + 1;
-  return page->compare_exchange_strong(own, fresh) ? fresh : own;
+  return PAGE->compare_exchange_strong(own, fresh) ? fresh : own;
 }
 
 }  // namespace

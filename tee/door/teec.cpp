@@ -6,12 +6,14 @@
 #include <cstdio>
 #include <cstring>
 #include <dlfcn.h>
+#include <new>
+#include <string>
 
 #include "tee/client/client_api.h"
 
 namespace {
 
-constexpr const char* TEE_LIBRARY = "libtee.so.1";  // found beside this one
+constexpr const char* TEE_LIBRARY = "libtee.so.1";
 constexpr char IN_PROCESS[] = "local:";
 
 using tee::client_api;
@@ -20,15 +22,28 @@ using tee::client_api;
 // it.
 std::atomic<const client_api*> loaded{nullptr};
 
+// The one that the process has already, else the one beside this library.
+void* open_library() {
+  if (void* present = dlopen(TEE_LIBRARY, RTLD_NOW | RTLD_LOCAL | RTLD_NOLOAD)) return present;
+  Dl_info own{};
+  std::string path = TEE_LIBRARY;
+  if (dladdr(&loaded, &own) != 0 && own.dli_fname != nullptr) {
+    const std::string here = own.dli_fname;
+    path = here.substr(0, here.rfind('/') + 1) + TEE_LIBRARY;
+  }
+  return dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
+}
+
 const client_api* load() {
   if (const client_api* api = loaded.load(std::memory_order_acquire)) return api;
-  void* library = dlopen(TEE_LIBRARY, RTLD_NOW | RTLD_LOCAL);
-  void* table = library != nullptr ? dlsym(library, "tee_client_api_in_process") : nullptr;
-  if (table == nullptr) {
+  void* library = open_library();
+  void* found = library != nullptr ? dlsym(library, "tee_client_api_in_process") : nullptr;
+  if (found == nullptr) {
     fprintf(stderr, "[TEE] %s\n", dlerror());
     return nullptr;
   }
-  loaded.store(static_cast<const client_api*>(table), std::memory_order_release);
+  const auto in_process = reinterpret_cast<decltype(&tee_client_api_in_process)>(found);
+  loaded.store(in_process(), std::memory_order_release);
   return loaded;
 }
 
@@ -44,13 +59,15 @@ TEEC_Result refuse(uint32_t* return_origin) {
 
 }  // namespace
 
-TEEC_Result TEEC_InitializeContext(const char* name, TEEC_Context* context) {
+TEEC_Result TEEC_InitializeContext(const char* name, TEEC_Context* context) try {
   if (context == nullptr) return TEEC_ERROR_BAD_PARAMETERS;
   context->imp = nullptr;
-  constexpr size_t prefix = sizeof(IN_PROCESS) - 1;
-  if (name != nullptr && strncmp(name, IN_PROCESS, prefix) == 0) name += prefix;
+  constexpr size_t PREFIX = sizeof(IN_PROCESS) - 1;
+  if (name != nullptr && strncmp(name, IN_PROCESS, PREFIX) == 0) name += PREFIX;
   const client_api* api = load();
   return api != nullptr ? api->initialize_context(name, context) : TEEC_ERROR_COMMUNICATION;
+} catch (const std::bad_alloc&) {
+  return TEEC_ERROR_OUT_OF_MEMORY;
 }
 
 void TEEC_FinalizeContext(TEEC_Context* context) {
