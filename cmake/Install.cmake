@@ -1,5 +1,5 @@
 # What an installation holds: the three TEE headers, the client library with its headers, libteec
-# and the TEE that it loads, the trusted applications and kmtool (each installed where its target is
+# and the TEE that it loads, the trusted applications, kmtool and teed (each installed where its target is
 # made), and the two ways to find them, pkg-config and a CMake package. Every path in it is relative
 # to the file that names it, so the tree can be moved.
 include(CMakePackageConfigHelpers)

@@ -1,7 +1,7 @@
 // The functions behind client_api.h.
 #pragma once
 
-#include "tee/client/client_api.h"
+#include "tee/teec/client_api.h"
 
 namespace tee::in_process {
 

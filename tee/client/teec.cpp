@@ -5,7 +5,6 @@
 #include <utility>
 
 #include "tee/client/in_process.h"
-#include "tee/client/teec_parameters.h"
 #include "tee/client/teec_state.h"
 #include "tee/host/client_identity.h"
 #include "tee/host/open_device.h"
@@ -19,6 +18,10 @@ TEE_UUID to_tee(const TEEC_UUID& uuid) {
   return same;
 }
 
+std::shared_ptr<const shared_region> find_memory(const void* imp) {
+  return client_memories().find(imp);
+}
+
 // Runs a call to a trusted application with the operation's parameters, on behalf of a client of
 // `context`: call(call_parameters*) makes it. The trusted application's outputs go back whatever
 // its result; `return_origin` may be null.
@@ -27,14 +30,17 @@ TEEC_Result call_in(const void* context, TEEC_Operation* operation, uint32_t* re
                     Call call) {
   uint32_t origin = TEEC_ORIGIN_API;
   TEEC_Result res = client_call([&]() -> TEEC_Result {
-    teec_parameters given;
-    TEEC_Result taken = given.take(context, operation);
+    operation_parameters given;
+    TEEC_Result taken = given.take(context, operation, find_memory);
     if (taken != TEEC_SUCCESS) return taken;
-    const operation_in_flight flight(operation);
-    given.for_callee()->asked = flight.asked();
-    const call_result result = call(given.for_callee());
+    cancellation asked;
+    const operation_in_flight flight(operation, [&asked] { asked.request(); });
+    call_parameters own{given.types(), given.slots(), operation != nullptr ? &asked : nullptr};
+    const call_result result = call(&own);
     origin = result.origin;
-    if (origin == TEEC_ORIGIN_TRUSTED_APP && operation != nullptr) given.give_back(operation);
+    if (origin == TEEC_ORIGIN_TRUSTED_APP && operation != nullptr) {
+      given.give_back(own.slots, operation);
+    }
     return result.code;
   });
   if (return_origin != nullptr) *return_origin = origin;
@@ -79,7 +85,7 @@ TEEC_Result open_session(TEEC_Context* context, TEEC_Session* session, const TEE
   if (!client) return TEEC_ERROR_BAD_PARAMETERS;
   return call_in(context->imp, operation, return_origin, [&](call_parameters* own) -> call_result {
     TEE_Identity identity{};
-    TEE_Result res = identify_client(connection_method, connection_data, &identity);
+    TEE_Result res = identify_client(own_process(), connection_method, connection_data, &identity);
     if (res != TEE_SUCCESS) return {res, TEE_ORIGIN_API};
     auto opened = std::make_shared<client_session>(client_session{context->imp, client->host, {}});
     const call_result result =

@@ -28,7 +28,7 @@ TEEC_Result register_shared_memory(TEEC_Context* context, TEEC_SharedMemory* mem
     if (memory->buffer == nullptr) return TEEC_ERROR_BAD_PARAMETERS;
     auto* buffer = static_cast<uint8_t*>(memory->buffer);
     auto kept = std::make_shared<client_memory>(
-        client_memory{context->imp, {}, buffer, memory->size, memory->flags});
+        client_memory{{context->imp, buffer, memory->size, memory->flags}, {}});
     memory->imp = client_memories().add(std::move(kept));
     return TEEC_SUCCESS;
   });
@@ -41,7 +41,7 @@ TEEC_Result allocate_shared_memory(TEEC_Context* context, TEEC_SharedMemory* mem
     secret_bytes bytes(std::max<size_t>(memory->size, 1));
     uint8_t* buffer = bytes.data();
     auto kept = std::make_shared<client_memory>(
-        client_memory{context->imp, std::move(bytes), buffer, memory->size, memory->flags});
+        client_memory{{context->imp, buffer, memory->size, memory->flags}, std::move(bytes)});
     memory->imp = client_memories().add(std::move(kept));
     memory->buffer = buffer;
     return TEEC_SUCCESS;

@@ -5,49 +5,19 @@
 
 namespace tee {
 
-imp_table<client_context>& contexts() {
-  static auto& table = *new imp_table<client_context>;
+imp_table<client_context, way::IN_PROCESS>& contexts() {
+  static auto& table = *new imp_table<client_context, way::IN_PROCESS>;
   return table;
 }
 
-imp_table<client_session>& client_sessions() {
-  static auto& table = *new imp_table<client_session>;
+imp_table<client_session, way::IN_PROCESS>& client_sessions() {
+  static auto& table = *new imp_table<client_session, way::IN_PROCESS>;
   return table;
 }
 
-imp_table<client_memory>& client_memories() {
-  static auto& table = *new imp_table<client_memory>;
+imp_table<client_memory, way::IN_PROCESS>& client_memories() {
+  static auto& table = *new imp_table<client_memory, way::IN_PROCESS>;
   return table;
-}
-
-namespace {
-
-// Calls in flight are few: a list of them, chained through themselves, takes no memory.
-std::mutex flights_mutex;
-operation_in_flight* last_flight = nullptr;
-
-}  // namespace
-
-operation_in_flight::operation_in_flight(const TEEC_Operation* operation) : operation_(operation) {
-  if (operation_ == nullptr) return;
-  std::lock_guard lock(flights_mutex);
-  before_ = last_flight;
-  if (before_ != nullptr) before_->after_ = this;
-  last_flight = this;
-}
-
-operation_in_flight::~operation_in_flight() {
-  if (operation_ == nullptr) return;
-  std::lock_guard lock(flights_mutex);
-  if (before_ != nullptr) before_->after_ = after_;
-  (after_ != nullptr ? after_->before_ : last_flight) = before_;
-}
-
-void operation_in_flight::cancel(const TEEC_Operation* operation) {
-  std::lock_guard lock(flights_mutex);
-  for (operation_in_flight* call = last_flight; call != nullptr; call = call->before_) {
-    if (call->operation_ == operation) call->asked_.request();
-  }
 }
 
 TEEC_Result trace_failure(const char* what) noexcept {

@@ -33,10 +33,6 @@ file_error::file_error(const std::string& action, const std::string& path, int e
                                  std::generic_category().message(error_number)),
       error_number_(error_number) {}
 
-file_descriptor::~file_descriptor() {
-  if (fd_ >= 0) close(fd_);
-}
-
 secret_bytes read_all(const file_descriptor& file, size_t limit, const std::string& path) {
   // Grown as it fills, since the limit may lie far above the file's size.
   secret_bytes bytes;

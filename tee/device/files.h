@@ -5,9 +5,9 @@
 #include <span>
 #include <string>
 #include <string_view>
-#include <utility>
 
 #include "tee/device/device.h"
+#include "tee/device/file_descriptor.h"
 #include "tee/device/secret_bytes.h"
 
 namespace tee {
@@ -22,25 +22,6 @@ class file_error : public device_error {
  private:
   file_error(const std::string& action, const std::string& path, int error_number);
   int error_number_;
-};
-
-// Owner of a file descriptor.
-class file_descriptor {
- public:
-  file_descriptor() = default;
-  explicit file_descriptor(int fd) : fd_(fd) {}
-  file_descriptor(file_descriptor&& other) noexcept : fd_(std::exchange(other.fd_, -1)) {}
-  file_descriptor& operator=(file_descriptor&& other) noexcept {
-    std::swap(fd_, other.fd_);
-    return *this;
-  }
-  ~file_descriptor();
-  int get() const { return fd_; }
-  int release() { return std::exchange(fd_, -1); }  // owned no more, and not closed
-  explicit operator bool() const { return fd_ >= 0; }
-
- private:
-  int fd_ = -1;
 };
 
 // read_all: what is left to read of `file`. DAMAGED when that is more than `limit` bytes, else

@@ -1,20 +1,23 @@
-// libteec: the TEE Client API 1.0 as programs link it. It holds no TEE and no secret: the TEE is a
-// library of its own, which is loaded with the first context.
+// libteec: the TEE Client API 1.0 as programs link it. It holds no TEE and no secret: the TEE is in
+// another process, or a library of its own, which is loaded with the first context on it.
 #include "tee_client_api.h"
 
 #include <atomic>
 #include <cstdio>
-#include <cstring>
 #include <dlfcn.h>
 #include <new>
 #include <string>
+#include <string_view>
 
-#include "tee/client/client_api.h"
+#include "tee/remote/remote.h"
+#include "tee/teec/client_api.h"
+#include "tee/teec/imp_table.h"
 
 namespace {
 
 constexpr const char* TEE_LIBRARY = "libtee.so.1";
-constexpr char IN_PROCESS[] = "local:";
+constexpr std::string_view IN_PROCESS = "local:";
+constexpr std::string_view SERVED = "teed:";
 
 using tee::client_api;
 
@@ -47,9 +50,15 @@ const client_api* load() {
   return loaded;
 }
 
-// What is behind a structure of the client's: without a context there can be nothing.
-const client_api* api_of(const void* structure) {
-  return structure != nullptr ? loaded.load(std::memory_order_acquire) : nullptr;
+// What is behind a structure's number: without a context there can be nothing.
+const client_api* api_of(const void* imp) {
+  if (tee::way_of(imp) == tee::way::SERVED) return &tee::remote::api();
+  return loaded.load(std::memory_order_acquire);
+}
+
+template <typename Structure>
+const client_api* api_behind(const Structure* structure) {
+  return structure != nullptr ? api_of(structure->imp) : nullptr;
 }
 
 TEEC_Result refuse(uint32_t* return_origin) {
@@ -62,8 +71,11 @@ TEEC_Result refuse(uint32_t* return_origin) {
 TEEC_Result TEEC_InitializeContext(const char* name, TEEC_Context* context) try {
   if (context == nullptr) return TEEC_ERROR_BAD_PARAMETERS;
   context->imp = nullptr;
-  constexpr size_t PREFIX = sizeof(IN_PROCESS) - 1;
-  if (name != nullptr && strncmp(name, IN_PROCESS, PREFIX) == 0) name += PREFIX;
+  const std::string_view given = name != nullptr ? name : "";
+  if (given.starts_with(SERVED)) {
+    return tee::remote::api().initialize_context(name + SERVED.size(), context);
+  }
+  if (given.starts_with(IN_PROCESS)) name += IN_PROCESS.size();
   const client_api* api = load();
   return api != nullptr ? api->initialize_context(name, context) : TEEC_ERROR_COMMUNICATION;
 } catch (const std::bad_alloc&) {
@@ -71,21 +83,21 @@ TEEC_Result TEEC_InitializeContext(const char* name, TEEC_Context* context) try 
 }
 
 void TEEC_FinalizeContext(TEEC_Context* context) {
-  if (const client_api* api = api_of(context)) api->finalize_context(context);
+  if (const client_api* api = api_behind(context)) api->finalize_context(context);
 }
 
 TEEC_Result TEEC_RegisterSharedMemory(TEEC_Context* context, TEEC_SharedMemory* sharedMem) {
-  const client_api* api = api_of(context);
+  const client_api* api = api_behind(context);
   return api != nullptr ? api->register_shared_memory(context, sharedMem) : refuse(nullptr);
 }
 
 TEEC_Result TEEC_AllocateSharedMemory(TEEC_Context* context, TEEC_SharedMemory* sharedMem) {
-  const client_api* api = api_of(context);
+  const client_api* api = api_behind(context);
   return api != nullptr ? api->allocate_shared_memory(context, sharedMem) : refuse(nullptr);
 }
 
 void TEEC_ReleaseSharedMemory(TEEC_SharedMemory* sharedMemory) {
-  if (const client_api* api = api_of(sharedMemory)) api->release_shared_memory(sharedMemory);
+  if (const client_api* api = api_behind(sharedMemory)) api->release_shared_memory(sharedMemory);
 }
 
 TEEC_Result TEEC_OpenSession(TEEC_Context* context, TEEC_Session* session,
@@ -93,23 +105,27 @@ TEEC_Result TEEC_OpenSession(TEEC_Context* context, TEEC_Session* session,
                              const void* connectionData, TEEC_Operation* operation,
                              uint32_t* returnOrigin) {
   if (session != nullptr) session->imp = nullptr;
-  const client_api* api = api_of(context);
+  const client_api* api = api_behind(context);
   if (api == nullptr) return refuse(returnOrigin);
   return api->open_session(context, session, destination, connectionMethod, connectionData,
                            operation, returnOrigin);
 }
 
 void TEEC_CloseSession(TEEC_Session* session) {
-  if (const client_api* api = api_of(session)) api->close_session(session);
+  if (const client_api* api = api_behind(session)) api->close_session(session);
 }
 
 TEEC_Result TEEC_InvokeCommand(TEEC_Session* session, uint32_t commandID, TEEC_Operation* operation,
                                uint32_t* returnOrigin) {
-  const client_api* api = api_of(session);
+  const client_api* api = api_behind(session);
   if (api == nullptr) return refuse(returnOrigin);
   return api->invoke_command(session, commandID, operation, returnOrigin);
 }
 
 void TEEC_RequestCancellation(TEEC_Operation* operation) {
-  if (const client_api* api = api_of(operation)) api->request_cancellation(operation);
+  if (operation == nullptr) return;  // it does not tell whose it is: both are asked
+  tee::remote::api().request_cancellation(operation);
+  if (const client_api* api = loaded.load(std::memory_order_acquire)) {
+    api->request_cancellation(operation);
+  }
 }

@@ -5,10 +5,9 @@
 #include <array>
 #include <climits>
 #include <cstring>
-#include <stdexcept>
 #include <string>
 #include <unistd.h>
-#include <vector>
+#include <utility>
 
 #include "tee/device/uuid.h"
 
@@ -20,25 +19,26 @@ namespace {
 constexpr TEE_UUID NAME_SPACE = {
     0x6d1f0bc3, 0x529e, 0x4e0a, {0x8b, 0x77, 0x3c, 0xd1, 0xe4, 0x90, 0x25, 0xaf}};
 
-std::string executable_path() {
+// Empty when it cannot be told.
+std::string target_of(const std::string& link) {
   std::array<char, PATH_MAX> path{};
-  ssize_t length = readlink("/proc/self/exe", path.data(), path.size());
-  if (length <= 0) throw std::runtime_error("cannot tell the client's executable");
-  return {path.data(), static_cast<size_t>(length)};
-}
-
-bool in_group(gid_t group) {
-  if (group == getegid()) return true;
-  int count = getgroups(0, nullptr);
-  std::vector<gid_t> groups(static_cast<size_t>(std::max(count, 0)));
-  count = getgroups(static_cast<int>(groups.size()), groups.data());
-  return count > 0 &&
-         std::find(groups.begin(), groups.begin() + count, group) != groups.begin() + count;
+  ssize_t length = readlink(link.c_str(), path.data(), path.size());
+  return {path.data(), static_cast<size_t>(std::max<ssize_t>(length, 0))};
 }
 
 }  // namespace
 
-TEE_Result identify_client(uint32_t method, const void* data, TEE_Identity* identity) {
+client_process own_process() {
+  const int count = getgroups(0, nullptr);
+  std::vector<gid_t> groups(static_cast<size_t>(std::max(count, 0)));
+  const int got = getgroups(static_cast<int>(groups.size()), groups.data());
+  groups.resize(static_cast<size_t>(std::max(got, 0)));
+  groups.push_back(getegid());
+  return {geteuid(), std::move(groups), "/proc/self/exe"};
+}
+
+TEE_Result identify_client(const client_process& process, uint32_t method, const void* data,
+                           TEE_Identity* identity) {
   bool by_group = method == TEE_LOGIN_GROUP || method == TEE_LOGIN_APPLICATION_GROUP;
   bool by_user = method == TEE_LOGIN_USER || method == TEE_LOGIN_APPLICATION_USER;
   bool by_application = method == TEE_LOGIN_APPLICATION || method == TEE_LOGIN_APPLICATION_USER ||
@@ -49,14 +49,21 @@ TEE_Result identify_client(uint32_t method, const void* data, TEE_Identity* iden
   if (by_group != (data != nullptr)) return TEE_ERROR_BAD_PARAMETERS;
 
   std::string name;
-  if (by_user) name += "user=" + std::to_string(geteuid()) + ";";
+  if (by_user) name += "user=" + std::to_string(process.user) + ";";
   if (by_group) {
     uint32_t group = 0;
     std::memcpy(&group, data, sizeof(group));
-    if (!in_group(group)) return TEE_ERROR_ACCESS_DENIED;
+    const auto& groups = process.groups;
+    if (std::find(groups.begin(), groups.end(), group) == groups.end()) {
+      return TEE_ERROR_ACCESS_DENIED;
+    }
     name += "group=" + std::to_string(group) + ";";
   }
-  if (by_application) name += "application=" + executable_path();
+  if (by_application) {
+    const std::string executable = target_of(process.executable);
+    if (executable.empty()) return TEE_ERROR_ACCESS_DENIED;
+    name += "application=" + executable;
+  }
   *identity = {method, name.empty() ? TEE_UUID{} : name_based_uuid(NAME_SPACE, name)};
   return TEE_SUCCESS;
 }

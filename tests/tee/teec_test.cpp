@@ -4,13 +4,30 @@
 
 #include <filesystem>
 #include <gtest/gtest.h>
+#include <optional>
 #include <stdlib.h>
 
 #include "tests/tee/client.h"
+#include "tests/tee/served_device.h"
 #include "tests/tee/ta_echo/echo_ta.h"
 
 namespace tee::test {
 namespace {
+
+// Both ways to a TEE: in the process, and in one that serves the device.
+class teec_both : public ::testing::TestWithParam<bool> {
+ protected:
+  static std::string name_of(const temp_device& device) {
+    return GetParam() ? "teed:" + device.path() : device.path();
+  }
+
+  temp_device made;
+  std::optional<served_device> served =
+      GetParam() ? std::make_optional<served_device>(made.path()) : std::nullopt;
+  client user{name_of(made), echo::FIRST};
+};
+INSTANTIATE_TEST_SUITE_P(local, teec_both, ::testing::Values(false));
+INSTANTIATE_TEST_SUITE_P(served, teec_both, ::testing::Values(true));
 
 class teec : public ::testing::Test {
  protected:
@@ -21,13 +38,13 @@ class teec : public ::testing::Test {
 constexpr uint32_t MIRROR_TYPES = TEEC_PARAM_TYPES(TEEC_VALUE_INOUT, TEEC_MEMREF_TEMP_INPUT,
                                                    TEEC_MEMREF_TEMP_OUTPUT, TEEC_VALUE_OUTPUT);
 
-TEST_F(teec, registered_and_allocated_memory) {
+TEST_P(teec_both, registered_and_allocated_memory) {
   std::string bytes = "0123456789";
   TEEC_SharedMemory in{bytes.data(), bytes.size(), TEEC_MEM_INPUT, nullptr};
   TEEC_SharedMemory out{nullptr, 8, TEEC_MEM_INPUT | TEEC_MEM_OUTPUT, nullptr};
   ASSERT_EQ(TEEC_RegisterSharedMemory(&user.context, &in), TEEC_SUCCESS);
   ASSERT_EQ(TEEC_AllocateSharedMemory(&user.context, &out), TEEC_SUCCESS);
-  client other(made.path(), echo::SECOND);
+  client other(name_of(made), echo::SECOND);
   TEEC_SharedMemory foreign = in;
   ASSERT_EQ(TEEC_RegisterSharedMemory(&other.context, &foreign), TEEC_SUCCESS);
   TEEC_SharedMemory stale = in;
@@ -83,7 +100,36 @@ TEST_F(teec, registered_and_allocated_memory) {
   }
 }
 
-TEST_F(teec, bad_calls_are_refused) {
+// Small ones and large ones take different ways.
+TEST_P(teec_both, bytes_arrive_whatever_their_size) {
+  for (size_t size : {0, 1, 7, 8, 16'000, 32'768, 40'000, 3'000'000}) {
+    SCOPED_TRACE(size);
+    std::string in(size, '\0');
+    for (size_t i = 0; i < size; i++)
+      in[i] = static_cast<char>(i * 31 >> 3);
+    for (uint32_t out_type : {TEEC_MEMREF_TEMP_OUTPUT, TEEC_MEMREF_TEMP_INOUT}) {
+      for (size_t spare : {0, 100}) {
+        std::string out(size + spare, 'x');
+        TEEC_Operation operation{};
+        operation.paramTypes =
+            TEEC_PARAM_TYPES(TEEC_VALUE_INOUT, TEEC_MEMREF_TEMP_INPUT, out_type, TEEC_VALUE_OUTPUT);
+        operation.params[0].value = {1, 2};
+        operation.params[1].tmpref = {in.data(), in.size()};
+        operation.params[2].tmpref = {out.data(), out.size()};
+        EXPECT_EQ(user.invoke(echo::MIRROR, &operation), TEEC_SUCCESS);
+        EXPECT_EQ(operation.params[0].value.a, 2u);
+        EXPECT_EQ(operation.params[2].tmpref.size, size);
+        EXPECT_EQ(out, in + std::string(spare, 'x'));
+        if (size == 0) continue;
+        operation.params[2].tmpref = {out.data(), size - 1};
+        EXPECT_EQ(user.invoke(echo::MIRROR, &operation), TEEC_ERROR_SHORT_BUFFER);
+        EXPECT_EQ(operation.params[2].tmpref.size, size);
+      }
+    }
+  }
+}
+
+TEST_P(teec_both, bad_calls_are_refused) {
   for (uint32_t types : {4u, 8u, 0xBu, 0x40u, 0x10000u, 0xFFFF0000u}) {
     TEEC_Operation operation{};
     operation.paramTypes = types;
@@ -116,12 +162,14 @@ TEST_F(teec, bad_calls_are_refused) {
   TEEC_FinalizeContext(nullptr);
 }
 
-TEST_F(teec, a_context_that_ends_takes_its_sessions_along) {
+TEST_P(teec_both, a_context_that_ends_takes_its_sessions_along) {
   TEEC_Session copy = user.session;
   TEEC_FinalizeContext(&user.context);
   EXPECT_EQ(TEEC_InvokeCommand(&copy, echo::MIRROR, nullptr, nullptr), TEEC_ERROR_BAD_PARAMETERS);
   TEEC_CloseSession(&copy);
-  EXPECT_NE(made.open(), nullptr);
+  if (!served) {
+    EXPECT_NE(made.open(), nullptr);
+  }
 }
 
 // Files that are no library; the last one is a program.
@@ -144,15 +192,19 @@ TEST_F(teec, applications_that_do_not_load) {
 TEST_F(teec, contexts_that_cannot_be) {
   host::set_trace_level(0);
   TEEC_Context context{};
-  EXPECT_EQ(TEEC_InitializeContext((made.path() + "/none").c_str(), &context),
-            TEEC_ERROR_ITEM_NOT_FOUND);
-  EXPECT_EQ(TEEC_InitializeContext(made.path().c_str(), nullptr), TEEC_ERROR_BAD_PARAMETERS);
-  temp_device held;
-  auto holder = held.open();
-  EXPECT_EQ(TEEC_InitializeContext(held.path().c_str(), &context), TEEC_ERROR_BUSY);
-  holder.reset();
-  set_content(held.file("device.key"), "");
-  EXPECT_EQ(TEEC_InitializeContext(held.path().c_str(), &context), TEEC_ERROR_BAD_FORMAT);
+  for (const std::string way : {"", "local:", "teed:"}) {
+    const auto open = [&](const temp_device& device, const char* below = "") {
+      return TEEC_InitializeContext((way + device.path() + below).c_str(), &context);
+    };
+    EXPECT_EQ(open(made, "/none"), TEEC_ERROR_ITEM_NOT_FOUND);
+    EXPECT_EQ(TEEC_InitializeContext(way.c_str(), nullptr), TEEC_ERROR_BAD_PARAMETERS);
+    temp_device held;
+    auto holder = held.open();
+    EXPECT_EQ(open(held), TEEC_ERROR_BUSY);
+    holder.reset();
+    set_content(held.file("device.key"), "");
+    EXPECT_EQ(open(held), TEEC_ERROR_BAD_FORMAT);
+  }
   setenv("KEYMASTER_DEVICE", made.path().c_str(), 1);
   EXPECT_EQ(TEEC_InitializeContext(nullptr, &context), TEEC_SUCCESS);
   TEEC_FinalizeContext(&context);
