@@ -135,4 +135,19 @@ run kmtool soter verify first.json first.json.sig --key soter.pem
 run kmtool sign soter.key -i payment -o second.json
 run kmtool soter verify second.json second.json.sig --key soter.pem
 
+say "13. A device that stays: two programs at once, and a limit that holds over programs"
+export KEYMASTER_DEVICE=teed:$work/device
+trap 'kmtool device stop >/dev/null || true; rm -rf "$work"' EXIT
+run kmtool generate hmac -o twice.key --size 256 --digest sha256 --min-mac 128 --purpose sign \
+    --param max_uses_per_boot=2
+kmtool sign twice.key -i README.md -o one.mac >/dev/null &
+run kmtool sign twice.key -i README.md -o other.mac
+wait $!
+same "$(hex one.mac)" "$(hex other.mac)" "the MACs of the two programs"
+run kmtool device show
+refused kmtool sign twice.key -i README.md
+run kmtool device reboot
+run kmtool sign twice.key -i README.md
+run kmtool device stop
+
 say "That was a device. Make one of your own: kmtool device create (in $build/bin)"

@@ -4,6 +4,7 @@
 
 #include <atomic>
 #include <cstdio>
+#include <cstdlib>
 #include <dlfcn.h>
 #include <new>
 #include <string>
@@ -12,12 +13,11 @@
 #include "tee/remote/remote.h"
 #include "tee/teec/client_api.h"
 #include "tee/teec/imp_table.h"
+#include "tee/wire/connect.h"
 
 namespace {
 
 constexpr const char* TEE_LIBRARY = "libtee.so.1";
-constexpr std::string_view IN_PROCESS = "local:";
-constexpr std::string_view SERVED = "teed:";
 
 using tee::client_api;
 
@@ -71,11 +71,14 @@ TEEC_Result refuse(uint32_t* return_origin) {
 TEEC_Result TEEC_InitializeContext(const char* name, TEEC_Context* context) try {
   if (context == nullptr) return TEEC_ERROR_BAD_PARAMETERS;
   context->imp = nullptr;
+  // A program with raised rights does not use the device that its caller's environment names.
+  if (name == nullptr) name = secure_getenv("KEYMASTER_DEVICE");
   const std::string_view given = name != nullptr ? name : "";
-  if (given.starts_with(SERVED)) {
-    return tee::remote::api().initialize_context(name + SERVED.size(), context);
+  if (given.starts_with(tee::wire::SERVED)) {
+    return tee::remote::api().initialize_context(name + tee::wire::SERVED.size(), context);
   }
-  if (given.starts_with(IN_PROCESS)) name += IN_PROCESS.size();
+  if (given.starts_with(tee::wire::IN_PROCESS)) name += tee::wire::IN_PROCESS.size();
+  if (name != nullptr && *name == '\0') name = nullptr;
   const client_api* api = load();
   return api != nullptr ? api->initialize_context(name, context) : TEEC_ERROR_COMMUNICATION;
 } catch (const std::bad_alloc&) {

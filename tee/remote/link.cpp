@@ -9,7 +9,7 @@
 #include <utility>
 
 #include "tee/remote/start.h"
-#include "tee/wire/os_memory.h"
+#include "tee/wire/os_calls.h"
 
 namespace tee::remote {
 

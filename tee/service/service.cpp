@@ -17,7 +17,7 @@
 #include "tee/core/log.h"
 #include "tee/host/open_device.h"
 #include "tee/service/service_connection.h"
-#include "tee/wire/os_memory.h"
+#include "tee/wire/os_calls.h"
 #include "tee/wire/records.h"
 
 namespace tee::service {

@@ -3,7 +3,7 @@
 
 #include <utility>
 
-#include "tee/wire/os_memory.h"
+#include "tee/wire/os_calls.h"
 
 namespace tee::service {
 

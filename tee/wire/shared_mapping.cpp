@@ -5,7 +5,7 @@
 #include <sys/mman.h>
 #include <utility>
 
-#include "tee/wire/os_memory.h"
+#include "tee/wire/os_calls.h"
 
 namespace tee::wire {
 

@@ -93,6 +93,30 @@ TEST_F(KmtoolDevice, NothingThatItTellsLetsOthersForgeItsKeys) {
 
 // The identity of a device of the earlier form stood in its settings and its documents. It does not
 // any more, and the keys stay.
+// Limits hold over programs until the device reboots.
+TEST_F(KmtoolDevice, IsServed) {
+  expect_done({"device", "create"});
+  const words served = {"--device", "teed:" + path("device")};
+  auto sign = [&](int exit_code, const std::string& message) {
+    words call = served;
+    call.insert(call.end(), {"sign", "k", "-i", "m", "-o", "mac"});
+    expect(call, exit_code, message);
+  };
+  write("m", "message");
+  expect_done(served, {"generate", "hmac", "--size", "256", "--digest", "sha256", "--min-mac",
+                       "128", "--purpose", "sign", "--param", "max_uses_per_boot=2", "-o", "k"});
+  EXPECT_EQ(run_json({"device", "show"})["served_by"].count("process"), 1u);
+  sign(0, "");
+  sign(0, "");
+  sign(1, "KM_ERROR_KEY_MAX_OPS_EXCEEDED");
+  expect({"device", "set", "--os-version", "1"}, 3, "is in use by process");
+  expect_done({"device", "reboot"});
+  EXPECT_EQ(run_json({"device", "show"}).count("served_by"), 0u);
+  sign(0, "");
+  EXPECT_EQ(run_json({"device", "stop"})["stopped"], true);
+  EXPECT_EQ(run_json({"device", "stop"})["stopped"], false);
+}
+
 TEST_F(KmtoolDevice, OfTheEarlierFormIsBroughtOver) {
   const std::string identity = "8e6bcb0e-0d5c-4a43-9b1c-7f2b1c2d3e4f";
   fs::copy(EARLIER_DEVICE, path("device"));

@@ -12,7 +12,7 @@
 #include <thread>
 
 #include "tee/wire/connect.h"
-#include "tee/wire/os_memory.h"
+#include "tee/wire/os_calls.h"
 #include "tee/wire/records.h"
 #include "tee/wire/socket.h"
 

@@ -233,7 +233,7 @@ void add_attest_verbs(CLI::App* app, command_line* line) {
       ->type_name("HEX");
   add_output(verb, "-o,--output", &options->output,
              "File for the chain in PEM; without it, it is printed");
-  verb->callback([=] { line->action = [=] { return attest(line->device_folder(), *options); }; });
+  verb->callback([=] { line->action = [=] { return attest(line->device_name(), *options); }; });
 
   verb = app->add_subcommand("inspect", "Show what an attestation certificate says");
   auto path = std::make_shared<std::string>();

@@ -168,7 +168,7 @@ void add_crypt_verb(CLI::App* app, command_line* line, const char* name, const c
   options->add_mac_to(verb, "GCM tag length in bits (default: 128)");
   options->add_choices_to(verb);
   verb->callback([=] {
-    line->action = [=] { return crypt(line->device_folder(), *options, stream, made, done); };
+    line->action = [=] { return crypt(line->device_name(), *options, stream, made, done); };
   });
 }
 

@@ -1,9 +1,13 @@
-// kmtool device create | provision | show | set | reboot
+// kmtool device create | provision | show | set | reboot | stop
+#include <array>
+#include <ctime>
+
 #include "listing.h"
 #include "options.h"
 #include "soter_factory.h"
 #include "tee/device/device.h"
 #include "tee/device/uuid.h"
+#include "tee/wire/connect.h"
 #include "tool.h"
 
 namespace kmtool {
@@ -79,7 +83,44 @@ verb_result set_versions(const std::string& folder, const device_options& option
   return describe("The device is now", folder, settings);
 }
 
+// The time as ISO 8601 has it, UTC.
+std::string utc(time_t time) {
+  std::array<char, 32> text{};
+  std::tm parts{};
+  gmtime_r(&time, &parts);
+  return {text.data(), std::strftime(text.data(), text.size(), "%Y-%m-%dT%H:%M:%SZ", &parts)};
+}
+
+verb_result show_device(const std::string& folder) {
+  verb_result result = describe("The device", folder, tee::device::read_settings(folder));
+  const auto service = tee::wire::find_service(folder);
+  if (!service) return result;
+  result.object["served_by"] = {{"process", service->process}, {"since", utc(service->since)}};
+  table line;
+  line.row("served by",
+           "process " + std::to_string(service->process) + " since " + utc(service->since));
+  result.text += line.text();
+  return result;
+}
+
+void stop(const std::string& folder) {
+  if (!tee::wire::stop_service(folder))
+    throw failure(TEE_FAILED, "the service of the device in " + folder + " does not end");
+}
+
+verb_result stop_device(const std::string& folder) {
+  tee::device::read_settings(folder);  // or throws
+  const bool served = tee::wire::is_served(folder);
+  stop(folder);
+  verb_result result;
+  result.object = {{"device", folder}, {"stopped", served}};
+  result.text = served ? "Nobody serves the device any more\n" : "Nobody serves the device\n";
+  return result;
+}
+
+// What is in the service's memory ends with the boot, so the service may end, too.
 verb_result reboot_device(const std::string& folder) {
+  stop(folder);
   tee::device::reboot(folder);
   verb_result result;
   result.object = {{"device", folder}, {"rebooted", true}};
@@ -113,12 +154,7 @@ void add_device_verbs(CLI::App* app, command_line* line) {
       [=] { line->action = [=] { return provision_device(line->device_folder(), *options); }; });
 
   CLI::App* show = verb->add_subcommand("show", "Show the device's settings");
-  show->callback([=] {
-    line->action = [=] {
-      std::string folder = line->device_folder();
-      return describe("The device", folder, tee::device::read_settings(folder));
-    };
-  });
+  show->callback([=] { line->action = [=] { return show_device(line->device_folder()); }; });
 
   CLI::App* set = verb->add_subcommand("set", "Change the OS version and patch level");
   options->add_versions_to(set);
@@ -127,6 +163,9 @@ void add_device_verbs(CLI::App* app, command_line* line) {
 
   CLI::App* reboot = verb->add_subcommand("reboot", "Start a new boot of the device");
   reboot->callback([=] { line->action = [=] { return reboot_device(line->device_folder()); }; });
+
+  CLI::App* stop = verb->add_subcommand("stop", "End the process that serves the device, if any");
+  stop->callback([=] { line->action = [=] { return stop_device(line->device_folder()); }; });
   add_device_care_verbs(verb, line);
 }
 

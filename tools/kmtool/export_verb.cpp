@@ -59,7 +59,7 @@ void add_export_verb(CLI::App* app, command_line* line) {
   verb->add_flag("--der", options->der, "DER SubjectPublicKeyInfo instead of PEM");
   options->application.add_to(verb);
   verb->callback(
-      [=] { line->action = [=] { return export_public(line->device_folder(), *options); }; });
+      [=] { line->action = [=] { return export_public(line->device_name(), *options); }; });
 }
 
 }  // namespace kmtool

@@ -149,7 +149,7 @@ std::pair<CLI::App*, std::shared_ptr<key_verb_options>> add_verb(CLI::App* app, 
                                                                  verb_function function) {
   CLI::App* verb = app->add_subcommand(name, help);
   auto options = std::make_shared<key_verb_options>();
-  verb->callback([=] { line->action = [=] { return function(line->device_folder(), *options); }; });
+  verb->callback([=] { line->action = [=] { return function(line->device_name(), *options); }; });
   return {verb, options};
 }
 

@@ -1,6 +1,7 @@
 // Opening of devices and of the trusted applications that the tool speaks with.
 #include "keymaster_device.h"
 
+#include "tee/wire/connect.h"
 #include "tool.h"
 
 namespace kmtool {
@@ -27,12 +28,13 @@ client::session open_keymaster(const client::context& tee) try {
 
 }  // namespace
 
-client::context open_device(const std::string& folder) try {
-  return client::context(folder);
+client::context open_device(const std::string& name) try {
+  return client::context(name);
 } catch (const client::open_error& error) {
   // The client API has a code alone; opening the folder itself gives the reason in words, such as
   // which process has it open.
-  tee::device::open(folder);
+  const std::string folder(tee::wire::folder_of(name));
+  if (!tee::wire::is_served(folder)) tee::device::open(folder);
   throw failure("cannot open the device in " + folder, error.reason());
 }
 
@@ -69,9 +71,9 @@ void require_opened(client::session* keymaster, const std::string& path, client:
   require(asked, "cannot open the key");
 }
 
-keymaster_device::keymaster_device(const std::string& folder)
-    : settings_(tee::device::read_settings(folder)),
-      context_(open_device(folder)),
+keymaster_device::keymaster_device(const std::string& name)
+    : settings_(tee::device::read_settings(std::string(tee::wire::folder_of(name)))),
+      context_(open_device(name)),
       session_(open_keymaster(context_)) {
   require(session_.configure(settings_.os_version, settings_.os_patchlevel),
           "cannot configure the device");

@@ -11,9 +11,9 @@
 
 namespace kmtool {
 
-// open_device: a context on the device in `folder`. Throws failure, or tee::device_error with the
+// open_device: a context on the device of that name. Throws failure, or tee::device_error with the
 // reason in words when the folder cannot be opened.
-keymaster::client::context open_device(const std::string& folder);
+keymaster::client::context open_device(const std::string& name);
 
 // session_failure: that a trusted application of the device cannot be reached.
 failure session_failure(const std::string& application, const keymaster::client::open_error& error);
@@ -27,7 +27,7 @@ keymaster::client::bytes issue_token(const keymaster::client::context& tee,
 class keymaster_device {
  public:
   // Throws what open_device throws.
-  explicit keymaster_device(const std::string& folder);
+  explicit keymaster_device(const std::string& name);
 
   keymaster::client::session* operator->() { return &session_; }
   keymaster::client::session* session() { return &session_; }

@@ -12,6 +12,7 @@
 #include "operands.h"
 #include "options.h"
 #include "tee/device/device.h"
+#include "tee/wire/connect.h"
 #include "tool.h"
 
 namespace kmtool {
@@ -33,8 +34,12 @@ failure failure::answering(json object) && {
   return std::move(*this);
 }
 
-std::string command_line::device_folder() const {
+std::string command_line::device_name() const {
   return device.empty() ? tee::device::default_path() : device;
+}
+
+std::string command_line::device_folder() const {
+  return std::string(tee::wire::folder_of(device_name()));
 }
 
 namespace {
@@ -122,10 +127,10 @@ void set_trace(const std::string& level) {
 void add_global_options(CLI::App* app, command_line* line) {
   app->add_option("--device", line->device,
                   "Folder of the device (default: $KEYMASTER_DEVICE, else below "
-                  "$XDG_STATE_HOME or ~/.local/state)")
+                  "$XDG_STATE_HOME or ~/.local/state); teed:DIR: served by a process of its own")
       ->type_name("DIR")
       ->check([](const std::string& path) -> std::string {
-        return path.empty() ? "the path is empty" : "";
+        return tee::wire::folder_of(path).empty() ? "the path is empty" : "";
       });
   app->add_flag("--json", line->as_json, "Print one JSON object on standard output");
   app->add_option_function<std::string>(

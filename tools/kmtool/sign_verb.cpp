@@ -157,7 +157,7 @@ void add_sign_verb(CLI::App* app, command_line* line) {
   options->add_mac_to(verb, "MAC length in bits (default: the digest's)");
   options->add_choices_to(verb);
   verb->callback(
-      [=] { line->action = [=] { return sign(line->device_folder(), *options, *soter); }; });
+      [=] { line->action = [=] { return sign(line->device_name(), *options, *soter); }; });
 
   verb = app->add_subcommand("verify", "Verify a signature, or a MAC");
   auto checked = std::make_shared<operation_options>();
@@ -166,7 +166,7 @@ void add_sign_verb(CLI::App* app, command_line* line) {
   add_input(verb, "--signature", signature.get(), "File with the signature's bytes")->required();
   checked->add_choices_to(verb);
   verb->callback(
-      [=] { line->action = [=] { return verify(line->device_folder(), *checked, *signature); }; });
+      [=] { line->action = [=] { return verify(line->device_name(), *checked, *signature); }; });
 }
 
 }  // namespace kmtool

@@ -148,22 +148,20 @@ verb_result verify_document(const document_verify_options& options) {
 
 void add_plain_verbs(CLI::App* soter, command_line* line) {
   soter->add_subcommand("check-attk", "Ask whether the device has its attestation key (ATTK)")
-      ->callback([=] { line->action = [=] { return check_attk(line->device_folder()); }; });
+      ->callback([=] { line->action = [=] { return check_attk(line->device_name()); }; });
 
   CLI::App* verb = soter->add_subcommand("export-attk", "Export the ATTK's public key as PEM");
   auto output = std::make_shared<std::string>();
   add_output(verb, "-o,--output", output.get(), "File for the key; without it, it is printed");
-  verb->callback(
-      [=] { line->action = [=] { return export_attk(line->device_folder(), *output); }; });
+  verb->callback([=] { line->action = [=] { return export_attk(line->device_name(), *output); }; });
 
   soter->add_subcommand("device-id", "Print the identifier that the factory gave the device")
-      ->callback([=] { line->action = [=] { return device_id(line->device_folder()); }; });
+      ->callback([=] { line->action = [=] { return device_id(line->device_name()); }; });
 
   verb = soter->add_subcommand("fingerprint", "Have the fingerprint application report a match");
   auto fid = std::make_shared<std::optional<uint32_t>>();
   add_number(verb, "FID", fid.get(), "Identifier of the fingerprint")->required();
-  verb->callback(
-      [=] { line->action = [=] { return report_match(line->device_folder(), **fid); }; });
+  verb->callback([=] { line->action = [=] { return report_match(line->device_name(), **fid); }; });
 }
 
 void add_document_verbs(CLI::App* soter, command_line* line) {
@@ -176,7 +174,7 @@ void add_document_verbs(CLI::App* soter, command_line* line) {
              "File for the public key alone, in PEM, as the document has it");
   exported->application.add_to(verb);
   verb->callback(
-      [=] { line->action = [=] { return export_document(line->device_folder(), *exported); }; });
+      [=] { line->action = [=] { return export_document(line->device_name(), *exported); }; });
 
   verb = soter->add_subcommand("verify", "Verify a document's signature and print the document");
   auto checked = std::make_shared<document_verify_options>();

@@ -45,8 +45,7 @@ void add_token_verb(CLI::App* app, command_line* line) {
   add_name(verb, "--type", KM_TAG_USER_AUTH_TYPE, &options->type, "How (default: password)");
   add_number(verb, "--challenge", &options->challenge, "For which operation (default: 0, none)");
   add_output(verb, "-o,--output", &options->output, "File for the token")->required();
-  verb->callback(
-      [=] { line->action = [=] { return make_token(line->device_folder(), *options); }; });
+  verb->callback([=] { line->action = [=] { return make_token(line->device_name(), *options); }; });
 }
 
 }  // namespace kmtool

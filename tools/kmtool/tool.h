@@ -57,11 +57,13 @@ struct verb_result {
 
 // The command line as parsed: options of every call, and what the chosen verb will do.
 struct command_line {
-  std::string device;  // folder; empty: the default one
+  std::string device;  // as named; empty: the default one
   bool as_json = false;
   std::function<verb_result()> action;
 
-  // device_folder: where the device lies.
+  // device_name: the device as the client API takes it; may say that it is served. device_folder:
+  // where it lies.
+  std::string device_name() const;
   std::string device_folder() const;
 };
 

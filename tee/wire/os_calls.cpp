@@ -1,11 +1,12 @@
-// Memory that two processes share and neither can shrink.
-#include "tee/wire/os_memory.h"
+// Calls of the system whose headers lead to <fcntl.h>.
+#include "tee/wire/os_calls.h"
 
 #include <cerrno>
 #include <cstdint>
 #include <fcntl.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 namespace os {
@@ -35,6 +36,10 @@ bool is_fixed_memory(int fd, size_t size) {
 
 int open_place(const char* path) {
   return open(path, O_PATH | O_DIRECTORY | O_CLOEXEC);
+}
+
+int open_process(pid_t process) {
+  return static_cast<int>(syscall(SYS_pidfd_open, process, 0));  // the C library may lack it
 }
 
 }  // namespace os

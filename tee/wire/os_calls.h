@@ -1,8 +1,10 @@
-// Memory that two processes share and neither can shrink. Apart from the rest for <fcntl.h>, which
-// declares a function named tee, as this project's namespace is called.
+// Calls of the system whose headers lead to <fcntl.h>, which declares a function named tee, as this
+// project's namespace is called: memory that two processes share and neither can shrink, folders,
+// processes.
 #pragma once
 
 #include <cstddef>
+#include <sys/types.h>
 
 namespace os {
 
@@ -17,5 +19,9 @@ bool is_fixed_memory(int fd, size_t size);
 // open_place: a folder's descriptor through which paths can be looked up; closed on exec; -1 with
 // errno.
 int open_place(const char* path);
+
+// open_process: a descriptor, closed on exec, that becomes readable when the process ends; -1 with
+// errno.
+int open_process(pid_t process);
 
 }  // namespace os
