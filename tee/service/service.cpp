@@ -51,11 +51,13 @@ TEE_Result service::open(const std::string& path) {
   for (int signal : {SIGTERM, SIGINT, SIGHUP})
     sigaddset(&ends, signal);
   pthread_sigmask(SIG_BLOCK, &ends, nullptr);
-  stopping_ = file_descriptor(signalfd(-1, &ends, SFD_CLOEXEC));
+  signals_ = file_descriptor(signalfd(-1, &ends, SFD_CLOEXEC));
+  asked_ = file_descriptor(eventfd(0, EFD_CLOEXEC));
   events_ = file_descriptor(epoll_create1(EPOLL_CLOEXEC));
-  if (!stopping_ || !events_) return no_socket(path);
+  if (!signals_ || !asked_ || !events_) return no_socket(path);
   watch(listening_.get(), EPOLLIN, LISTENING);
-  watch(stopping_.get(), EPOLLIN, STOPPING);
+  watch(signals_.get(), EPOLLIN, STOPPING);
+  watch(asked_.get(), EPOLLIN, STOPPING);
   since_ = time(nullptr);
   return TEE_SUCCESS;
 }
@@ -68,7 +70,7 @@ void service::watch(int fd, uint32_t events, uint64_t data) {
 }
 
 void service::stop() {
-  kill(getpid(), SIGTERM);
+  eventfd_write(asked_.get(), 1);
 }
 
 void service::run(uint32_t idle_seconds) {

@@ -58,7 +58,8 @@ class service {
   std::shared_ptr<session_opener> host_;
   file_descriptor listening_;
   file_descriptor events_;
-  file_descriptor stopping_;
+  file_descriptor signals_;
+  file_descriptor asked_;  // to stop
   time_t since_ = 0;
   std::mutex mutex_;
   std::condition_variable all_ended_;
