@@ -41,14 +41,14 @@ bytes pattern(size_t length) {
   return made;
 }
 
-secure_world::secure_world() : folder_(temporary_folder()) {
+secure_world::secure_world(const std::string& way) : folder_(temporary_folder()) {
   tee::device_settings settings;
   settings.identity = tee::new_uuid();
   settings.rpmb = false;
   device_id_ = settings.identity;
   const std::string path = folder_ + "/device";
   tee::device::create(path, settings);
-  const client::context context(path);
+  const client::context context(way + path);
   session_.emplace(context);
   commands_.emplace(context, client::KEYMASTER_UUID);
   expect(session_->configure(OS_VERSION, OS_PATCHLEVEL), "configure");

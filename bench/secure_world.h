@@ -21,8 +21,8 @@ bytes pattern(size_t length);
 class secure_world {
  public:
   // Makes a device without replay-protected storage in a temporary folder, starts the trusted
-  // application and configures it.
-  secure_world();
+  // application and configures it. `way`: what stands before the folder in the device's name.
+  explicit secure_world(const std::string& way = "local:");
   secure_world(const secure_world&) = delete;
   secure_world& operator=(const secure_world&) = delete;
   ~secure_world();

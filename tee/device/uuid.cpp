@@ -5,7 +5,7 @@
 #include <charconv>
 #include <openssl/evp.h>
 #include <stdexcept>
-#include <vector>
+#include <string>
 
 #include "tee/device/sealing.h"
 
@@ -91,9 +91,9 @@ TEE_UUID custom_uuid(const uuid_bytes& bytes) {
 }
 
 TEE_UUID name_based_uuid(const TEE_UUID& name_space, std::string_view name) {
-  uuid_bytes prefix = to_bytes(name_space);
-  std::vector<uint8_t> input(prefix.begin(), prefix.end());
-  input.insert(input.end(), name.begin(), name.end());
+  const uuid_bytes prefix = to_bytes(name_space);
+  std::string input(prefix.begin(), prefix.end());
+  input += name;
   std::array<uint8_t, EVP_MAX_MD_SIZE> digest{};
   if (EVP_Digest(input.data(), input.size(), digest.data(), nullptr, EVP_sha1(), nullptr) != 1) {
     throw std::runtime_error("libcrypto failed: EVP_Digest");

@@ -46,6 +46,7 @@ void service_connection::answer_all() {
     if (length == 0) continue;
     const bool sent = wire::send(socket_.get(), std::span(answer_).first(length));
     OPENSSL_cleanse(answer_.data(), answer_used_);
+    if (stops_) owner_.stop();  // whoever asked for it has the answer
     if (!sent) return;
   }
 }
@@ -71,7 +72,7 @@ size_t service_connection::answer_to(std::span<const uint8_t> message) {
                     static_cast<uint32_t>(owner_.since()),
                     {}});
     case wire::request::STOP:
-      owner_.stop();
+      stops_ = true;
       return write({TEEC_SUCCESS, TEEC_ORIGIN_COMMS, 0, 0, {}});
     default:
       break;

@@ -55,6 +55,7 @@ class service_connection {
   std::shared_ptr<remote_client> client_;  // after a greeting
   std::shared_ptr<call_in_progress> calls_ = std::make_shared<call_in_progress>();
   file_descriptor came_;  // with the message
+  bool stops_ = false;    // the service, after the answer
   secret_bytes request_ = secret_bytes(wire::MESSAGE_MAX);
   secret_bytes answer_ = secret_bytes(wire::MESSAGE_MAX);  // zeros between two messages
   size_t answer_used_ = wire::ANSWER_HEADER;
