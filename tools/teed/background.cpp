@@ -90,7 +90,7 @@ void close_strangers() {
 bool is_taken(const std::string& device) {
   const int folder = open(device.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
   if (folder < 0) return false;
-  const bool taken = flock(folder, LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK;
+  const bool taken = flock(folder, LOCK_SH | LOCK_NB) != 0 && errno == EWOULDBLOCK;
   close(folder);
   return taken;
 }

@@ -1,6 +1,7 @@
 // Going into the background, and what others see of it.
 #pragma once
 
+#include <chrono>
 #include <string>
 #include <sys/types.h>
 
@@ -39,7 +40,10 @@ void close_strangers();
 // is_taken: whether a process has the device in that folder.
 bool is_taken(const std::string& device);
 
-// wait_while_starting: whether somebody serves the device, or begins to within some seconds while
+// How long a service may take from having the folder to taking connections.
+constexpr std::chrono::seconds STARTING{2};
+
+// wait_while_starting: whether somebody serves the device, or begins to within STARTING while
 // he has it; false when nobody has it.
 bool wait_while_starting(const std::string& device);
 

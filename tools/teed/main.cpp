@@ -1,6 +1,7 @@
 // teed: serves one device to the programs of its owner, until it is told to end. libteec starts it
 // with the first program that wants the device.
 #include <CLI/CLI.hpp>
+#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
@@ -19,7 +20,6 @@ namespace {
 struct options {
   std::string device;
   std::string ta_path;
-  std::string log;
   uint32_t idle_seconds = 0;
   bool foreground = false;
   bool if_unserved = false;
@@ -67,14 +67,16 @@ int serve(const options& given) {
   teed::starter waiting;
   if (waiting.leave()) return waiting.wait_for_child();
   // From here on in the background.
-  if (given.if_unserved && teed::wait_while_starting(given.device)) return EX_OK;
   waiting.log_to(given.device + "/teed.log");
   confine();
-  const TEE_Result res = tee_serve(given.device.c_str(), given.idle_seconds, be_ready, &waiting);
-  // Somebody else was faster.
-  const bool served =
-      res == TEE_ERROR_BUSY && given.if_unserved && teed::wait_while_starting(given.device);
-  return served ? EX_OK : exit_status(res);
+  // Who looks whether the folder is taken has it for that moment: a refusal can be for nothing.
+  const auto end = std::chrono::steady_clock::now() + teed::STARTING;
+  TEE_Result res = TEE_ERROR_BUSY;
+  do {
+    if (given.if_unserved && teed::wait_while_starting(given.device)) return EX_OK;
+    res = tee_serve(given.device.c_str(), given.idle_seconds, be_ready, &waiting);
+  } while (res == TEE_ERROR_BUSY && given.if_unserved && std::chrono::steady_clock::now() < end);
+  return exit_status(res);
 }
 
 int run(int argc, char** argv) {
