@@ -9,15 +9,9 @@
 namespace tee::in_process {
 namespace {
 
-constexpr uint32_t ALL_DIRECTIONS = TEEC_MEM_INPUT | TEEC_MEM_OUTPUT;
-
 TEEC_Result check(const TEEC_Context* context, const TEEC_SharedMemory* memory) {
-  if (context == nullptr || memory == nullptr || !contexts().find(context->imp)) {
-    return TEEC_ERROR_BAD_PARAMETERS;
-  }
-  if (memory->flags == 0 || (memory->flags & ~ALL_DIRECTIONS) != 0)
-    return TEEC_ERROR_BAD_PARAMETERS;
-  return memory->size <= TEEC_CONFIG_SHAREDMEM_MAX_SIZE ? TEEC_SUCCESS : TEEC_ERROR_OUT_OF_MEMORY;
+  if (context == nullptr || !contexts().find(context->imp)) return TEEC_ERROR_BAD_PARAMETERS;
+  return check_memory(memory);
 }
 
 }  // namespace

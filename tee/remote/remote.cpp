@@ -101,12 +101,7 @@ void finalize_context(TEEC_Context* context) {
 }
 
 TEEC_Result check(const TEEC_Context* context, const TEEC_SharedMemory* memory) {
-  constexpr uint32_t ALL_DIRECTIONS = TEEC_MEM_INPUT | TEEC_MEM_OUTPUT;
-  const bool known = memory != nullptr && contexts().find(context->imp);
-  if (!known || memory->flags == 0 || (memory->flags & ~ALL_DIRECTIONS) != 0) {
-    return TEEC_ERROR_BAD_PARAMETERS;
-  }
-  return memory->size <= TEEC_CONFIG_SHAREDMEM_MAX_SIZE ? TEEC_SUCCESS : TEEC_ERROR_OUT_OF_MEMORY;
+  return contexts().find(context->imp) ? check_memory(memory) : TEEC_ERROR_BAD_PARAMETERS;
 }
 
 TEEC_Result register_shared_memory(TEEC_Context* context, TEEC_SharedMemory* memory) {

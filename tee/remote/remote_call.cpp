@@ -17,10 +17,6 @@ constexpr size_t AREA_ALIGNMENT = 64;
 
 constexpr remote_result GONE = {TEEC_ERROR_TARGET_DEAD, TEEC_ORIGIN_COMMS, 0};
 
-bool is_input(uint32_t type) {
-  return (type & 1) != 0;
-}
-
 size_t in_area(size_t size) {
   return (size + AREA_ALIGNMENT - 1) & ~(AREA_ALIGNMENT - 1);
 }

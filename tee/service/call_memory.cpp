@@ -16,11 +16,6 @@ bool is_known(uint32_t type) {
 
 constexpr uint32_t ALL_TYPES = 0xFFFF;
 
-// In memory references, as in values, the lowest bit stands for input.
-bool has_input(uint32_t type) {
-  return (type & 1) != 0;
-}
-
 }  // namespace
 
 bool call_memory::take(wire::reader& from, const shared_memories& shared,
@@ -35,7 +30,7 @@ bool call_memory::take(wire::reader& from, const shared_memories& shared,
     if (!is_known(type)) return false;
     if (is_memory(type)) {
       if (!take_memory(from, shared, type, slot, i)) return false;
-    } else if (has_input(type)) {
+    } else if (is_input(type)) {
       parameters_.slots[i].value = {slot.a, slot.b};
     }
   }
@@ -60,7 +55,7 @@ bool call_memory::take_memory(wire::reader& from, const shared_memories& shared,
 
 bool call_memory::take_inline(wire::reader& from, uint32_t type, size_t size, size_t slot) {
   std::span<const uint8_t> given;
-  if (has_input(type)) {
+  if (is_input(type)) {
     given = from.bytes(size);
     from.pad();
     if (!from.ok()) return false;

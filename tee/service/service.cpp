@@ -28,6 +28,7 @@ namespace {
 constexpr uint64_t LISTENING = uint64_t{1} << 32;
 constexpr uint64_t STOPPING = LISTENING + 1;
 
+constexpr std::chrono::milliseconds PAUSE{10};
 constexpr int LOOK_MS = 1000;  // how often the folder is looked for
 
 TEE_Result no_socket(const std::string& path) {
@@ -102,7 +103,10 @@ bool service::folder_is_gone() const {
 
 void service::accept_one() {
   file_descriptor socket = wire::accept_from(listening_.get());
-  if (!socket) return;
+  if (!socket) {  // often for want of descriptors: not again at once
+    std::this_thread::sleep_for(PAUSE);
+    return;
+  }
   std::unique_lock lock(mutex_);
   if (connections_.size() >= CONNECTIONS_MAX) return;
   const uint32_t number = ++last_connection_;

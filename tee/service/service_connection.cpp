@@ -82,15 +82,12 @@ size_t service_connection::answer_to(std::span<const uint8_t> message) {
     case wire::request::SHARE:
       return share(from);
     case wire::request::RELEASE:
-      client_->memories().remove(from.u32());
-      return write({});
+    case wire::request::CLOSE:
+      return end(from, kind);
     case wire::request::OPEN:
       return open(from);
     case wire::request::INVOKE:
       return invoke(from);
-    case wire::request::CLOSE:
-      client_->close(from.u32());
-      return write({});
     case wire::request::CANCEL: {
       const uint32_t connection = from.u32();
       client_->cancel(connection, from.u32());
@@ -149,6 +146,17 @@ size_t service_connection::call(wire::reader& from, uint32_t number, Run run) {
   }
   calls_->end();
   return memory.write_back({result.code, result.origin, made, 0, {}});
+}
+
+size_t service_connection::end(wire::reader& from, wire::request kind) {
+  const uint32_t number = from.u32();
+  if (!from.ended()) return refuse(TEEC_ERROR_BAD_PARAMETERS);
+  if (kind == wire::request::CLOSE) {
+    client_->close(number);
+  } else {
+    client_->memories().remove(number);
+  }
+  return write({});
 }
 
 size_t service_connection::open(wire::reader& from) {

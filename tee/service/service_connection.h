@@ -15,7 +15,7 @@
 namespace tee::service {
 
 // One message at a time, in the connection's own thread. A message is read once, into memory of the
-// service; one that is not as the protocol has it ends the connection.
+// service; one that is not as the protocol has it is refused.
 class service_connection {
  public:
   service_connection(service& owner, file_descriptor socket, uint32_t number);
@@ -39,6 +39,7 @@ class service_connection {
   size_t answer_to(std::span<const uint8_t> message);
   size_t greet(wire::reader& from, bool attach);
   size_t share(wire::reader& from);
+  size_t end(wire::reader& from, wire::request kind);
   size_t open(wire::reader& from);
   size_t invoke(wire::reader& from);
   size_t write(const wire::answer& answer);

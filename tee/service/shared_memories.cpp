@@ -10,6 +10,7 @@ namespace tee::service {
 uint32_t shared_memories::add(file_descriptor memory, size_t size) {
   if (size == 0 || size > SIZE_MAX_EACH || !os::is_fixed_memory(memory.get(), size)) return 0;
   auto mapping = std::make_shared<wire::shared_mapping>(std::move(memory), size);
+  mapping->close_descriptor();
   std::lock_guard lock(mutex_);
   if (mappings_.size() >= COUNT_MAX || size > SIZE_MAX_ALL - total_) return 0;
   if (++last_ == 0) ++last_;

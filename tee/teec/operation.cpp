@@ -26,6 +26,14 @@ static_assert(directions_of(TEEC_MEMREF_PARTIAL_OUTPUT) == TEEC_MEM_OUTPUT);
 
 }  // namespace
 
+TEEC_Result check_memory(const TEEC_SharedMemory* memory) {
+  constexpr uint32_t ALL_DIRECTIONS = TEEC_MEM_INPUT | TEEC_MEM_OUTPUT;
+  if (memory == nullptr || memory->flags == 0 || (memory->flags & ~ALL_DIRECTIONS) != 0) {
+    return TEEC_ERROR_BAD_PARAMETERS;
+  }
+  return memory->size <= TEEC_CONFIG_SHAREDMEM_MAX_SIZE ? TEEC_SUCCESS : TEEC_ERROR_OUT_OF_MEMORY;
+}
+
 TEEC_Result operation_parameters::take(const void* context, const TEEC_Operation* operation,
                                        finder find) {
   if (operation == nullptr) return TEEC_SUCCESS;

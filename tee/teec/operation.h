@@ -15,10 +15,13 @@ namespace tee {
 
 constexpr size_t SLOTS = 4;
 
-// parameter_type: TEE_PARAM_TYPE_ of a slot in a word of four. is_output: whether such a slot takes
-// something back. is_memory: whether it is a memory reference.
+// parameter_type: TEE_PARAM_TYPE_ of a slot in a word of four. is_input, is_output: whether such a
+// slot brings something, takes something back. is_memory: whether it is a memory reference.
 constexpr uint32_t parameter_type(uint32_t types, size_t slot) {
   return types >> (4 * slot) & 0xF;
+}
+constexpr bool is_input(uint32_t type) {
+  return (type & 1) != 0;
 }
 constexpr bool is_output(uint32_t type) {
   return (type & 2) != 0;
@@ -34,6 +37,10 @@ struct shared_region {
   size_t size;
   uint32_t flags;  // TEEC_MEM_
 };
+
+// check_memory: whether memory of that size and those directions can be shared; null cannot.
+// TEEC_ERROR_BAD_PARAMETERS, TEEC_ERROR_OUT_OF_MEMORY above TEEC_CONFIG_SHAREDMEM_MAX_SIZE.
+[[nodiscard]] TEEC_Result check_memory(const TEEC_SharedMemory* memory);
 
 // An operation's parameters, checked. Memory is named and not copied: temporary or shared, it stays
 // the client's own.

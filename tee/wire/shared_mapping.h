@@ -26,6 +26,9 @@ class shared_mapping {
 
   uint8_t* data() const { return data_; }
   size_t size() const { return size_; }
+
+  // close_descriptor: the mapping stays. A server has few descriptors for many clients.
+  void close_descriptor() { memory_ = {}; }
   int descriptor() const { return memory_.get(); }
 
  private:

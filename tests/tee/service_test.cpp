@@ -200,6 +200,8 @@ TEST_F(service, what_is_not_of_the_protocol_is_refused) {
       {true, call(5, {2, 1, 5, 0}), -1, BAD},
       {true, call(5, {3, 1, 5, 0}), -1, BAD},
       {true, {share, 4096, 0}, -1, BAD},
+      {true, {static_cast<uint32_t>(wire::request::RELEASE)}, -1, BAD},
+      {true, {static_cast<uint32_t>(wire::request::CLOSE), 1, 1}, -1, BAD},
       {true, {share, 4096, 0}, ends[0], TEEC_ERROR_OUT_OF_MEMORY},
       {true, {share, 0, 0}, memory.get(), TEEC_ERROR_OUT_OF_MEMORY},
       {true, {share, 4097, 0}, memory.get(), TEEC_ERROR_OUT_OF_MEMORY},
